@@ -1,0 +1,184 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <type_traits>
+
+namespace platform {
+
+/// Raw bytes of any content. Not text unless an operation says so.
+using Bytes = std::string;
+using BytesView = std::string_view;
+
+/// A moment, in seconds since 2001-01-01T00:00:00Z. May be fractional and negative.
+struct Date {
+  double seconds = 0;
+  friend bool operator==(const Date&, const Date&) = default;
+};
+
+class Array;
+class Dictionary;
+class ValueBuilder;
+
+/// One property-list value, or none ("absent").
+///
+/// A Value owns what it holds. Strings, data and containers of one document lie in one arena that the
+/// outermost Value owns; the values inside a container are seen as `const Value&` and stay valid until
+/// that container is changed or its outermost Value goes. Copying a Value, putting one into a container
+/// and copying one out copy deeply, so nothing a caller keeps can dangle; moving an outermost Value is cheap.
+///
+/// Typed access never throws and never converts: it answers nothing when the value is of another kind.
+/// Not synchronised: one thread at a time may touch a Value that anybody changes.
+class Value {
+ public:
+  enum class Kind : std::uint8_t { absent, boolean, integer, real, string, data, date, array, dictionary };
+
+  Value() noexcept = default;
+  Value(bool boolean) noexcept;
+  template <class Integer>
+    requires(std::is_integral_v<Integer> && !std::is_same_v<Integer, bool> && !std::is_same_v<Integer, char>)
+  Value(Integer number) noexcept : Value(Number{static_cast<std::uint64_t>(number), number < Integer{}}) {}
+  Value(double number) noexcept;
+  Value(Date date) noexcept;
+  Value(std::string_view text);
+  Value(const std::string& text) : Value(std::string_view(text)) {}
+  Value(const char* text) : Value(std::string_view(text)) {}
+
+  static Value makeData(BytesView bytes);
+  static Value makeArray();
+  static Value makeDictionary();
+
+  Value(const Value& other);
+  Value(Value&& other);
+  Value& operator=(const Value& other);
+  Value& operator=(Value&& other);
+  ~Value();
+
+  Kind kind() const noexcept { return _kind; }
+  bool isAbsent() const noexcept { return _kind == Kind::absent; }
+
+  std::optional<bool> boolean() const noexcept;
+  /// Integers only; nothing for those above the signed 64-bit range.
+  std::optional<std::int64_t> integer() const noexcept;
+  /// Integers only; nothing for negative ones.
+  std::optional<std::uint64_t> unsignedInteger() const noexcept;
+  std::optional<double> real() const noexcept;
+  std::optional<Date> date() const noexcept;
+  /// UTF-8. Borrowed: valid as long as this Value is neither changed nor gone.
+  std::optional<std::string_view> string() const noexcept;
+  /// Borrowed like string().
+  std::optional<BytesView> data() const noexcept;
+  /// Null when the value is of another kind. Borrowed from this Value.
+  const Array* array() const noexcept;
+  Array* array() noexcept;
+  const Dictionary* dictionary() const noexcept;
+  Dictionary* dictionary() noexcept;
+
+  /// How a flag of a property-list entry reads: a boolean says it itself, a number is true unless it is 0,
+  /// everything else (text included) is false.
+  bool boolValue() const noexcept;
+
+  /// Same kind and same content; the order of a dictionary's entries does not matter.
+  friend bool operator==(const Value& one, const Value& other) noexcept;
+
+ private:
+  friend class Array;
+  friend class Dictionary;
+  friend class ValueBuilder;
+
+  struct Number {
+    std::uint64_t bits;
+    bool negative;
+  };
+  explicit Value(Number number) noexcept;
+  void release() noexcept;
+
+  Kind _kind = Kind::absent;
+  bool _owning = false;    // this Value frees what _payload points to
+  bool _unsigned = false;  // an integer above the signed range
+  std::uint32_t _length = 0;
+  union Payload {
+    std::uint64_t bits = 0;
+    double real;
+    const char* bytes;
+    Array* array;
+    Dictionary* dictionary;
+  } _payload;
+};
+static_assert(sizeof(Value) == 16);
+
+/// The elements of an array value, in order. Reached through a Value only.
+class Array {
+ public:
+  std::size_t size() const noexcept { return _size; }
+  bool empty() const noexcept { return _size == 0; }
+  /// Absent beyond the end.
+  const Value& operator[](std::size_t index) const noexcept;
+  const Value* begin() const noexcept { return _values; }
+  const Value* end() const noexcept { return _values + _size; }
+
+  /// The container at the place, to be changed in its place; null when there is none of that kind.
+  Array* array(std::size_t index) noexcept;
+  Dictionary* dictionary(std::size_t index) noexcept;
+
+  void reserve(std::size_t count);
+  /// Copies deeply. An absent value is not appended.
+  void append(const Value& value);
+  /// Appends an empty container and answers it.
+  Dictionary& appendDictionary();
+
+ private:
+  friend class Value;
+  friend class Dictionary;
+  friend class ValueBuilder;
+
+  void* _arena = nullptr;
+  Value* _values = nullptr;
+  std::size_t _size = 0;
+  std::size_t _capacity = 0;
+};
+
+/// The entries of a dictionary value, in the order in which their keys were first set.
+/// Finding a key takes expected constant time at any size. Reached through a Value only.
+class Dictionary {
+ public:
+  struct Entry {
+    std::string_view key;
+    Value value;
+  };
+
+  std::size_t size() const noexcept { return _size; }
+  bool empty() const noexcept { return _size == 0; }
+  const Entry* begin() const noexcept { return _entries; }
+  const Entry* end() const noexcept { return _entries + _size; }
+
+  /// Absent when there is no such key.
+  const Value& operator[](std::string_view key) const noexcept;
+  bool contains(std::string_view key) const noexcept;
+
+  /// The container under the key, to be changed in its place; null when there is none of that kind.
+  Array* array(std::string_view key) noexcept;
+  Dictionary* dictionary(std::string_view key) noexcept;
+
+  /// Copies deeply. Replaces an older value in its place; an absent value removes the entry.
+  void set(std::string_view key, const Value& value);
+  /// Keeps the order of the other entries. True when there was such a key.
+  bool remove(std::string_view key);
+
+ private:
+  friend class Value;
+  friend class Array;
+  friend class ValueBuilder;
+
+  void* _arena = nullptr;
+  Entry* _entries = nullptr;
+  std::size_t _size = 0;
+  std::size_t _capacity = 0;
+  std::uint32_t* _index = nullptr;  // open-addressed table of entry numbers; null for a few entries
+  std::size_t _indexCapacity = 0;
+};
+
+}  // namespace platform
