@@ -39,8 +39,9 @@ class Value {
   Value() noexcept = default;
   Value(bool boolean) noexcept;
   template <class Integer>
-    requires(std::is_integral_v<Integer> && !std::is_same_v<Integer, bool> && !std::is_same_v<Integer, char>)
-  Value(Integer number) noexcept : Value(Number{static_cast<std::uint64_t>(number), number < Integer{}}) {}
+  requires(std::is_integral_v<Integer> && !std::is_same_v<Integer, bool> && !std::is_same_v<Integer, char>)
+      Value(Integer number)
+  noexcept : Value(Number{static_cast<std::uint64_t>(number), number < Integer{}}) {}
   Value(double number) noexcept;
   Value(Date date) noexcept;
   Value(std::string_view text);

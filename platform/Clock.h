@@ -1,0 +1,31 @@
+#pragma once
+
+#include <chrono>
+#include <condition_variable>
+#include <functional>
+#include <mutex>
+
+namespace platform {
+
+/// The monotonic clock, and the only place where anybody waits.
+///
+/// A virtual clock lets the rest of the device run while a caller waits and jumps to the deadline when nothing
+/// is left to run, so that a wait of minutes is exact and takes no time. Callable from any thread.
+class Clock {
+ public:
+  using Duration = std::chrono::nanoseconds;
+  /// Since an arbitrary origin; never goes back.
+  using Instant = std::chrono::time_point<std::chrono::steady_clock, Duration>;
+
+  virtual ~Clock() = default;
+
+  virtual Instant now() = 0;
+
+  /// Waits until `satisfied` answers true or the deadline has passed; answers what `satisfied` last said.
+  /// `lock` is held on entry and on return and whenever `satisfied` runs, and is let go in between; whoever
+  /// makes the condition true notifies `changed`. No other guard may be held by the caller.
+  virtual bool waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
+                         const std::function<bool()>& satisfied) = 0;
+};
+
+}  // namespace platform

@@ -1,0 +1,51 @@
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/Error.h"
+#include "platform/Value.h"
+
+namespace platform {
+
+constexpr std::string_view FXFileOwnerAccountName = "FXFileOwnerAccountName";
+constexpr std::string_view FXFileGroupOwnerAccountName = "FXFileGroupOwnerAccountName";
+
+/// What an item of the file system is.
+struct FileAttributes {
+  bool isDirectory = false;
+  std::uint64_t size = 0;  // bytes; 0 for a directory
+};
+
+/// File operations. Paths are absolute. Every operation from any thread; each is by itself atomic towards the others
+/// only where it says so. Anything but regular files and directories is refused unopened.
+class FileSystem {
+ public:
+  virtual ~FileSystem() = default;
+
+  /// With everything in it. An item that is not there is a failure.
+  virtual bool removeItem(std::string_view path, ErrorRef* error = nullptr) = 0;
+  /// A directory that is there already counts as created when intermediate directories are asked for, and is a failure
+  /// otherwise. `attributes` is a dictionary or absent; an implementation applies what it may.
+  virtual bool createDirectory(std::string_view path, bool withIntermediateDirectories, const Value& attributes,
+                               ErrorRef* error = nullptr) = 0;
+  /// Atomic. Something at the destination is a failure.
+  virtual bool moveItem(std::string_view from, std::string_view to, ErrorRef* error = nullptr) = 0;
+  /// A file; an older file at the destination is replaced.
+  virtual bool copyItem(std::string_view from, std::string_view to, ErrorRef* error = nullptr) = 0;
+  virtual bool fileExists(std::string_view path, bool* isDirectory = nullptr) = 0;
+  virtual std::optional<FileAttributes> attributesOfItem(std::string_view path, ErrorRef* error = nullptr) = 0;
+  /// Replaces an older file.
+  virtual bool createFile(std::string_view path, BytesView contents, const Value& attributes) = 0;
+  /// The whole file, bypassing the cache.
+  virtual std::optional<Bytes> readFile(std::string_view path, ErrorRef* error = nullptr) = 0;
+  /// A temporary file, then a rename: a reader, and the device after a loss of power, sees the old content or the new,
+  /// never a part. On true the new content is on disk.
+  virtual bool writeAtomically(std::string_view path, BytesView contents, ErrorRef* error = nullptr) = 0;
+  /// Access and modification times become now. 0, or -1 with the error number stored.
+  virtual int utimes(std::string_view path, int& errorNumber) = 0;
+};
+
+}  // namespace platform

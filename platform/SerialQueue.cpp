@@ -1,0 +1,22 @@
+#include "platform/SerialQueue.h"
+
+#include <cstdio>
+#include <cstdlib>
+
+namespace platform {
+
+void SerialQueue::enter() NO_THREAD_SAFETY_ANALYSIS {
+  if (_running.load(std::memory_order_relaxed) == std::this_thread::get_id()) {
+    std::fprintf(stderr, "serial queue \"%s\" was entered from a block that runs on it\n", _label.c_str());
+    std::abort();
+  }
+  _mutex.lock();
+  _running.store(std::this_thread::get_id(), std::memory_order_relaxed);
+}
+
+void SerialQueue::leave() NO_THREAD_SAFETY_ANALYSIS {
+  _running.store(std::thread::id(), std::memory_order_relaxed);
+  _mutex.unlock();
+}
+
+}  // namespace platform

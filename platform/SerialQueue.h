@@ -1,0 +1,48 @@
+#pragma once
+
+#include <atomic>
+#include <mutex>
+#include <string>
+#include <thread>
+
+#include "platform/ThreadSafety.h"
+
+namespace platform {
+
+/// A serial queue that is only ever used synchronously: one block at a time runs on it, on the caller's own
+/// thread, and the caller waits for its turn. A block is a scope:
+///
+///     SerialQueue::Block block(_accessQueue);
+///
+/// Entering a queue from a block that already runs on it would wait for itself for ever; it ends the process
+/// with a message that names the queue instead.
+class CAPABILITY("queue") SerialQueue {
+ public:
+  explicit SerialQueue(std::string label) : _label(std::move(label)) {}
+  SerialQueue(const SerialQueue&) = delete;
+  SerialQueue& operator=(const SerialQueue&) = delete;
+
+  const std::string& label() const { return _label; }
+
+  /// The scope that runs on the queue. Short: nothing in it may wait for another block of this queue.
+  class SCOPED_CAPABILITY Block {
+   public:
+    explicit Block(SerialQueue& queue) ACQUIRE(queue) : _queue(queue) { _queue.enter(); }
+    ~Block() RELEASE() { _queue.leave(); }
+    Block(const Block&) = delete;
+    Block& operator=(const Block&) = delete;
+
+   private:
+    SerialQueue& _queue;
+  };
+
+ private:
+  void enter() ACQUIRE();
+  void leave() RELEASE();
+
+  const std::string _label;
+  std::mutex _mutex;
+  std::atomic<std::thread::id> _running;
+};
+
+}  // namespace platform

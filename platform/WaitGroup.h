@@ -1,0 +1,39 @@
+#pragma once
+
+#include <condition_variable>
+#include <cstdint>
+#include <mutex>
+
+#include "platform/Clock.h"
+
+namespace platform {
+
+/// Counts entries and leaves; a waiter is released when they balance. Every operation from any thread.
+class WaitGroup {
+ public:
+  void enter();
+  /// Leaving more often than entering ends the process with a message.
+  void leave();
+  /// True when the group balanced, false when the deadline passed first.
+  bool wait(Clock& clock, Clock::Instant deadline);
+
+ private:
+  std::mutex _mutex;
+  std::condition_variable _changed;
+  std::int64_t _entered = 0;
+};
+
+/// A counting semaphore that starts at 0. Every operation from any thread.
+class Semaphore {
+ public:
+  void signal();
+  /// Takes one count. True when there was one before the deadline.
+  bool wait(Clock& clock, Clock::Instant deadline);
+
+ private:
+  std::mutex _mutex;
+  std::condition_variable _changed;
+  std::int64_t _count = 0;
+};
+
+}  // namespace platform
