@@ -1,0 +1,45 @@
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/Error.h"
+
+namespace device {
+
+/// One rule of fault injection: `POINT[:APP][@N]=ACTION`.
+///
+/// POINT is an operation's C++ name, with its class in front and a dot where one name serves several
+/// ("RVPlaceholder.cancelForReason", "writeAtomically"), or "transfer" (each chunk of a package).
+/// Without APP every app matches; without N every match, otherwise the N-th only (counted from 1).
+struct InjectionRule {
+  enum class Action : std::uint8_t {
+    fail,        // does nothing, answers false or absent, with an error
+    error,       // takes effect and reports an error besides; on the accessor `error`: a present one
+    none,        // absent without error; a callback: not delivered
+    value,       // answers `number`
+    kill,        // the process dies as by SIGKILL before the effect
+    killAfter,   // … after the effect
+    cancel,      // somebody cancels `target`'s coordinator at this moment
+    prioritize,  // somebody asks for `target` first
+    uninstall,   // the person removes `target`
+    store,       // the store creates a coordinator for `target`
+  };
+
+  std::string point;
+  std::string app;          // empty: every app
+  std::uint64_t match = 0;  // 0: every match
+  Action action = Action::fail;
+  std::int64_t number = 0;  // of `value`
+  std::string target;       // of cancel, prioritize, uninstall, store
+
+  /// Nothing, with an error that names the place, when the text is no rule or names an unknown point or action.
+  static std::optional<InjectionRule> parse(std::string_view text, platform::ErrorRef* error = nullptr);
+};
+
+/// Whether a point of that name exists ("transfer", "writeAtomically", "RVPlaceholder.cancelForReason").
+bool isInjectionPoint(std::string_view point);
+
+}  // namespace device

@@ -1,0 +1,129 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "device/Boundary.h"
+#include "device/EventQueue.h"
+#include "device/FileTree.h"
+#include "device/Injection.h"
+#include "device/Store.h"
+#include "platform/Platform.h"
+#include "platform/SystemLog.h"
+#include "platform/TSDeviceService.h"
+#include "platform/Value.h"
+
+namespace device {
+
+/// One message of the system log as it was written.
+struct LogRecord {
+  platform::LogLevel level;
+  std::string category;  // "8", "15", "0"; the category's name for handles of a subsystem
+  std::string message;
+};
+
+/// What an install of the store's own looks like from outside; every fact can be set, also to numbers nobody has a name
+/// for.
+struct StoreInstall {
+  std::uint64_t installType = 1;
+  std::uint64_t installState = 1;
+  std::uint64_t installPhase = 0;
+  bool paused = false;
+  bool hasProgress = true;
+  bool createsCoordinator = true;
+  bool systemBundle = false;
+  std::string applicationType = "User";
+};
+
+/// One app as the device shows it.
+struct AppStatus {
+  std::string id;
+  std::string name;
+  std::string version;  // empty when not known
+  std::string state;    // "installed", "placeholder" or "updating"
+  std::uint64_t installType = 0;
+  std::string type;         // "User" or "System"
+  double progress = 0;      // 0…1 of a running install
+  std::string lastOutcome;  // "", "INSTALLED", "FAILED", "CANCELED"
+  std::string lastReason;   // text of the failure, if any
+};
+struct CoordinatorStatus {
+  std::string app;
+  std::string kind;  // "initiating", "updating", "restoring", "restoring-demoted"
+  std::uint64_t client = 0;
+};
+/// The canonical state of a device: the same for two devices that differ only in container names.
+struct DeviceStatus {
+  std::vector<AppStatus> apps;                  // sorted by id
+  std::vector<CoordinatorStatus> coordinators;  // sorted by app
+  std::vector<std::string> home;                // flattened, in order
+  std::uint64_t syncing = 0;                    // state of the home screen's sync notification
+};
+
+/// What the owner of a device chooses when it is opened.
+struct DeviceOptions {
+  std::string mainBundleIdentifier = "com.vantor.tsd";
+  /// Each message as it is written; under the log's own lock. Null: nobody listens (and messages are not formatted).
+  std::function<void(const LogRecord&)> log;
+  Boundary::Journal journal;
+  std::vector<InjectionRule> rules;
+  /// The daemon's device service; null: one that has neither operation.
+  platform::TSDeviceService* deviceService = nullptr;
+  /// Told, on the registry lane, whenever an app's placeholder or progress or outcome changed. May be null.
+  std::function<void(const AppStatus&)> changed;
+};
+
+/// A whole device: every platform service over one file tree, one store and one event queue.
+///
+/// Opening finishes or rolls back what an earlier process left half done, silently, before anything is handed out.
+/// The plug-in objects that use `platform()` are gone, and `events().drain()` and `events().stop()` have returned,
+/// before the device is destroyed.
+class LocalDevice {
+ public:
+  /// Null with an error when the parts are not those of a device.
+  static std::unique_ptr<LocalDevice> open(std::unique_ptr<FileTree> files, std::unique_ptr<Store> store,
+                                           std::unique_ptr<EventQueue> events, DeviceOptions options,
+                                           platform::ErrorRef* error = nullptr);
+  virtual ~LocalDevice() = default;
+
+  virtual const platform::Platform& platform() = 0;
+  virtual Boundary& boundary() = 0;
+  virtual EventQueue& events() = 0;
+  /// Below the boundary: nothing done here is in the journal.
+  virtual FileTree& files() = 0;
+
+  virtual DeviceStatus status() = 0;
+  virtual std::optional<AppStatus> app(std::string_view id) = 0;
+
+  /// Settings that persist: "app-installation", "app-removal" ("allowed", "forbidden"), "icon-size",
+  /// "backup-placeholders", … False with an error that names the key or the value.
+  virtual bool set(std::string_view key, std::string_view value, platform::ErrorRef* error = nullptr) = 0;
+  virtual std::string setting(std::string_view key) = 0;
+
+  /// As the person on the device would.
+  virtual bool uninstallByPerson(std::string_view id, platform::ErrorRef* error = nullptr) = 0;
+  virtual bool cancelByPerson(std::string_view id, platform::ErrorRef* error = nullptr) = 0;
+  virtual bool prioritizeByPerson(std::string_view id, platform::ErrorRef* error = nullptr) = 0;
+  /// The store starts an install of its own (a coordinator of client 1 and a registry entry), and finishes it from a
+  /// package.
+  virtual bool beginStoreInstall(std::string_view id, const StoreInstall& install,
+                                 platform::ErrorRef* error = nullptr) = 0;
+  virtual bool finishStoreInstall(std::string_view id, std::string_view packagePath,
+                                  platform::ErrorRef* error = nullptr) = 0;
+  /// An app that is simply there, from a package: what a device has before the first sync.
+  virtual bool installFromPackage(std::string_view packagePath, platform::ErrorRef* error = nullptr) = 0;
+};
+
+/// A device on a folder: `fs/` and `device.db`. `create` makes an empty one in a folder that is not there or is empty.
+bool createDevice(const std::string& folder, platform::ErrorRef* error = nullptr);
+std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_ptr<EventQueue> events,
+                                        DeviceOptions options, platform::ErrorRef* error = nullptr);
+/// An empty device in memory.
+std::unique_ptr<LocalDevice> makeMemoryDevice(std::unique_ptr<EventQueue> events, DeviceOptions options);
+
+}  // namespace device

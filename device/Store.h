@@ -1,0 +1,34 @@
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "platform/Error.h"
+#include "platform/Value.h"
+
+namespace device {
+
+/// One record of what the device's services remember. An absent value removes the record.
+struct StoreRecord {
+  std::string kind;  // "app", "coordinator", "uninstalled", "setting", …
+  std::string key;
+  platform::Value value;
+};
+
+/// What the services remember over a restart: plain records, each changed one written through. A commit is atomic and,
+/// on true, durable. Operations from any thread.
+class Store {
+ public:
+  virtual ~Store() = default;
+  /// Every record, in the order of first insertion. Nothing lost: an unreadable store is an error when it is opened.
+  virtual std::vector<StoreRecord> load() = 0;
+  virtual bool commit(const std::vector<StoreRecord>& changes, platform::ErrorRef* error = nullptr) = 0;
+};
+
+/// One SQLite file. Null with an error when it is none or cannot be opened.
+std::unique_ptr<Store> openDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr);
+/// Forgets everything when it goes.
+std::unique_ptr<Store> makeMemoryStore();
+
+}  // namespace device
