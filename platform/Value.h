@@ -19,8 +19,10 @@ struct Date {
   friend bool operator==(const Date&, const Date&) = default;
 };
 
+class Arena;
 class Array;
 class Dictionary;
+struct DictionaryIndex;
 class ValueBuilder;
 
 /// One property-list value, or none ("absent").
@@ -95,7 +97,18 @@ class Value {
     bool negative;
   };
   explicit Value(Number number) noexcept;
+  /// What a container holds: bytes and containers lie in the container's arena, so there is nothing to free.
+  Value(Kind kind, std::string_view bytes);
+  explicit Value(Array* array) noexcept;
+  explicit Value(Dictionary* dictionary) noexcept;
+
+  static Value own(Kind kind, std::string_view bytes);
+  std::string_view bytes() const noexcept { return {_payload.bytes, _length}; }
+  bool holdsBytes() const noexcept { return _kind == Kind::string || _kind == Kind::data; }
+  void take(Value& other) noexcept;
   void release() noexcept;
+  Value copiedInto(Arena& arena) const;
+  void recycleInto(Arena& arena) const noexcept;
 
   Kind _kind = Kind::absent;
   bool _owning = false;    // this Value frees what _payload points to
@@ -136,10 +149,13 @@ class Array {
   friend class Dictionary;
   friend class ValueBuilder;
 
-  void* _arena = nullptr;
+  explicit Array(Arena* arena) noexcept : _arena(arena) {}
+  Value* place();
+
+  Arena* _arena;
   Value* _values = nullptr;
-  std::size_t _size = 0;
-  std::size_t _capacity = 0;
+  std::uint32_t _size = 0;
+  std::uint32_t _capacity = 0;
 };
 
 /// The entries of a dictionary value, in the order in which their keys were first set.
@@ -174,12 +190,18 @@ class Dictionary {
   friend class Array;
   friend class ValueBuilder;
 
-  void* _arena = nullptr;
+  explicit Dictionary(Arena* arena) noexcept : _arena(arena) {}
+  std::size_t find(std::string_view key) const noexcept;
+  void makeRoom();
+  void recycle() const noexcept;
+  std::optional<std::size_t> buildIndex(std::size_t count);
+  void shiftIndex(std::size_t from, std::size_t to, int by) noexcept;
+
+  Arena* _arena;
   Entry* _entries = nullptr;
-  std::size_t _size = 0;
-  std::size_t _capacity = 0;
-  std::uint32_t* _index = nullptr;  // open-addressed table of entry numbers; null for a few entries
-  std::size_t _indexCapacity = 0;
+  std::uint32_t _size = 0;
+  std::uint32_t _capacity = 0;        // places from _entries on
+  DictionaryIndex* _index = nullptr;  // null as long as the entries are few
 };
 
 }  // namespace platform
