@@ -1,6 +1,6 @@
 #pragma once
 
-#include <atomic>
+#include <concepts>
 #include <cstdint>
 #include <functional>
 #include <initializer_list>
@@ -14,25 +14,33 @@
 
 #include "device/EventQueue.h"
 #include "device/Injection.h"
+#include "device/JournalValue.h"
+#include "device/ObjectKind.h"
 #include "platform/Error.h"
 #include "platform/StringSet.h"
 #include "platform/Value.h"
 
 namespace device {
 
-/// One argument of a call, as the journal shows it; cheap to make, read only when somebody asks. Objects stand as
-/// `kind#number`, bytes as their count.
+class Boundary;
+
+/// One argument of a call, as the journal shows it; cheap to make, read only when somebody asks, before the call's body
+/// runs. Objects stand as `kind#number`, bytes as their count.
 class CallArgument {
  public:
-  enum class Kind : std::uint8_t { absent, boolean, integer, real, text, bytes, value, object, error, texts };
+  enum class Kind : std::uint8_t { absent, boolean, integer, real, text, bytes, value, object, error, shown };
   struct BytesCount {
     std::size_t count;
   };
 
-  CallArgument(const char* name, bool value) : name(name), kind(Kind::boolean), integer(value) {}
+  template <std::same_as<bool> Boolean>
+  CallArgument(const char* name, Boolean value) : name(name), kind(Kind::boolean), integer(value) {}
   template <class Integer>
   requires(std::is_integral_v<Integer> && !std::is_same_v<Integer, bool>) CallArgument(const char* name, Integer value)
-      : name(name), kind(Kind::integer), integer(static_cast<std::int64_t>(value)) {}
+      : name(name),
+        kind(Kind::integer),
+        isUnsigned(std::is_unsigned_v<Integer>),
+        integer(static_cast<std::int64_t>(value)) {}
   CallArgument(const char* name, double value) : name(name), kind(Kind::real), real(value) {}
   CallArgument(const char* name, std::string_view value) : name(name), kind(Kind::text), text(value) {}
   CallArgument(const char* name, const std::string& value) : name(name), kind(Kind::text), text(value) {}
@@ -45,10 +53,17 @@ class CallArgument {
       : name(name), kind(Kind::bytes), integer(static_cast<std::int64_t>(value.count)) {}
   CallArgument(const char* name, const platform::Value& value) : name(name), kind(Kind::value), pointer(&value) {}
   CallArgument(const char* name, const platform::ErrorRef& value) : name(name), kind(Kind::error), pointer(&value) {}
-  CallArgument(const char* name, const std::vector<std::string>& value)
-      : name(name), kind(Kind::texts), pointer(&value) {}
-  /// `objectKind` is "coordinator", "promise", "placeholder", "attributes", "metadata", "options", "observer", "asset",
-  /// …
+  /// A shared object of a class that has a kind (see ObjectKind.h). Keeps its number as long as it lives.
+  template <HasObjectKind T>
+  CallArgument(const char* name, const std::shared_ptr<T>& value)
+      : name(name), kind(Kind::shown), pointer(&value), show(showAs<std::shared_ptr<T>>) {}
+  /// Texts, or such objects.
+  template <class T>
+  CallArgument(const char* name, const std::vector<T>& value)
+      : name(name), kind(Kind::shown), pointer(&value), show(showAs<std::vector<T>>) {}
+  CallArgument(const char* name, const platform::StringSet& value)
+      : name(name), kind(Kind::shown), pointer(&value), show(showAs<platform::StringSet>) {}
+  /// An object known by its address only, until `Boundary::forgetObject`. `objectKind` is "coordinator", "observer", …
   static CallArgument object(const char* name, const char* objectKind, const void* address) {
     CallArgument argument(name, objectKind);
     argument.kind = address ? Kind::object : Kind::absent;
@@ -56,12 +71,22 @@ class CallArgument {
     return argument;
   }
 
+  platform::Value journalValue(Boundary& boundary) const;
+
   const char* name;
   Kind kind;
+  bool isUnsigned = false;
   std::int64_t integer = 0;
   double real = 0;
   std::string_view text{};
   const void* pointer = nullptr;
+  platform::Value (*show)(Boundary& names, const void* value) = nullptr;
+
+ private:
+  template <class T>
+  static platform::Value showAs(Boundary& names, const void* value) {
+    return device::journalValue(names, *static_cast<const T*>(value));
+  }
 };
 using CallArguments = std::initializer_list<CallArgument>;
 
@@ -71,6 +96,11 @@ struct Crossing {
   const char* service;
   const char* operation;
   std::string_view app{};
+  /// A message or a transaction record. It makes nothing happen, so it lets no held event go: what a caller does
+  /// about the call before must not depend on whether somebody listens.
+  bool isMessage = false;
+  /// A text result is bytes; the journal shows their count.
+  bool answersBytes = false;
 };
 
 /// One finished record of the journal, before it is written out.
@@ -90,46 +120,160 @@ struct CallRecord {
 /// services' operations and queries, daemon calls, callbacks, log and transaction records, file operations; not the
 /// facts of a proxy. It writes the call journal when asked, applies injection rules, and releases held-back events.
 /// With nobody listening and no rules it costs a few nanoseconds. From any thread.
+///
+/// What a rule orders:
+/// - `fail`: the body does not run; the answer is `failure`, with an error of the domain "Injection".
+/// - `error`: the body runs, then there is such an error besides. Where an error is the result (the accessor `error`),
+///   it becomes that.
+/// - `none`: the body does not run; the answer is `failure`, without error.
+/// - `value`: the body does not run; the answer is the number, on a boolean whether it is not 0. Where no number can be
+///   the answer, as `none`.
+/// - `kill`, `killAfter`: the process dies, before or after the body and its record.
+/// - the others: the bystander acts, then the body runs.
+///
+/// An operation that reports its failure through a completion handler passes an error of its own here and lets the body
+/// answer true: on false the body did not run, and the completion is to get that error.
 class Boundary {
  public:
   /// Gets every record in the order of its numbers; called under the journal's own lock, must not call back.
   using Journal = std::function<void(const CallRecord&)>;
-  /// Carries out what somebody else does at this moment (cancel, prioritize, uninstall, store).
+  /// Carries out what somebody else does at this moment (cancel, prioritize, uninstall, store). Rules do not apply to
+  /// what it does itself.
   using Bystander = std::function<void(InjectionRule::Action action, const std::string& target)>;
 
-  explicit Boundary(EventQueue& events);
+  Boundary();
   ~Boundary();
 
   /// Set before the first call.
   void setJournal(Journal journal);
   void setRules(std::vector<InjectionRule> rules);
   void setBystander(Bystander bystander);
+  bool hasJournal() const noexcept { return _journaled; }
 
   /// A call from the plug-in to a service. `body` does the work and answers; `error` is the operation's error
-  /// out-parameter (or null), read after the body for the journal. `failure` is what a failed call answers: by
-  /// default false, absent or null.
-  template <class Body, class Result = std::invoke_result_t<Body>>
-  Result call(const Crossing& crossing, platform::ErrorRef* error, CallArguments arguments, Body&& body);
-  template <class Body, class Result>
-  Result call(const Crossing& crossing, platform::ErrorRef* error, CallArguments arguments, Body&& body,
-              Result failure);
+  /// out-parameter (or null), read after the body for the journal. What a failed call answers is by default false,
+  /// absent, null or 0; else `failure`, which is that answer or makes it. An answer by reference cannot fail.
+  template <class Body>
+  auto call(const Crossing& crossing, platform::ErrorRef* error, CallArguments arguments, Body&& body)
+      -> std::invoke_result_t<Body> {
+    return call(crossing, error, arguments, body, NoAnswer{});
+  }
+  template <class Body, class Failure>
+  auto call(const Crossing& crossing, platform::ErrorRef* error, CallArguments arguments, Body&& body,
+            Failure&& failure) -> std::invoke_result_t<Body> {
+    if (!crossing.isMessage) EventQueue::releaseOutsideCall();
+    EventQueue::InsideCall inside;
+    if (!_watched) return body();
+    return watched({Direction::out, crossing}, error, arguments, body, failure);
+  }
 
-  /// A call into the plug-in: a daemon call or a callback. Two records, at its begin and at its end. A rule `none` or
-  /// `fail` keeps a callback from being delivered.
-  template <class Body, class Result = std::invoke_result_t<Body>>
-  Result enter(const Crossing& crossing, CallArguments arguments, Body&& body);
+  /// A call into the plug-in: a daemon call or a callback. Two records, at its begin and at its end; `error` as above.
+  /// A rule `none`, `fail` or `value` keeps it from being delivered, without a record.
+  template <class Body>
+  auto enter(const Crossing& crossing, CallArguments arguments, Body&& body) -> std::invoke_result_t<Body> {
+    return enter(crossing, nullptr, arguments, body);
+  }
+  template <class Body>
+  auto enter(const Crossing& crossing, platform::ErrorRef* error, CallArguments arguments, Body&& body)
+      -> std::invoke_result_t<Body> {
+    struct Releases {
+      ~Releases() { EventQueue::releaseOutsideCall(); }
+    } atEnd;
+    if (!_watched) return body();
+    return watched({Direction::in, crossing}, error, arguments, body, NoAnswer{});
+  }
 
-  /// A chunk of a package on its way: the point "transfer". The action that a rule orders, if any.
+  /// A chunk of a package on its way: the point "transfer". What `kill` and the bystander do is done here; any other
+  /// action that a rule orders is answered, for the caller to carry out.
   std::optional<InjectionRule> atTransfer(std::string_view app);
 
-  /// `kind#number`, the same number for the same object as long as `keep` has not let it go.
+  /// Ends the process as `kill` does.
+  [[noreturn]] static void die();
+
+  /// `kind#number`, the same number for the same object until `forgetObject`, or, given what owns the object, as long
+  /// as it lives.
   std::string nameOfObject(const char* kind, const void* address);
+  std::string nameOfObject(const char* kind, const void* address, const std::weak_ptr<const void>& ownership);
+  /// For the destructor of an object whose address the journal may have seen.
+  void forgetObject(const void* address);
 
  private:
   struct State;
+  struct NoAnswer {};
+  enum class Direction : std::uint8_t { out, in };
+  enum class Order : std::uint8_t { run, fail, none, value };
+  /// One call that somebody watches, from before its body until after it.
+  struct Visit {
+    Direction direction;
+    const Crossing& crossing;
+    Order order = Order::run;
+    bool addsError = false;
+    bool dies = false;
+    std::int64_t number = 0;
+    platform::Value arguments{};
+  };
+
+  /// Finds out what the rules order, lets the bystander act, and keeps the arguments as they are before the body.
+  void begin(Visit& visit, CallArguments arguments);
+  void settleError(const Visit& visit, platform::ErrorRef* error) const;
+  /// Writes the record and does what is left to be done after it.
+  void finish(Visit& visit, platform::Value result, const platform::ErrorRef* error);
+  static platform::ErrorRef injectedError(const Crossing& crossing);
+
+  template <class Body, class Failure>
+  auto watched(Visit visit, platform::ErrorRef* error, CallArguments arguments, Body& body, Failure&& failure)
+      -> std::invoke_result_t<Body&>;
+  template <class Result, class Failure>
+  static Result answerInstead(const Visit& visit, Failure&& failure);
+
   std::unique_ptr<State> _state;
-  EventQueue& _events;
-  std::atomic<bool> _watched{false};  // somebody listens, or there are rules
+  bool _watched = false;  // somebody listens, or there are rules
+  bool _journaled = false;
 };
+
+template <class Body, class Failure>
+auto Boundary::watched(Visit visit, platform::ErrorRef* error, CallArguments arguments, Body& body, Failure&& failure)
+    -> std::invoke_result_t<Body&> {
+  using Result = std::invoke_result_t<Body&>;
+  begin(visit, arguments);
+  if constexpr (std::is_void_v<Result>) {
+    if (visit.order == Order::run) body();
+    settleError(visit, error);
+    finish(visit, {}, error);
+  } else if constexpr (std::is_reference_v<Result>) {
+    Result result = body();
+    finish(visit, {}, error);
+    return result;
+  } else {
+    Result result = visit.order == Order::run ? body() : answerInstead<Result>(visit, std::forward<Failure>(failure));
+    settleError(visit, error);
+    if constexpr (std::is_same_v<Result, platform::ErrorRef>) {
+      if (visit.addsError) result = injectedError(visit.crossing);
+    }
+    finish(visit, _journaled ? journalValue(*this, result, visit.crossing.answersBytes) : platform::Value(), error);
+    return result;
+  }
+}
+
+template <class Result, class Failure>
+Result Boundary::answerInstead(const Visit& visit, Failure&& failure) {
+  if (visit.order == Order::value) {
+    if constexpr (std::is_same_v<Result, bool>) {
+      return visit.number != 0;
+    } else if constexpr (std::is_arithmetic_v<Result>) {
+      return static_cast<Result>(visit.number);
+    } else if constexpr (std::is_same_v<Result, platform::Value>) {
+      return platform::Value(visit.number);
+    }
+  }
+  using Given = std::remove_cvref_t<Failure>;
+  if constexpr (std::is_same_v<Given, NoAnswer>) {
+    return Result();
+  } else if constexpr (std::is_invocable_v<Failure>) {
+    return failure();
+  } else {
+    return Result(std::forward<Failure>(failure));
+  }
+}
 
 }  // namespace device

@@ -27,26 +27,71 @@ class EventQueue {
  public:
   using Event = std::function<void()>;
 
-  virtual ~EventQueue() = default;
+  /// While it lives the calling thread is inside a call to a service: what it posts is held back until released. Nests.
+  class InsideCall {
+   public:
+    InsideCall() noexcept { ++_thread.callDepth; }
+    ~InsideCall() { --_thread.callDepth; }
+    InsideCall(const InsideCall&) = delete;
+    InsideCall& operator=(const InsideCall&) = delete;
+  };
+  /// While it lives the calling thread acts for somebody else, whatever call it is inside of: it posts directly.
+  class OutsideCall {
+   public:
+    OutsideCall() noexcept : _depth(_thread.callDepth) { _thread.callDepth = 0; }
+    ~OutsideCall() { _thread.callDepth = _depth; }
+    OutsideCall(const OutsideCall&) = delete;
+    OutsideCall& operator=(const OutsideCall&) = delete;
+
+   private:
+    std::uint32_t _depth;
+  };
+
+  EventQueue();
+  virtual ~EventQueue();
+  EventQueue(const EventQueue&) = delete;
+  EventQueue& operator=(const EventQueue&) = delete;
 
   /// From any thread; never runs the event inside.
   void post(Lane lane, Event event);
 
-  /// The thread is inside a call to a service: what it posts is held back until released.
-  static void holdBack();
-  /// Lets go what this thread held back.
-  void release();
+  /// Lets go what the calling thread held back.
+  static void release() {
+    if (_thread.holds) releaseHeld();
+  }
+  /// The same, unless the thread is still inside the call that caused it.
+  static void releaseOutsideCall() {
+    if (_thread.holds && _thread.callDepth == 0) releaseHeld();
+  }
 
   /// Returns when every event posted so far, and whatever they posted, has run (and nothing is held back by this
   /// thread). Never called from an event.
   virtual void drain() = 0;
-  /// No event runs afterwards; what is pending is dropped. Idempotent.
+  /// No event runs afterwards; what is pending is dropped. Idempotent. Waits for running events, but not when called
+  /// from one.
   virtual void stop() = 0;
 
   virtual platform::Clock& clock() = 0;
 
  protected:
-  virtual void enqueue(Lane lane, Event event) = 0;
+  /// False, with the event untouched, once the queue has stopped.
+  virtual bool enqueue(Lane lane, Event& event) = 0;
+  /// Last thing a queue does before its own parts go: threads that still hold events drop them from here on.
+  void close();
+
+ private:
+  struct ThreadState {
+    std::uint32_t callDepth;
+    bool holds;
+  };
+  struct Door;
+  struct HeldEvents;
+
+  static void releaseHeld();
+  static HeldEvents& heldEvents();
+
+  static inline constinit thread_local ThreadState _thread{};
+  std::shared_ptr<Door> _door;  // what held events reach this queue through, as they may outlive it
 };
 
 /// One thread per lane and the real clock.

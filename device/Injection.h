@@ -35,6 +35,9 @@ struct InjectionRule {
   std::int64_t number = 0;  // of `value`
   std::string target;       // of cancel, prioritize, uninstall, store
 
+  /// Whether the rule is about calls of this operation for this app (empty: for none).
+  bool matches(std::string_view service, std::string_view operation, std::string_view app) const;
+
   /// Nothing, with an error that names the place, when the text is no rule or names an unknown point or action.
   static std::optional<InjectionRule> parse(std::string_view text, platform::ErrorRef* error = nullptr);
 };

@@ -1,0 +1,77 @@
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string_view>
+#include <type_traits>
+#include <vector>
+
+#include "device/ObjectKind.h"
+#include "platform/Error.h"
+#include "platform/FileSystem.h"
+#include "platform/StringSet.h"
+#include "platform/Value.h"
+
+namespace device {
+
+/// An error as the journal shows it: a dictionary of "domain", "code", "description" and "underlying", the last two
+/// where there are any; absent for none.
+platform::Value journalValueOfError(const platform::ErrorRef& error);
+
+/// How the journal shows results and arguments, by their type. `names` gives objects their names
+/// (`Boundary::nameOfObject`). A type that is none of these is shown as absent.
+template <class Names, class T>
+platform::Value journalValue([[maybe_unused]] Names& names, [[maybe_unused]] const T& value,
+                             [[maybe_unused]] bool textIsBytes = false) {
+  if constexpr (std::is_same_v<T, platform::Value>) {
+    return value;
+  } else if constexpr (std::is_same_v<T, platform::ErrorRef>) {
+    return journalValueOfError(value);
+  } else if constexpr (std::is_same_v<T, bool> || std::is_integral_v<T>) {
+    return platform::Value(value);
+  } else if constexpr (std::is_floating_point_v<T>) {
+    return platform::Value(static_cast<double>(value));
+  } else if constexpr (std::is_enum_v<T>) {
+    return platform::Value(static_cast<std::underlying_type_t<T>>(value));
+  } else if constexpr (std::is_convertible_v<const T&, std::string_view>) {
+    std::string_view text = value;
+    return textIsBytes ? platform::Value(text.size()) : platform::Value(text);
+  } else if constexpr (std::is_same_v<T, platform::StringSet>) {
+    return journalValue(names, value.members());
+  } else if constexpr (std::is_same_v<T, platform::FileAttributes>) {
+    auto attributes = platform::Value::makeDictionary();
+    attributes.dictionary()->set("isDirectory", value.isDirectory);
+    attributes.dictionary()->set("size", value.size);
+    return attributes;
+  } else {
+    return journalValueOfContent(names, value, textIsBytes);
+  }
+}
+
+template <class Names, class T>
+platform::Value journalValueOfContent(Names&, const T&, bool) {
+  return {};
+}
+template <class Names, class T>
+platform::Value journalValueOfContent(Names& names, const std::optional<T>& value, bool textIsBytes) {
+  return value ? journalValue(names, *value, textIsBytes) : platform::Value();
+}
+template <class Names, HasObjectKind T>
+platform::Value journalValueOfContent(Names& names, const std::shared_ptr<T>& object, bool) {
+  if (!object) return {};
+  return platform::Value(names.nameOfObject(kindOfObject(object.get()), object.get(), object));
+}
+template <class Names, HasObjectKind T>
+platform::Value journalValueOfContent(Names& names, const std::unique_ptr<T>& object, bool) {
+  if (!object) return {};
+  return platform::Value(names.nameOfObject(kindOfObject(object.get()), object.get()));
+}
+template <class Names, class T>
+platform::Value journalValueOfContent(Names& names, const std::vector<T>& values, bool textIsBytes) {
+  auto array = platform::Value::makeArray();
+  array.array()->reserve(values.size());
+  for (const auto& value : values) array.array()->append(journalValue(names, value, textIsBytes));
+  return array;
+}
+
+}  // namespace device
