@@ -20,6 +20,18 @@
 
 namespace device {
 
+/// Codes of the errors of this interface; their domain is "LocalDevice".
+enum class LocalDeviceError : std::int64_t {
+  failed = 1,
+  notADevice = 2,      // the folder or the parts are none of a device, or a record in it makes no sense
+  notEmpty = 3,        // a device is to be made where something else is
+  unknownSetting = 4,  // no such key, or no such value of the key
+  noSuchApp = 5,
+  busyApp = 6,  // another install of the app is under way
+};
+platform::ErrorRef localDeviceError(LocalDeviceError code, std::string description,
+                                    platform::ErrorRef underlying = nullptr);
+
 /// One message of the system log as it was written.
 struct LogRecord {
   platform::LogLevel level;
@@ -45,7 +57,7 @@ struct AppStatus {
   std::string id;
   std::string name;
   std::string version;  // empty when not known
-  std::string state;    // "installed", "placeholder" or "updating"
+  std::string state;    // "installed", "placeholder" or "updating"; empty when only its last outcome is left of it
   std::uint64_t installType = 0;
   std::string type;         // "User" or "System"
   double progress = 0;      // 0…1 of a running install
@@ -72,7 +84,8 @@ struct DeviceOptions {
   std::function<void(const LogRecord&)> log;
   Boundary::Journal journal;
   std::vector<InjectionRule> rules;
-  /// The daemon's device service; null: one that has neither operation.
+  /// The daemon's device service; null: one that has neither operation. Calls of the plug-in cross the boundary on
+  /// their way to it.
   platform::TSDeviceService* deviceService = nullptr;
   /// Told, on the registry lane, whenever an app's placeholder or progress or outcome changed. May be null.
   std::function<void(const AppStatus&)> changed;
@@ -98,19 +111,25 @@ class LocalDevice {
   virtual FileTree& files() = 0;
 
   virtual DeviceStatus status() = 0;
+  /// Nothing when neither the app nor an outcome of it is known.
   virtual std::optional<AppStatus> app(std::string_view id) = 0;
 
-  /// Settings that persist: "app-installation", "app-removal" ("allowed", "forbidden"), "icon-size",
-  /// "backup-placeholders", … False with an error that names the key or the value.
+  /// Settings that persist, with the values they take, the default first: "app-installation" and "app-removal"
+  /// (allowed, forbidden), "icon-size" (120; 16 to 1024 pixels), "backup-placeholders" (yes, no), "backup-error"
+  /// (no, yes), "device-service-prioritize" and "device-service-cancel" (yes, no). False with an error that names the
+  /// key or the value.
   virtual bool set(std::string_view key, std::string_view value, platform::ErrorRef* error = nullptr) = 0;
+  /// The default where nothing was set; empty for an unknown key.
   virtual std::string setting(std::string_view key) = 0;
 
   /// As the person on the device would.
   virtual bool uninstallByPerson(std::string_view id, platform::ErrorRef* error = nullptr) = 0;
   virtual bool cancelByPerson(std::string_view id, platform::ErrorRef* error = nullptr) = 0;
   virtual bool prioritizeByPerson(std::string_view id, platform::ErrorRef* error = nullptr) = 0;
-  /// The store starts an install of its own (a coordinator of client 1 and a registry entry), and finishes it from a
-  /// package.
+  /// The store starts an install of its own (a coordinator of client 1 and a registry entry), and finishes it. Package
+  /// paths are the device's; a package that was installed is deleted, one that was refused is kept. Without a package
+  /// (an empty path) what the placeholder's container holds becomes the app. Finishing runs inside the call; callbacks
+  /// follow.
   virtual bool beginStoreInstall(std::string_view id, const StoreInstall& install,
                                  platform::ErrorRef* error = nullptr) = 0;
   virtual bool finishStoreInstall(std::string_view id, std::string_view packagePath,
@@ -118,6 +137,9 @@ class LocalDevice {
   /// An app that is simply there, from a package: what a device has before the first sync.
   virtual bool installFromPackage(std::string_view packagePath, platform::ErrorRef* error = nullptr) = 0;
 };
+
+/// Makes an empty tree and an empty store those of an empty device.
+bool makeDeviceParts(FileTree& files, Store& store, platform::ErrorRef* error = nullptr);
 
 /// A device on a folder: `fs/` and `device.db`. `create` makes an empty one in a folder that is not there or is empty.
 bool createDevice(const std::string& folder, platform::ErrorRef* error = nullptr);
