@@ -23,12 +23,14 @@ class FileWriter {
   virtual bool close(bool durable, platform::ErrorRef* error = nullptr) = 0;
 };
 
-/// A file that is being read, in one pass.
+/// A file that is being read, from its begin unless told otherwise.
 class FileReader {
  public:
   virtual ~FileReader() = default;
   /// Up to `count` bytes; empty at the end; nothing on failure.
   virtual std::optional<platform::Bytes> read(std::size_t count, platform::ErrorRef* error = nullptr) = 0;
+  /// The next read begins `offset` bytes into the file; beyond its end there is nothing to read.
+  virtual bool seek(std::uint64_t offset, platform::ErrorRef* error = nullptr) = 0;
 };
 
 /// The device's file system, on a Linux folder or in memory: the same behaviour and the same error codes.
