@@ -46,6 +46,8 @@ void appendText(std::string& out, const T* object) {
     out += "(null)";
 }
 template <class T>
+void appendText(std::string& out, const std::vector<T>& objects);
+template <class T>
 void appendText(std::string& out, const std::shared_ptr<T>& object) {
   appendText(out, object.get());
 }

@@ -1,0 +1,30 @@
+#include "core/PropertyListFile.h"
+
+#include <utility>
+
+#include "platform/FileSystem.h"
+
+namespace appsync {
+
+using platform::Value;
+
+Value readDictionary(const platform::Platform& platform, const std::optional<std::string>& path) {
+  if (!path) return {};
+  auto bytes = platform.fileSystem.readFile(*path);
+  if (!bytes) return {};
+  Value root = platform.propertyLists.propertyListWithData(std::move(*bytes));
+  return root.dictionary() ? std::move(root) : Value();
+}
+
+bool writePropertyList(const platform::Platform& platform, const Value& value, platform::PropertyListFormat format,
+                       std::string_view path) {
+  auto bytes = platform.propertyLists.dataWithPropertyList(value, format);
+  return bytes && platform.fileSystem.writeAtomically(path, *bytes);
+}
+
+std::optional<std::string> stringOf(const Value& value) {
+  auto text = value.string();
+  return text ? std::optional<std::string>(*text) : std::nullopt;
+}
+
+}  // namespace appsync

@@ -1,0 +1,25 @@
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/Error.h"
+#include "platform/Platform.h"
+#include "platform/PropertyListSerialization.h"
+#include "platform/Value.h"
+
+namespace appsync {
+
+/// The dictionary in the property list at the path; absent when there is no path, the file cannot be read, or it holds
+/// anything else.
+platform::Value readDictionary(const platform::Platform& platform, const std::optional<std::string>& path);
+
+/// Serialises the value and writes it over the file. False when either fails; the old file is then as it was.
+bool writePropertyList(const platform::Platform& platform, const platform::Value& value,
+                       platform::PropertyListFormat format, std::string_view path);
+
+/// An owned copy of a string value; nothing for any other kind.
+std::optional<std::string> stringOf(const platform::Value& value);
+
+}  // namespace appsync
