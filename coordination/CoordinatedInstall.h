@@ -1,0 +1,60 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "core/AppsClient.h"
+
+namespace appsync {
+
+/// The preparation of one app's install: made when it starts, gone when it has ended.
+class AppsClient::CoordinatedInstall {
+ public:
+  CoordinatedInstall(AppsClient& client, const platform::TSAsset& asset, bool existingApp);
+
+  /// Prepares the coordinator, or cancels what was set up.
+  bool run();
+
+ private:
+  /// Up to the placeholder promise; false ends the preparation as failed.
+  bool prepare();
+  bool setInstallOptions();
+  bool setInitialZDRAssetPromises();
+  bool addAppAssetPromise();
+  /// The size of the icon copied into the placeholder's directory; 0 when there is none.
+  std::uint64_t stageIcon();
+  std::uint64_t copyIcon(const std::string& source);
+  /// What fails in here leaves the placeholder as it is then; it is attached all the same.
+  void configurePlaceholder(std::uint64_t iconSize);
+  bool setAttributes();
+  bool setMetadata();
+  void closeConfiguration();
+  bool attachPlaceholder();
+  void cancel();
+
+  /// Keeps the error that a call answered, if it did, as the last one of this preparation.
+  const ErrorRef& noted(const ErrorRef& error);
+
+  AppsClient& _client;
+  const Platform& _platform;
+  const bool _existingApp;
+
+  const std::string _bundleIdentifier;
+  const std::optional<std::string> _prettyName;
+  const std::optional<std::string> _version;
+  const std::optional<std::string> _sourceIcon;
+  const Value _manifest;  // dictionary, or absent
+  const Value _store;     // dictionary, or absent
+  const bool _launchProhibited;
+  std::string _iconPath;  // in the placeholder's directory
+
+  CoordinatorRef _coordinator;
+  PlaceholderRef _placeholder;
+  std::shared_ptr<platform::CVStoreMetadata> _storeMetadata;
+  bool _cancelsPlaceholder = false;
+  ErrorRef _lastError;
+};
+
+}  // namespace appsync
