@@ -1,0 +1,142 @@
+#include <unordered_set>
+#include <utility>
+
+#include "core/AppsClient.h"
+#include "core/Paths.h"
+#include "core/Say.h"
+#include "platform/FileSystem.h"
+#include "platform/PropertyListSerialization.h"
+
+namespace appsync {
+
+using namespace platform;
+
+namespace {
+
+/// How an app had been demoted before the backup.
+enum DemotionStatus : std::uint64_t { notDemoted = 0, demotedByHand = 1, demotedAutomatically = 2 };
+
+/// The demoted apps of the backup service's list; an absent or odd list has none.
+class DemotedApps {
+ public:
+  explicit DemotedApps(const Value& list)
+      : _automatic(identifiersOf(list, "AutomaticDowngrades")),
+        _intentional(identifiersOf(list, "IntentionalDowngrades")) {}
+
+  DemotionStatus statusOf(std::string_view identifier) const {
+    if (_automatic.count(identifier)) return demotedAutomatically;
+    return _intentional.count(identifier) ? demotedByHand : notDemoted;
+  }
+
+ private:
+  using Identifiers = std::unordered_set<std::string_view>;  // borrowed from the list
+
+  static Identifiers identifiersOf(const Value& list, std::string_view key) {
+    Identifiers identifiers;
+    const Dictionary* root = list.dictionary();
+    const Array* elements = root ? (*root)[key].array() : nullptr;
+    if (!elements) return identifiers;
+    for (const Value& element : *elements) {
+      if (auto identifier = element.string()) identifiers.insert(*identifier);
+    }
+    return identifiers;
+  }
+
+  Identifiers _automatic;
+  Identifiers _intentional;
+};
+
+bool createsPlaceholders(std::int32_t restoreType) { return restoreType == 2 || restoreType == 3; }
+
+void fileRestoreListAway(const Platform& platform) {
+  platform.fileSystem.removeItem(restoreListLogPath);
+  ErrorRef error;
+  if (!platform.fileSystem.moveItem(restoreListPath, restoreListLogPath, &error)) {
+    say(platform, "failed to copy harlune metadata. err=%{public}@", error);
+  }
+}
+
+}  // namespace
+
+bool AppsClient::reconcileRestoreOfType(std::int32_t type, ErrorRef* error) try {
+  say(_platform, "reconcileRestoreOfType %d", type);
+  _notifyPanello(_platform, true);
+  _platform.fileSystem.createDirectory(pluginDirectory, true, {});
+  ErrorRef backupError;
+  if (createsPlaceholders(type)) {
+    if (_backupManager && _backupManager->tessaroShouldCreateAppPlaceholders(&backupError)) {
+      _processHarluneRestoreInfo();
+    } else {
+      say(_platform, "Will not reconcile restore of type %d - error %{public}@", type, backupError);
+    }
+  }
+  setError(error, backupError);
+  return true;
+} catch (...) {
+  swallowException(_platform, "reconcileRestoreOfType");
+  return true;
+}
+
+bool AppsClient::_processHarluneRestoreInfo() {
+  if (!_platform.fileSystem.fileExists(restoreListPath)) {
+    say(_platform, "no harlune restore plist found - skipping processing of harlune restored apps");
+    return true;
+  }
+  bool result = false;
+  ErrorRef error;
+  if (auto bytes = _platform.fileSystem.readFile(restoreListPath, &error)) {
+    say(_platform, "processing harlune restore info");
+    const Value list = _platform.propertyLists.propertyListWithData(std::move(*bytes), &error);
+    if (list.dictionary()) {
+      result = _restoreAppsOfList(*list.dictionary());
+    } else {
+      say(_platform, "failed to parse harlune app restore info. err=%{public}@", error);
+    }
+  } else {
+    say(_platform, "failed to read harlune app restore info. err=%{public}@", error);
+  }
+  fileRestoreListAway(_platform);
+  return result;
+}
+
+bool AppsClient::_restoreAppsOfList(const Dictionary& list) {
+  const Value demotedList = _loadDemotedAppsPlist(_platform, demotedAppsPath);
+  const DemotedApps demoted(demotedList);
+  say(_platform, LogCategory::summary, "Demoted Apps: %{public}@", demotedList);
+  bool result = false;
+  for (const auto& [identifier, entry] : list) {
+    const std::uint64_t status = demoted.statusOf(identifier);
+    say(_platform, "processing harlune restore info for '%{public}@' demotionStatus :%lu", identifier, status);
+    if (!entry.dictionary()) {
+      say(_platform, "no harlune restore info for '%{public}@' - skipping", identifier);
+      continue;
+    }
+    const auto metadata = (*entry.dictionary())["HarluneMetadata"].data();
+    if (!metadata) {
+      say(_platform, "no HarluneMetadata for '%{public}@' - ignoring", identifier);
+      continue;
+    }
+    const RestoreInput input{identifier, *metadata, (*entry.dictionary())["ApplicationSINF"].data(),
+                             (*entry.dictionary())["PlaceholderIcon"].data()};
+    result = prepareAppForRestoreUsingCoordination(input, status);
+  }
+  _waitForPlaceholderInstalls();
+  return result;
+}
+
+Value AppsClient::_loadDemotedAppsPlist(const Platform& platform, std::string_view path, ErrorRef* error) {
+  auto bytes = platform.fileSystem.readFile(path, error);
+  if (!bytes || bytes->empty()) return {};
+  Value root = platform.propertyLists.propertyListWithData(std::move(*bytes), error);
+  if (root.isAbsent()) {
+    sayError(platform, "couldn't parse demoted apps list");
+    return {};
+  }
+  if (!root.dictionary()) {
+    sayError(platform, "demoted apps list is not a dictionary");
+    return {};
+  }
+  return root;
+}
+
+}  // namespace appsync

@@ -1,0 +1,116 @@
+#include "coordination/CancellationReason.h"
+#include "core/AppsClient.h"
+#include "core/PathCheck.h"
+#include "core/Paths.h"
+#include "core/PropertyListFile.h"
+#include "core/Say.h"
+#include "platform/Installer.h"
+
+namespace appsync {
+
+using namespace platform;
+
+namespace {
+
+std::string displayNameOf(const Dictionary& metadata, std::string_view bundleIdentifier) {
+  for (const char* key : {"title", "itemName"}) {
+    if (auto name = metadata[key].string()) return std::string(*name);
+  }
+  return std::string(bundleIdentifier);
+}
+
+bool isLaunchProhibited(const Dictionary& metadata) {
+  const Value& flag = metadata["OBApplicationLaunchProhibited"];
+  return (flag.isAbsent() ? metadata["launchProhibited"] : flag).boolValue();
+}
+
+std::uint64_t installTypeFor(std::uint64_t demotionStatus) {
+  switch (demotionStatus) {
+    case 1:
+      return installType::intentionalDowngrade;
+    case 2:
+      return installType::downgrade;
+    default:
+      return installType::restore;
+  }
+}
+
+bool setAttributes(const Platform& platform, RVPlaceholder& placeholder, const Dictionary& metadata,
+                   std::string_view bundleIdentifier) {
+  auto attributes = platform.installCoordination.makePlaceholderAttributes();
+  if (attributes) {
+    attributes->setLaunchProhibited(isLaunchProhibited(metadata));
+    attributes->setBundleVersion(stringOf(metadata["bundleVersion"]));
+  }
+  ErrorRef error;
+  if (!placeholder.setPlaceholderAttributes(attributes, &error)) {
+    sayError(platform, "Error %{public}@ setting placeholder attributes for '%{public}@'", error, bundleIdentifier);
+    return false;
+  }
+  say(platform, "set %{public}@ placeholder attributes for %{public}@", attributes, bundleIdentifier);
+  return true;
+}
+
+bool setStoreMetadata(const Platform& platform, RVPlaceholder& placeholder, const Value& metadata,
+                      std::string_view bundleIdentifier) {
+  ErrorRef error;
+  if (!placeholder.setMetadata(platform.installer.makeStoreMetadata(metadata), &error)) {
+    sayError(platform, "Error %{public}@ setting store metadata for '%{public}@'", error, bundleIdentifier);
+    return false;
+  }
+  say(platform, "set store metadata on placeholder for %{public}@", bundleIdentifier);
+  return true;
+}
+
+bool setSinfData(const Platform& platform, RVPlaceholder& placeholder, std::optional<BytesView> sinfData,
+                 std::string_view bundleIdentifier) {
+  if (!sinfData) return true;
+  ErrorRef error;
+  if (!placeholder.setSinfData(*sinfData, &error)) {
+    sayError(platform, "Error %{public}@ setting SINF data for '%{public}@'", error, bundleIdentifier);
+    return false;
+  }
+  say(platform, "set SINF data on placeholder for %{public}@", bundleIdentifier);
+  return true;
+}
+
+bool closeConfiguration(const Platform& platform, RVPlaceholder& placeholder, std::string_view bundleIdentifier) {
+  ErrorRef error;
+  if (!placeholder.setConfigurationComplete(&error)) {
+    sayError(platform, "Error %{public}@ setting placeholder configuration as complete for '%{public}@'", error,
+             bundleIdentifier);
+    return false;
+  }
+  say(platform, "set placeholder configuration complete for %{public}@", bundleIdentifier);
+  return true;
+}
+
+}  // namespace
+
+PlaceholderRef AppsClient::_placeHolderForBundleIdentifierWithHarluneMetadata(const RestoreInput& input,
+                                                                              const Value& metadata,
+                                                                              std::uint64_t demotionStatus) {
+  const std::string_view identifier = input.bundleIdentifier;
+  const Dictionary& entries = *metadata.dictionary();
+  const std::string directory = placeholderAppPathForBundleIdentifier(identifier);
+  if (!createPlaceHolderPath(directory, identifier, ownerAttributes())) return nullptr;
+  const std::string iconPath = joinedPath(directory, iconFileName);
+  std::uint64_t iconSize = 0;
+  writeIconData(input.iconData, iconPath, &iconSize, identifier, ownerAttributes());
+
+  auto placeholder =
+      _placeHolderForBundleIdentifier(identifier, displayNameOf(entries, identifier), installTypeFor(demotionStatus));
+  if (!placeholder) return nullptr;
+  const bool hasIcon =
+      iconSize == 0 || _createIconPromiseForBundleIdentifier(identifier, iconPath, iconSize, placeholder, false);
+  if (hasIcon && setAttributes(_platform, *placeholder, entries, identifier) &&
+      setStoreMetadata(_platform, *placeholder, metadata, identifier) &&
+      setSinfData(_platform, *placeholder, input.sinfData, identifier) &&
+      closeConfiguration(_platform, *placeholder, identifier)) {
+    return placeholder;
+  }
+  placeholder->cancelForReason(cancellationReason(CancellationCode::restorePreparationFailed), RVClientSync);
+  return nullptr;
+}
+
+}  // namespace appsync
