@@ -138,7 +138,9 @@ std::vector<std::shared_ptr<TSMutableAccountInfo>> AppsClient::accountsForAssets
     accounts.push_back(std::move(record));
     seen.insert(*identifier.string());
   });
-  say(_platform, "Returning accountInfo: %{public}@", accounts);
+  StringSet shown;
+  for (const auto& account : accounts) shown.insert(account->describe());
+  say(_platform, "Returning accountInfo: %{public}@", shown);
   return accounts;
 } catch (...) {
   swallowException(_platform, "accountsForAssets");

@@ -26,8 +26,7 @@ int readDigits(std::string_view text, std::size_t at, std::size_t digits) {
 }  // namespace
 
 std::optional<DateText> dateText(Date date) noexcept {
-  // Written so that what is not a number is refused as well.
-  if (!(date.seconds >= earliestDateWithText && date.seconds < latestDateWithText + 1)) return {};
+  if (!hasText(date)) return {};
   std::chrono::seconds seconds(static_cast<std::int64_t>(std::floor(date.seconds)));
   auto day = std::chrono::floor<std::chrono::days>(seconds);
   std::chrono::year_month_day calendar(referenceDay + day);

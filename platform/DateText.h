@@ -11,6 +11,11 @@ namespace platform {
 inline constexpr double earliestDateWithText = -63113904000;
 inline constexpr double latestDateWithText = 252423993599;
 
+/// Written so that what is not a number has none as well.
+constexpr bool hasText(Date date) noexcept {
+  return date.seconds >= earliestDateWithText && date.seconds <= latestDateWithText;
+}
+
 /// "YYYY-MM-DDThh:mm:ssZ".
 struct DateText {
   char characters[20];

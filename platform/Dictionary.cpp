@@ -40,7 +40,6 @@ struct DictionaryIndex {
 
 namespace {
 
-constexpr std::size_t linearLimit = 8;
 constexpr std::size_t nowhere = static_cast<std::size_t>(-1);
 
 /// Empties the slot and closes the gap, so that no search stops short.

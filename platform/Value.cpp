@@ -9,14 +9,6 @@
 #include "platform/Arena.h"
 
 namespace platform {
-namespace {
-
-std::uint32_t checkedLength(std::size_t length) {
-  if (length > std::numeric_limits<std::uint32_t>::max()) throw std::length_error("a value of more than 4 GiB");
-  return static_cast<std::uint32_t>(length);
-}
-
-}  // namespace
 
 Value::Value(bool boolean) noexcept : _kind(Kind::boolean) { _payload.bits = boolean; }
 
@@ -31,13 +23,11 @@ Value::Value(Date date) noexcept : _kind(Kind::date) { _payload.real = date.seco
 Value::Value(std::string_view text) : Value(own(Kind::string, text)) {}
 Value Value::makeData(BytesView bytes) { return own(Kind::data, bytes); }
 
-Value::Value(Kind kind, std::string_view bytes) : _kind(kind), _length(checkedLength(bytes.size())) {
-  _payload.bytes = bytes.empty() ? "" : bytes.data();
-}
 Value::Value(Array* array) noexcept : _kind(Kind::array) { _payload.array = array; }
 Value::Value(Dictionary* dictionary) noexcept : _kind(Kind::dictionary) { _payload.dictionary = dictionary; }
 
 Value Value::own(Kind kind, std::string_view bytes) {
+  if (bytes.size() > std::numeric_limits<std::uint32_t>::max()) throw std::length_error("a value of more than 4 GiB");
   Value value(kind, bytes);
   if (bytes.empty()) return value;
   char* block = new char[bytes.size()];

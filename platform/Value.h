@@ -98,7 +98,9 @@ class Value {
   };
   explicit Value(Number number) noexcept;
   /// What a container holds: bytes and containers lie in the container's arena, so there is nothing to free.
-  Value(Kind kind, std::string_view bytes);
+  Value(Kind kind, std::string_view bytes) noexcept : _kind(kind), _length(static_cast<std::uint32_t>(bytes.size())) {
+    _payload.bytes = bytes.empty() ? "" : bytes.data();
+  }
   explicit Value(Array* array) noexcept;
   explicit Value(Dictionary* dictionary) noexcept;
 
@@ -189,6 +191,8 @@ class Dictionary {
   friend class Value;
   friend class Array;
   friend class ValueBuilder;
+
+  static constexpr std::size_t linearLimit = 8;
 
   explicit Dictionary(Arena* arena) noexcept : _arena(arena) {}
   std::size_t find(std::string_view key) const noexcept;

@@ -69,12 +69,13 @@ bool AppsClient::CoordinatedRestore::restoreApp() {
 }
 
 bool AppsClient::CoordinatedRestore::acquire(RVCoordinatorKind kind) {
-  _metadata = _platform.propertyLists.propertyListWithData(Bytes(_input.harluneMetadata), &_error);
+  ErrorRef error;
+  _metadata = _platform.propertyLists.propertyListWithData(Bytes(_input.harluneMetadata), &error);
   if (!_metadata.dictionary()) {
+    _error = error;
     sayError(_platform, "failed to parse harlune metadata for '%{public}@'. err=%{public}@", _bundleIdentifier, _error);
     return false;
   }
-  ErrorRef error;
   _coordinator = _platform.installCoordination.coordinatorForAppWithBundleID(kind, _bundleIdentifier, RVClientSync,
                                                                              true, nullptr, &error);
   if (!_coordinator) {
