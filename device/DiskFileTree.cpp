@@ -1,0 +1,314 @@
+#include "device/DiskFileTree.h"
+
+#include <fcntl.h>
+#include <grp.h>
+#include <pwd.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <new>
+
+#include "device/DevicePath.h"
+
+namespace device {
+
+using platform::Bytes;
+using platform::BytesView;
+using platform::ErrorRef;
+using platform::FileAttributes;
+using platform::Value;
+
+namespace {
+
+constexpr std::size_t chunkSize = 128 * 1024;
+
+/// -1 for a name that is absent or unknown here, which leaves the owner as it is.
+uid_t userNamed(const Value& name) {
+  char space[4096];
+  passwd entry;
+  passwd* found = nullptr;
+  auto text = name.string();
+  if (text) ::getpwnam_r(std::string(*text).c_str(), &entry, space, sizeof space, &found);
+  return found ? found->pw_uid : static_cast<uid_t>(-1);
+}
+gid_t groupNamed(const Value& name) {
+  char space[4096];
+  group entry;
+  group* found = nullptr;
+  auto text = name.string();
+  if (text) ::getgrnam_r(std::string(*text).c_str(), &entry, space, sizeof space, &found);
+  return found ? found->gr_gid : static_cast<gid_t>(-1);
+}
+
+void applyAttributes(const DiskPlace& place, const Value& attributes) {
+  const auto* entries = attributes.dictionary();
+  if (!entries || ::geteuid() != 0) return;
+  uid_t owner = userNamed((*entries)[platform::FXFileOwnerAccountName]);
+  gid_t group = groupNamed((*entries)[platform::FXFileGroupOwnerAccountName]);
+  if (owner == static_cast<uid_t>(-1) && group == static_cast<gid_t>(-1)) return;
+  // What cannot be applied is left: the file counts, not its owner.
+  [[maybe_unused]] int ignored = ::fchownat(place.directory(), place.name(), owner, group, AT_SYMLINK_NOFOLLOW);
+}
+
+/// Up to `count` bytes into `chunk`; fewer at the end only.
+int readChunk(int file, std::size_t count, Bytes& chunk) {
+  std::size_t filled = 0;
+  chunk.resize(count);
+  while (filled < count) {
+    ssize_t got = ::read(file, chunk.data() + filled, count - filled);
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0) return errno;
+    if (got == 0) break;
+    filled += static_cast<std::size_t>(got);
+  }
+  chunk.resize(filled);
+  return 0;
+}
+
+int readWhole(int file, Bytes& contents) {
+  struct stat status;
+  if (::fstat(file, &status) != 0) return errno;
+  if (static_cast<std::uint64_t>(status.st_size) > largestWholeRead) return EFBIG;
+  // One byte more than expected, so that a file that is as long as it says is read in one go.
+  if (int failure = readChunk(file, static_cast<std::size_t>(status.st_size) + 1, contents)) return failure;
+  Bytes more;
+  while (contents.size() > static_cast<std::size_t>(status.st_size)) {
+    if (int failure = readChunk(file, chunkSize, more)) return failure;
+    if (more.empty()) break;
+    contents += more;
+    if (contents.size() > largestWholeRead) return EFBIG;
+  }
+  return 0;
+}
+
+class DiskFileWriter final : public FileWriter {
+ public:
+  DiskFileWriter(FileDescriptor file, std::string_view path) : _file(std::move(file)), _path(path) {}
+
+  bool write(BytesView bytes, ErrorRef* error) override {
+    return answerFileOperation(writeWhole(_file.get(), bytes), _path, error);
+  }
+  bool close(bool durable, ErrorRef* error) override {
+    int failure = durable && ::fsync(_file.get()) != 0 ? errno : 0;
+    _file = FileDescriptor();
+    return answerFileOperation(failure, _path, error);
+  }
+
+ private:
+  FileDescriptor _file;
+  const std::string _path;
+};
+
+class DiskFileReader final : public FileReader {
+ public:
+  DiskFileReader(FileDescriptor file, std::string_view path) : _file(std::move(file)), _path(path) {}
+
+  std::optional<Bytes> read(std::size_t count, ErrorRef* error) override {
+    Bytes chunk;
+    if (!answerFileOperation(readChunk(_file.get(), count, chunk), _path, error)) return std::nullopt;
+    return chunk;
+  }
+  bool seek(std::uint64_t offset, ErrorRef* error) override {
+    bool there = ::lseek(_file.get(), static_cast<off_t>(offset), SEEK_SET) >= 0;
+    return answerFileOperation(there ? 0 : errno, _path, error);
+  }
+
+ private:
+  FileDescriptor _file;
+  const std::string _path;
+};
+
+/// Fails when something is there; the second way, for file systems that cannot, is not atomic towards other processes.
+int renameToNothing(const DiskPlace& from, const DiskPlace& to) {
+  if (::renameat2(from.directory(), from.name(), to.directory(), to.name(), RENAME_NOREPLACE) == 0) return 0;
+  if (errno != EINVAL && errno != ENOSYS) return errno;
+  struct stat status;
+  if (::fstatat(to.directory(), to.name(), &status, AT_SYMLINK_NOFOLLOW) == 0) return EEXIST;
+  return ::renameat(from.directory(), from.name(), to.directory(), to.name()) == 0 ? 0 : errno;
+}
+
+int moveBetween(const DiskPlace& from, const DiskPlace& to) {
+  if (int failure = renameToNothing(from, to)) return failure;
+  if (int failure = to.syncDirectory()) return failure;
+  return from.syncDirectory();
+}
+
+int copyContents(int from, int to) {
+  struct stat status;
+  if (::fstat(from, &status) != 0) return errno;
+  if ((status.st_mode & S_IXUSR) && ::fchmod(to, 0755) != 0) return errno;
+  Bytes chunk;
+  do {
+    if (int failure = readChunk(from, chunkSize, chunk)) return failure;
+    if (int failure = writeWhole(to, chunk)) return failure;
+  } while (!chunk.empty());
+  return 0;
+}
+
+}  // namespace
+
+bool DiskFileTree::removeItem(std::string_view path, ErrorRef* error) {
+  DiskPlace place;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.remove();
+  return answerFileOperation(failure, path, error);
+}
+
+int DiskFileTree::makeDirectory(std::string_view path, bool intermediates, const Value& attributes) const {
+  DiskPlace place;
+  if (int failure = DiskPlace::find(_root, path, intermediates, place)) return failure;
+  if (place.isRoot()) return intermediates ? 0 : EEXIST;
+  if (::mkdirat(place.directory(), place.name(), 0777) == 0) {
+    applyAttributes(place, attributes);
+    return 0;
+  }
+  if (errno != EEXIST || !intermediates) return errno;
+  struct stat status;
+  if (int failure = place.status(status)) return failure;
+  return S_ISDIR(status.st_mode) ? 0 : EEXIST;
+}
+
+bool DiskFileTree::createDirectory(std::string_view path, bool withIntermediateDirectories, const Value& attributes,
+                                   ErrorRef* error) {
+  return answerFileOperation(makeDirectory(path, withIntermediateDirectories, attributes), path, error);
+}
+
+bool DiskFileTree::moveItem(std::string_view from, std::string_view to, ErrorRef* error) {
+  DiskPlace source, destination;
+  struct stat status;
+  int failure = find(from, source);
+  if (failure == 0) failure = source.isRoot() ? EBUSY : source.status(status);
+  if (failure) return answerFileOperation(failure, from, error);
+  failure = find(to, destination);
+  if (failure == 0) failure = destination.isRoot() ? EEXIST : moveBetween(source, destination);
+  return answerFileOperation(failure, to, error);
+}
+
+bool DiskFileTree::copyItem(std::string_view from, std::string_view to, ErrorRef* error) {
+  FileDescriptor source;
+  if (int failure = openFile(from, source)) return answerFileOperation(failure, from, error);
+  DiskPlace destination;
+  int failure = find(to, destination);
+  if (failure == 0) failure = destination.replaceFile([&](int file) { return copyContents(source.get(), file); });
+  return answerFileOperation(failure, to, error);
+}
+
+bool DiskFileTree::fileExists(std::string_view path, bool* isDirectory) {
+  auto attributes = attributesOfItem(path, nullptr);
+  if (isDirectory) *isDirectory = attributes && attributes->isDirectory;
+  return attributes.has_value();
+}
+
+std::optional<FileAttributes> DiskFileTree::attributesOfItem(std::string_view path, ErrorRef* error) {
+  DiskPlace place;
+  struct stat status;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.status(status);
+  if (!answerFileOperation(failure, path, error)) return std::nullopt;
+  bool isDirectory = S_ISDIR(status.st_mode);
+  return FileAttributes{isDirectory, isDirectory ? 0 : static_cast<std::uint64_t>(status.st_size)};
+}
+
+bool DiskFileTree::createFile(std::string_view path, BytesView contents, const Value& attributes) {
+  DiskPlace place;
+  if (find(path, place) != 0) return false;
+  if (place.replaceFile([&](int file) { return writeWhole(file, contents); }) != 0) return false;
+  applyAttributes(place, attributes);
+  return true;
+}
+
+int DiskFileTree::openFile(std::string_view path, FileDescriptor& file) const {
+  DiskPlace place;
+  if (int failure = find(path, place)) return failure;
+  return place.openFile(file);
+}
+
+std::optional<Bytes> DiskFileTree::readFile(std::string_view path, ErrorRef* error) {
+  FileDescriptor file;
+  Bytes contents;
+  int failure = openFile(path, file);
+  try {
+    if (failure == 0) failure = readWhole(file.get(), contents);
+  } catch (const std::bad_alloc&) {
+    failure = ENOMEM;
+  }
+  if (!answerFileOperation(failure, path, error)) return std::nullopt;
+  return contents;
+}
+
+bool DiskFileTree::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error) {
+  DiskPlace place;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.replaceFile([&](int file) { return writeWhole(file, contents); });
+  if (failure == 0) failure = place.syncDirectory();
+  return answerFileOperation(failure, path, error);
+}
+
+int DiskFileTree::utimes(std::string_view path, int& errorNumber) {
+  DiskPlace place;
+  struct stat status;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.status(status);
+  if (failure == 0 && ::utimensat(place.directory(), place.name(), nullptr, AT_SYMLINK_NOFOLLOW) != 0) failure = errno;
+  if (failure == 0) return 0;
+  errorNumber = failure;
+  return -1;
+}
+
+std::optional<std::vector<FileTree::Entry>> DiskFileTree::list(std::string_view path, ErrorRef* error) {
+  DiskPlace place;
+  FileDescriptor directory;
+  std::vector<std::string> names;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.openDirectory(directory);
+  if (failure == 0) failure = namesInDirectory(directory.get(), names);
+  if (!answerFileOperation(failure, path, error)) return std::nullopt;
+  std::sort(names.begin(), names.end());
+  std::vector<Entry> entries;
+  for (auto& name : names) {
+    struct stat status;
+    if (::fstatat(directory.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) continue;  // gone again
+    if (S_ISDIR(status.st_mode)) entries.push_back({std::move(name), true, 0});
+    if (S_ISREG(status.st_mode))
+      entries.push_back({std::move(name), false, static_cast<std::uint64_t>(status.st_size)});
+  }
+  return entries;
+}
+
+std::unique_ptr<FileWriter> DiskFileTree::createNew(std::string_view path, bool executable, ErrorRef* error) {
+  DiskPlace place;
+  FileDescriptor file;
+  int failure = find(path, place);
+  if (failure == 0) {
+    file = FileDescriptor(::openat(place.directory(), place.name(),
+                                   O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, executable ? 0777 : 0666));
+    if (!file.isOpen()) failure = errno;
+  }
+  if (!answerFileOperation(failure, path, error)) return nullptr;
+  return std::make_unique<DiskFileWriter>(std::move(file), path);
+}
+
+std::unique_ptr<FileReader> DiskFileTree::openForReading(std::string_view path, ErrorRef* error) {
+  FileDescriptor file;
+  if (!answerFileOperation(openFile(path, file), path, error)) return nullptr;
+  return std::make_unique<DiskFileReader>(std::move(file), path);
+}
+
+bool DiskFileTree::syncDirectory(std::string_view path, ErrorRef* error) {
+  DiskPlace place;
+  FileDescriptor directory;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.openDirectory(directory);
+  if (failure == 0 && ::fsync(directory.get()) != 0 && errno != EINVAL) failure = errno;
+  return answerFileOperation(failure, path, error);
+}
+
+std::unique_ptr<FileTree> openDiskFileTree(const std::string& root, ErrorRef* error) {
+  // The folder itself is the owner's choice and may be reached through links.
+  FileDescriptor opened(::open(root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  if (!answerFileOperation(opened.isOpen() ? 0 : errno, root, error)) return nullptr;
+  return std::make_unique<DiskFileTree>(std::move(opened));
+}
+
+}  // namespace device

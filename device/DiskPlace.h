@@ -1,0 +1,53 @@
+#pragma once
+
+#include <functional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "device/FileDescriptor.h"
+
+struct stat;
+
+namespace device {
+
+/// A name in an open directory: where the resolver's walk from a root ended. No step of the walk, and nothing done at
+/// the place, follows a link. The functions answer 0 or the system's error number: ELOOP for a link, EOPNOTSUPP for
+/// what is neither a regular file nor a directory nor a link.
+class DiskPlace {
+ public:
+  /// The place of a path of the device below the root. All but the last name must be directories; with
+  /// `makeDirectories` missing ones are made.
+  static int find(const FileDescriptor& root, std::string_view path, bool makeDirectories, DiskPlace& place);
+
+  bool isRoot() const { return _isRoot; }
+  int directory() const { return _directory.get(); }
+  const char* name() const { return _name.c_str(); }
+
+  /// What is there: a regular file or a directory.
+  int status(struct stat& status) const;
+  /// 0 when a regular file may be put there: nothing or another one is there now.
+  int mayHoldFile() const;
+  int openFile(FileDescriptor& file) const;
+  int openDirectory(FileDescriptor& directory) const;
+  /// Makes the entry's presence or absence durable.
+  int syncDirectory() const;
+
+  /// Puts a new file there, in place of an older one: filled under a temporary name in the same directory, flushed,
+  /// renamed. On failure nothing has changed and the temporary file is gone.
+  int replaceFile(const std::function<int(int file)>& fill) const;
+  /// With everything in it. A link, or whatever else it is, goes itself.
+  int remove() const;
+
+ private:
+  FileDescriptor _directory;
+  std::string _name;
+  bool _isRoot = false;
+};
+
+/// The names in an open directory, in no order.
+int namesInDirectory(int directory, std::vector<std::string>& names);
+/// All of it.
+int writeWhole(int file, std::string_view bytes);
+
+}  // namespace device

@@ -1,0 +1,13 @@
+#pragma once
+
+#include <cstddef>
+
+#include "device/FileTree.h"
+
+namespace device {
+
+/// Removes what an atomic write that never came to its end left behind, in every directory of the tree. Answers how
+/// many files went; one that cannot be removed stays until the next time.
+std::size_t removeTemporaryFiles(FileTree& files);
+
+}  // namespace device
