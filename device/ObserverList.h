@@ -5,6 +5,7 @@
 #include <memory>
 #include <mutex>
 #include <thread>
+#include <type_traits>
 #include <utility>
 #include <variant>
 #include <vector>
@@ -54,8 +55,8 @@ class ObserverList {
     removeIf(observer, [](const Info&) { return true; });
   }
 
-  /// Calls `callback(observer, info)` with each observer alive whose info is `wanted`, kept alive meanwhile; one that
-  /// is removed before its turn is not called. Answers how many were.
+  /// Calls `callback(observer, info)` (a pointer where observers have no type) with each observer alive whose info is
+  /// `wanted`, kept alive meanwhile; one that is removed before its turn is not called. Answers how many were.
   template <class Wanted, class Callback>
   std::size_t deliverIf(Wanted&& wanted, Callback&& callback) {
     std::vector<std::shared_ptr<Entry>> entries;
@@ -128,7 +129,10 @@ class ObserverList {
       if (entry.removed) return 0;
       entry.running.push_back(self);
     }
-    callback(*observer, entry.info);
+    if constexpr (std::is_void_v<Observer>)
+      callback(observer.get(), entry.info);
+    else
+      callback(*observer, entry.info);
     {
       std::lock_guard lock(_mutex);
       entry.running.erase(std::find(entry.running.begin(), entry.running.end(), self));
