@@ -1,0 +1,35 @@
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace tsd {
+
+/// What the daemon reports of one app's asset, where that differs from an ordinary download.
+struct AssetReport {
+  enum class Path : std::uint8_t {
+    absolute,
+    relative,  // to the public staging directory
+    none,
+    recorded,  // none, and the restore state knows it
+    text,      // whatever `pathText` says
+  };
+
+  std::optional<bool> isDownload;
+  std::optional<bool> isRestore;
+  std::optional<std::int64_t> completedAssetParts;
+  Path path = Path::absolute;
+  std::string pathText;
+  bool stall = false;  // progress, and never an end
+};
+
+/// By bundle identifier.
+using AssetReports = std::map<std::string, AssetReport, std::less<>>;
+
+/// Adds what one `APP:KEY=VALUE,…` says. Throws a usage `CommandError` that names what is not understood.
+void addAssetReport(AssetReports& reports, std::string_view text);
+
+}  // namespace tsd

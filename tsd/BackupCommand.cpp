@@ -1,0 +1,23 @@
+#include "tsd/Commands.h"
+#include "tsd/Daemon.h"
+#include "tsd/DeviceSession.h"
+#include "tsd/Output.h"
+
+namespace tsd {
+
+ExitCode runBackup(const CommandContext& context, const DeviceOnlyOptions& options) {
+  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
+  Daemon daemon(session.device(), session.loadPlugin());
+  daemon.postStartupNotification();
+  daemon.prepareForBackup();
+  if (context.options.json) {
+    auto document = startDocument(context.options.command);
+    document.dictionary()->set("result", "done");
+    writeDocument(document);
+  } else {
+    writeOutput("The apps' store metadata are ready for a backup.\n");
+  }
+  return ExitCode::done;
+}
+
+}  // namespace tsd

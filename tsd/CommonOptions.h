@@ -1,0 +1,24 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "device/Injection.h"
+
+namespace tsd {
+
+enum class ProgressMode : std::uint8_t { automatic, plain, tty, none };
+
+/// What every subcommand takes.
+struct CommonOptions {
+  std::string command;  // the subcommand's name
+  bool json = false;    // one JSON document on standard output
+  ProgressMode progress = ProgressMode::automatic;
+  std::string log;     // file for the system log; empty: none
+  std::string calls;   // file for the call journal; empty: none
+  std::string plugin;  // file of the plug-in; empty: the one beside the program
+  std::vector<device::InjectionRule> rules;
+};
+
+}  // namespace tsd

@@ -1,0 +1,55 @@
+#include "tsd/DeviceSession.h"
+
+#include "device/Journal.h"
+#include "tsd/CommandError.h"
+
+namespace tsd {
+
+DeviceSession::DeviceSession(const CommandContext& context, Setup setup) : _context(context), _lock(setup.folder) {
+  if (!context.options.log.empty()) _log.emplace(context.options.log);
+  if (!context.options.calls.empty()) _calls.emplace(context.options.calls);
+  platform::ErrorRef error;
+  _device = device::openDevice(setup.folder, device::makeThreadedEventQueue(), deviceOptions(setup), &error);
+  if (!_device) throw CommandError(setup.folder + ": " + textOf(error));
+}
+
+DeviceSession::~DeviceSession() {
+  unloadPlugin();
+  _device->events().stop();
+}
+
+void DeviceSession::unloadPlugin() {
+  _client.reset();
+  _device->events().drain();
+}
+
+device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
+  device::DeviceOptions options;
+  options.mainBundleIdentifier = setup.mainBundleIdentifier;
+  options.deviceService = setup.deviceService;
+  options.changed = setup.changed;
+  options.rules = _context.options.rules;
+  if (_log) {
+    options.log = [this](const device::LogRecord& record) {
+      const char* level = record.level == platform::LogLevel::error ? "error" : "default";
+      _log->write(currentTimeText() + " " + level + " " + record.category + " " + record.message);
+    };
+  }
+  if (_calls) {
+    options.journal = [this](const device::CallRecord& record) { _calls->write(device::journalLine(record)); };
+  }
+  return options;
+}
+
+platform::TSClient& DeviceSession::loadPlugin() { return loadPlugin(_device->platform()); }
+
+platform::TSClient& DeviceSession::loadPlugin(const platform::Platform& platform) {
+  if (!_loader) {
+    const std::string& chosen = _context.options.plugin;
+    _loader.emplace(chosen.empty() ? PluginLoader::defaultFile() : chosen);
+  }
+  _client = _loader->create(platform);
+  return *_client;
+}
+
+}  // namespace tsd

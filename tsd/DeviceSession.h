@@ -1,0 +1,57 @@
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "device/LocalDevice.h"
+#include "platform/TSClient.h"
+#include "tsd/Commands.h"
+#include "tsd/DeviceLock.h"
+#include "tsd/LineFile.h"
+#include "tsd/PluginLoader.h"
+
+namespace tsd {
+
+/// A device folder in use by this process: locked, opened, with the log and the journal that the common options ask
+/// for, and on demand with a plug-in object on it. On the way out the plug-in goes first, then everything that was
+/// posted runs, then the device closes.
+class DeviceSession {
+ public:
+  struct Setup {
+    std::string folder;
+    std::string mainBundleIdentifier = "com.vantor.tsd";
+    platform::TSDeviceService* deviceService = nullptr;
+    std::function<void(const device::AppStatus&)> changed;
+  };
+
+  /// Throws a `CommandError` when any of it fails.
+  DeviceSession(const CommandContext& context, Setup setup);
+  ~DeviceSession();
+  DeviceSession(const DeviceSession&) = delete;
+  DeviceSession& operator=(const DeviceSession&) = delete;
+
+  device::LocalDevice& device() { return *_device; }
+  device::FileTree& files() { return _device->files(); }
+
+  /// Loads the plug-in and makes its object. At most once. `platform`, by default the device's,
+  /// outlives `unloadPlugin`.
+  platform::TSClient& loadPlugin();
+  platform::TSClient& loadPlugin(const platform::Platform& platform);
+  /// Lets the plug-in's object go, and everything run that was posted for it.
+  void unloadPlugin();
+
+ private:
+  device::DeviceOptions deviceOptions(const Setup& setup);
+
+  const CommandContext& _context;
+  std::optional<PluginLoader> _loader;
+  DeviceLock _lock;
+  std::optional<LineFile> _log;
+  std::optional<LineFile> _calls;
+  std::unique_ptr<device::LocalDevice> _device;
+  std::shared_ptr<platform::TSClient> _client;
+};
+
+}  // namespace tsd

@@ -1,0 +1,20 @@
+#include "tsd/CommandError.h"
+#include "tsd/Commands.h"
+#include "tsd/Output.h"
+
+namespace tsd {
+
+ExitCode runInit(const CommandContext& context, const DeviceOnlyOptions& options) {
+  platform::ErrorRef error;
+  if (!device::createDevice(options.device, &error)) throw CommandError(options.device + ": " + textOf(error));
+  if (context.options.json) {
+    auto document = startDocument(context.options.command);
+    document.dictionary()->set("result", "done");
+    writeDocument(document);
+  } else {
+    writeOutput(options.device + ": an empty device\n");
+  }
+  return ExitCode::done;
+}
+
+}  // namespace tsd

@@ -1,0 +1,29 @@
+#pragma once
+
+#include <cstdio>
+#include <memory>
+#include <string>
+#include <string_view>
+
+namespace tsd {
+
+/// A text file that is written line by line. A line is with the system when `write` returns, so that it is there even
+/// when the process dies next. One thread at a time.
+class LineFile {
+ public:
+  /// Replaces an older file. Throws a `CommandError` that names it.
+  explicit LineFile(const std::string& path);
+  /// Line ends inside become spaces. Failures are ignored: a full disk must not stop what is being recorded.
+  void write(std::string line);
+
+ private:
+  struct Close {
+    void operator()(std::FILE* file) const { std::fclose(file); }
+  };
+  std::unique_ptr<std::FILE, Close> _file;
+};
+
+/// Now, as "2024-02-29T12:34:56.789Z".
+std::string currentTimeText();
+
+}  // namespace tsd

@@ -1,0 +1,78 @@
+#include "tsd/Output.h"
+
+#include <algorithm>
+
+#include "device/Journal.h"
+#include "tsd/Console.h"
+
+namespace tsd {
+
+using platform::Value;
+
+Value startDocument(std::string_view command) {
+  Value document = Value::makeDictionary();
+  document.dictionary()->set("schema", 1);
+  if (!command.empty()) document.dictionary()->set("command", command);
+  return document;
+}
+
+void writeDocument(const Value& document) { writeOutput(device::jsonText(document, 2) + "\n"); }
+
+void writeFailure(const CommonOptions& options, ExitCode code, std::string_view message) {
+  Value document = startDocument(options.command);
+  document.dictionary()->set("result", "failed");
+  Value error = Value::makeDictionary();
+  error.dictionary()->set("exitCode", static_cast<int>(code));
+  error.dictionary()->set("message", message);
+  document.dictionary()->set("error", error);
+  writeDocument(document);
+}
+
+Value arrayOf(const std::vector<std::string>& texts) {
+  Value array = Value::makeArray();
+  array.array()->reserve(texts.size());
+  for (const auto& each : texts) array.array()->append(each);
+  return array;
+}
+
+std::vector<std::size_t> Table::widths() const {
+  constexpr std::size_t lineWidth = 80;
+  constexpr std::size_t gap = 2;
+  std::vector<std::size_t> widths;
+  std::size_t total = gap * (_columns.size() - 1);
+  for (std::size_t column = 0; column < _columns.size(); ++column) {
+    std::size_t width = columnsOf(_columns[column].title);
+    for (const auto& row : _rows) width = std::max(width, columnsOf(printable(row[column])));
+    widths.push_back(width);
+    total += width;
+  }
+  while (total > lineWidth) {
+    std::size_t widest = _columns.size();
+    for (std::size_t column = 0; column < _columns.size(); ++column) {
+      bool mayShrink = _columns[column].least && widths[column] > _columns[column].least;
+      if (mayShrink && (widest == _columns.size() || widths[column] > widths[widest])) widest = column;
+    }
+    if (widest == _columns.size()) break;
+    --widths[widest];
+    --total;
+  }
+  return widths;
+}
+
+std::string Table::text() const {
+  auto columns = widths();
+  std::string text;
+  auto appendRow = [&](auto cell) {
+    std::string line;
+    for (std::size_t column = 0; column < columns.size(); ++column) {
+      line += fitted(cell(column), columns[column]) + "  ";
+    }
+    line.erase(line.find_last_not_of(' ') + 1);
+    text += line + "\n";
+  };
+  appendRow([&](std::size_t column) { return _columns[column].title; });
+  for (const auto& row : _rows) appendRow([&](std::size_t column) { return row[column]; });
+  return text;
+}
+
+}  // namespace tsd

@@ -1,0 +1,43 @@
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/Value.h"
+#include "tsd/CommonOptions.h"
+#include "tsd/ExitCode.h"
+
+namespace tsd {
+
+/// The beginning of a command's JSON document: its schema number and, unless empty, the command's name.
+platform::Value startDocument(std::string_view command);
+/// Writes the document to standard output.
+void writeDocument(const platform::Value& document);
+/// The document of a command that could not go on.
+void writeFailure(const CommonOptions& options, ExitCode code, std::string_view message);
+
+/// An array of strings.
+platform::Value arrayOf(const std::vector<std::string>& texts);
+
+/// A table for people: columns as wide as their content, the whole no wider than 80 columns as long as the columns
+/// that may be shortened allow it.
+class Table {
+ public:
+  struct Column {
+    std::string title;
+    std::size_t least = 0;  // may be shortened to this width; 0: never
+  };
+  explicit Table(std::vector<Column> columns) : _columns(std::move(columns)) {}
+  void add(std::vector<std::string> cells) { _rows.push_back(std::move(cells)); }
+  bool empty() const { return _rows.empty(); }
+  std::string text() const;
+
+ private:
+  std::vector<std::size_t> widths() const;
+
+  std::vector<Column> _columns;
+  std::vector<std::vector<std::string>> _rows;
+};
+
+}  // namespace tsd

@@ -1,0 +1,65 @@
+#include "tsd/CommandError.h"
+#include "tsd/Commands.h"
+#include "tsd/DeviceSession.h"
+#include "tsd/FileConduit.h"
+#include "tsd/Output.h"
+
+namespace tsd {
+namespace {
+
+bool hasOpenInstall(device::LocalDevice& device, const std::string& id) {
+  auto app = device.app(id);
+  if (app && (app->state == "placeholder" || app->state == "updating")) return true;
+  for (const auto& coordinator : device.status().coordinators) {
+    if (coordinator.app == id) return true;
+  }
+  return false;
+}
+
+void finish(const CommandContext& context, DeviceSession& session, const StoreOptions& options) {
+  std::string path;
+  if (!options.package.empty()) {
+    if (!isFileName(options.app)) throw CommandError(options.app + ": cannot be a package's name");
+    path = std::string(packagesDirectory) + "/" + options.app + ".pkg";
+    FileConduit(session.files(), context.console).pushFile(options.package, path);
+  }
+  auto& device = session.device();
+  platform::ErrorRef error;
+  // An app that the store has not begun with is begun and finished in one go.
+  bool begun = hasOpenInstall(device, options.app) || device.beginStoreInstall(options.app, options.install, &error);
+  bool done = begun && device.finishStoreInstall(options.app, path, &error);
+  device.events().drain();
+  if (!path.empty() && session.files().fileExists(path)) session.files().removeItem(path);
+  if (!done) throw CommandError(options.app + ": " + textOf(error));
+}
+
+}  // namespace
+
+ExitCode runStore(const CommandContext& context, const StoreOptions& options) {
+  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
+  auto& device = session.device();
+  if (options.finish) {
+    finish(context, session, options);
+  } else {
+    platform::ErrorRef error;
+    if (!device.beginStoreInstall(options.app, options.install, &error)) {
+      throw CommandError(options.app + ": " + textOf(error));
+    }
+    device.events().drain();
+  }
+  auto app = device.app(options.app);
+  if (context.options.json) {
+    auto document = startDocument(context.options.command);
+    document.dictionary()->set("result", "done");
+    document.dictionary()->set("app", options.app);
+    document.dictionary()->set("state", app ? app->state : "");
+    document.dictionary()->set("version", app ? app->version : "");
+    writeDocument(document);
+  } else {
+    writeOutput(printable(options.app) + ": the store has " + (options.finish ? "finished" : "started") +
+                " its install\n");
+  }
+  return ExitCode::done;
+}
+
+}  // namespace tsd

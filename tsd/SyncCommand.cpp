@@ -1,0 +1,59 @@
+#include <cstdlib>
+
+#include "tsd/CommandError.h"
+#include "tsd/Commands.h"
+#include "tsd/Output.h"
+#include "tsd/SyncRun.h"
+
+namespace tsd {
+
+using platform::Value;
+
+namespace {
+
+/// The document of the last sync, and with several all of them under "runs".
+Value document(const std::string& command, const std::vector<SyncReport>& reports) {
+  Value document = reports.back().document(command);
+  if (reports.size() == 1) return document;
+  Value runs = Value::makeArray();
+  for (const auto& report : reports) runs.array()->append(report.document(command));
+  document.dictionary()->set("runs", runs);
+  return document;
+}
+
+void show(const CommandContext& context, const std::vector<SyncReport>& reports) {
+  for (const auto& report : reports) {
+    if (!report.message.empty()) context.console.message(report.message);
+  }
+  if (context.options.json) return writeDocument(document(context.options.command, reports));
+  for (std::size_t run = 0; run < reports.size(); ++run) {
+    if (reports.size() > 1) writeOutput("Sync " + std::to_string(run + 1) + "\n");
+    writeOutput(reports[run].text());
+  }
+}
+
+}  // namespace
+
+ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
+  StopSignal stop;
+  Progress progress(context.console, context.options.progress);
+  AppWatch watch(progress);
+  TransferQueue queue({options.host + "/Packages", options.reports, options.transfers}, progress, stop);
+  DeviceSession session(context, {options.device, "com.vantor.tsd", &queue, watch.listener()});
+  Daemon daemon(session.device(), session.loadPlugin());
+  daemon.postStartupNotification();
+
+  std::vector<SyncReport> reports;
+  ExitCode code = ExitCode::done;
+  while (reports.size() < options.repeat) {
+    reports.push_back(SyncRun({context, options, session, daemon, queue, watch, progress, stop}).run());
+    if (code == ExitCode::done) code = reports.back().code;
+    if (reports.back().code == ExitCode::cancelled || reports.back().code == ExitCode::deadline) break;
+  }
+  show(context, reports);
+  // A device that has not gone quiet by its deadline cannot be closed in order; the next one to open it tidies up.
+  if (code == ExitCode::deadline) std::_Exit(static_cast<int>(code));
+  return code;
+}
+
+}  // namespace tsd

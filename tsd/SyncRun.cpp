@@ -1,0 +1,290 @@
+#include "tsd/SyncRun.h"
+
+#include <algorithm>
+#include <cstdlib>
+#include <optional>
+
+#include "tsd/CommandError.h"
+#include "tsd/FileConduit.h"
+#include "tsd/QuietWatch.h"
+
+namespace tsd {
+
+using platform::ErrorRef;
+using platform::Value;
+
+namespace {
+
+constexpr std::uint32_t ordinarySync = 0;
+constexpr auto displayInterval = std::chrono::milliseconds(100);
+/// How long the outcomes are waited for: a base, and as long as a slow device needs for the bytes.
+constexpr auto outcomeBase = std::chrono::seconds(60);
+constexpr std::uint64_t outcomeBytesPerSecond = std::uint64_t{4} << 20;
+
+double secondsSince(std::chrono::steady_clock::time_point start, std::chrono::steady_clock::time_point end) {
+  return std::chrono::duration<double>(end - start).count();
+}
+
+std::vector<std::string> deletedIn(const Value& installed) {
+  std::vector<std::string> ids;
+  const auto* answer = installed.dictionary();
+  const auto* deleted = answer ? (*answer)["_Deleted"].array() : nullptr;
+  if (!deleted) return ids;
+  for (const auto& each : *deleted) {
+    const auto* app = each.dictionary();
+    if (auto id = app ? (*app)["KBBundleIdentifier"].string() : std::nullopt) ids.emplace_back(*id);
+  }
+  return ids;
+}
+
+bool isSafeIdentifier(const std::string& id) { return isFileName(id) && id.find("..") == std::string::npos; }
+
+}  // namespace
+
+SyncReport SyncRun::run() {
+  _began = std::chrono::steady_clock::now();
+  _parts.watch.restart();
+  _parts.progress.headline("Taking the host's files onto the device");
+  _before = appsOnDevice();
+  FileConduit(_parts.session.files(), _parts.context.console).pushStaging(_parts.options.host);
+  bool began = begin();
+  if (began && !_parts.stop.requested()) {
+    requestPackages();
+    transferPackages();
+    _phase = !_parts.stop.requested() && _parts.options.endPhase.value_or(transferPhaseSucceeded());
+  }
+  _parts.daemon.assetTransferEndedWithSuccess(_phase);
+  if (began && !_parts.stop.requested()) awaitOutcomes();
+  if (_parts.stop.requested()) _phase = false;
+  if (began && _parts.options.daemonReports && !_parts.stop.requested()) sendInstallReports();
+  _parts.daemon.syncEndedWithSuccess(_phase);
+  if (!_deadlinePassed) {
+    _parts.session.device().events().drain();
+    removeLeftPackages();
+  }
+  fillReport();
+  _parts.progress.finish();
+  return std::move(_report);
+}
+
+/// Everything up to the reconciliation. False when the plug-in refused a step.
+bool SyncRun::begin() {
+  auto classes = _parts.daemon.supportedDataclasses();
+  if (std::find(classes.begin(), classes.end(), "Application") == classes.end()) {
+    _report.message = "the plug-in does not serve the data class Application";
+    return false;
+  }
+  std::string anchor = _parts.daemon.currentSyncAnchor();
+  ErrorRef error;
+  if (!_parts.daemon.prepareForSync(anchor, &error)) {
+    _report.message = "the plug-in could not prepare for the sync" + (error ? ": " + textOf(error) : "");
+    return false;
+  }
+  _report.deleted = deletedIn(_parts.daemon.installedAssets());
+  if (!_parts.daemon.reconcileSync(ordinarySync, anchor, &error)) {
+    _report.message = "the plug-in could not take over the host's files" + (error ? ": " + textOf(error) : "");
+    return false;
+  }
+  showOutcomes(true);
+  _wanted = _todo;
+  return true;
+}
+
+void SyncRun::requestPackages() {
+  _parts.progress.headline("Preparing the installs");
+  recordPackagePaths();
+  for (const auto& entry : _wanted) {
+    if (entry.operation == "install") _parts.progress.add(entry.identifier, entry.name);
+  }
+  _assets = _parts.daemon.outstandingAssetTransfers();
+  for (const auto& asset : _assets) {
+    _report.requested.push_back(asset->identifier());
+    _requested.insert(asset->identifier());
+    _parts.progress.add(asset->identifier(), asset->prettyName().value_or(""));
+  }
+}
+
+void SyncRun::recordPackagePaths() {
+  for (const auto& [id, report] : _parts.options.reports) {
+    if (report.path != AssetReport::Path::recorded) continue;
+    auto entry = std::find_if(_wanted.begin(), _wanted.end(), [&](const auto& each) { return each.identifier == id; });
+    auto app = _parts.session.device().app(id);
+    std::string version = entry != _wanted.end() ? entry->version : app ? app->version : "";
+    ErrorRef error;
+    std::string path = std::string(packagesDirectory) + "/" + id + ".pkg";
+    if (!recordPackagePath(_parts.session.files(), id, version, path, &error)) {
+      _parts.context.console.message("the restore state: " + textOf(error));
+    }
+  }
+}
+
+void SyncRun::transferPackages() {
+  if (_assets.empty()) return;
+  _parts.progress.headline("Sending " + std::to_string(_assets.size()) +
+                           (_assets.size() == 1 ? " package" : " packages"));
+  auto& clock = _parts.session.device().events().clock();
+  _parts.queue.start(_parts.session.device(), _parts.daemon, _assets);
+  while (!_parts.queue.waitUntil(clock.now() + displayInterval)) showOutcomes(false);
+  _parts.queue.finish();
+}
+
+/// A package that failed has told the plug-in so; only one that neither came nor failed leaves the phase unfinished.
+bool SyncRun::transferPhaseSucceeded() const {
+  return std::none_of(_assets.begin(), _assets.end(), [&](const auto& asset) {
+    auto end = _parts.queue.result(asset->identifier()).end;
+    return end == TransferQueue::End::stalled || end == TransferQueue::End::interrupted;
+  });
+}
+
+void SyncRun::awaitOutcomes() {
+  std::uint64_t bytes = 0;
+  for (const auto& asset : _assets) bytes += _parts.queue.result(asset->identifier()).bytes;
+  auto& events = _parts.session.device().events();
+  auto deadline = events.clock().now() + outcomeBase + std::chrono::seconds(bytes / outcomeBytesPerSecond);
+  if (!_assets.empty()) _parts.progress.headline("Waiting for the outcomes");
+  // On the heap, as a device that never goes quiet must not keep this thread: see below.
+  auto quiet = std::make_unique<QuietWatch>(events, _parts.stop);
+  bool isQuiet = false;
+  while (!isQuiet && !_parts.stop.requested() && events.clock().now() < deadline) {
+    isQuiet = quiet->waitUntil(std::min(deadline, events.clock().now() + displayInterval));
+    showOutcomes(isQuiet);
+  }
+  if (isQuiet || _parts.stop.requested()) return;
+  _deadlinePassed = true;
+  _report.message = "the device did not report every outcome in time";
+  static_cast<void>(quiet.release());  // its thread waits for the device; the process ends without either
+}
+
+void SyncRun::sendInstallReports() {
+  for (const auto& asset : _assets) {
+    if (_parts.queue.result(asset->identifier()).end != TransferQueue::End::arrived) continue;
+    auto app = _parts.session.device().app(asset->identifier());
+    if (app && app->lastOutcome == "INSTALLED" && app->state == "installed") {
+      _parts.daemon.assetInstallSucceeded(asset);
+    } else {
+      std::string reason = app && !app->lastReason.empty() ? app->lastReason : "not installed";
+      _parts.daemon.assetInstallFailed(asset, platform::makeError("Install", 1, reason));
+    }
+  }
+}
+
+/// Packages that the installer refused stay until the daemon removes them; those of open installs may still be wanted.
+void SyncRun::removeLeftPackages() {
+  auto& files = _parts.session.files();
+  auto entries = files.list(packagesDirectory);
+  if (!entries) return;
+  std::set<std::string> open;
+  for (const auto& coordinator : _parts.session.device().status().coordinators) open.insert(coordinator.app + ".pkg");
+  for (const auto& entry : *entries) {
+    if (!open.count(entry.name)) files.removeItem(std::string(packagesDirectory) + "/" + entry.name);
+  }
+}
+
+std::set<std::string> SyncRun::appsOnDevice() const {
+  std::set<std::string> ids;
+  for (const auto& app : _parts.session.device().status().apps) {
+    if (!app.state.empty()) ids.insert(app.id);
+  }
+  return ids;
+}
+
+void SyncRun::showOutcomes(bool always) {
+  std::uint64_t changes = _parts.watch.changes();
+  if (!always && changes == _changesRead) return;
+  _changesRead = changes;
+  _todo = readTodoList(_parts.session.files());
+  for (const auto& entry : _todo) {
+    if (entry.operation == "INSTALLED") _parts.progress.ended(entry.identifier, "installed", "", true);
+    if (entry.operation == "FAILED") {
+      auto app = _parts.session.device().app(entry.identifier);
+      _parts.progress.ended(entry.identifier, "failed", app ? app->lastReason : "", false);
+    }
+  }
+}
+
+void SyncRun::fillReport() {
+  showOutcomes(true);
+  _report.todo = _todo;
+  for (const auto& each : _parts.session.device().status().coordinators) _openInstalls[each.app] = each.client;
+  std::map<std::string, const TodoEntry*> marks;
+  for (const auto& entry : _todo) marks.try_emplace(entry.identifier, &entry);
+  std::set<std::string> told;
+  auto tell = [&](const std::string& id, const std::string& name, const std::string& version) {
+    if (!told.insert(id).second) return;
+    auto mark = marks.find(id);
+    AppOutcome outcome = outcomeOf(id, mark == marks.end() ? "" : mark->second->operation);
+    outcome.name = name.empty() && mark != marks.end() ? mark->second->name : name;
+    outcome.version = version.empty() && mark != marks.end() ? mark->second->version : version;
+    _report.apps.push_back(std::move(outcome));
+  };
+  for (const auto& asset : _assets) tell(asset->identifier(), asset->prettyName().value_or(""), "");
+  auto after = appsOnDevice();
+  for (const auto& entry : _wanted) {
+    if (entry.operation == "install") tell(entry.identifier, entry.name, entry.version);
+    if (entry.operation != "remove" || !_before.count(entry.identifier)) continue;
+    (after.count(entry.identifier) ? _report.notRemoved : _report.removed).push_back(entry.identifier);
+  }
+  auto ended = std::chrono::steady_clock::now();
+  _report.seconds = secondsSince(_began, ended);
+  if (auto last = _parts.watch.lastPlaceholderSeen()) _report.placeholderSeconds = secondsSince(_began, *last);
+
+  bool allGood = std::all_of(_report.apps.begin(), _report.apps.end(), [](const auto& app) { return app.isGood(); });
+  _report.code = _parts.stop.requested()    ? ExitCode::cancelled
+                 : _deadlinePassed          ? ExitCode::deadline
+                 : !_report.message.empty() ? ExitCode::failed
+                 : !allGood                 ? ExitCode::someFailed
+                                            : ExitCode::done;
+}
+
+AppOutcome SyncRun::outcomeOf(const std::string& id, const std::string& mark) const {
+  using End = TransferQueue::End;
+  AppOutcome outcome{id, "", "", "", ""};
+  auto app = _parts.session.device().app(id);
+  bool requested =
+      std::any_of(_assets.begin(), _assets.end(), [&](const auto& each) { return each->identifier() == id; });
+  auto result = _parts.queue.result(id);
+  auto be = [&](const char* word, const std::string& reason) {
+    outcome.outcome = word;
+    outcome.reason = reason;
+  };
+  if (mark == "INSTALLED") {
+    be("INSTALLED", "");
+  } else if (mark == "FAILED") {
+    std::string reason = app ? app->lastReason : "";
+    be("FAILED", !reason.empty() ? reason : requested ? "the install failed" : "it could not be prepared");
+  } else if (!requested) {
+    if (isSafeIdentifier(id))
+      be("SKIPPED", reasonForSkipping(id));
+    else
+      be("REFUSED", "this cannot be an app's identifier");
+  } else if (result.end == End::failed) {
+    be("FAILED", textOf(result.error));
+  } else if (result.end == End::cancelled) {
+    be("CANCELLED", textOf(result.error));
+  } else if (result.end == End::interrupted || result.end == End::none) {
+    be("INTERRUPTED", "its package had not arrived");
+  } else if (app && app->lastOutcome == "CANCELED") {
+    be("CANCELLED", result.end == End::stalled ? "its package never arrived" : app->lastReason);
+  } else if (result.end == End::stalled) {
+    be("PENDING", "its package never arrived");
+  } else if (mark == "SENT") {
+    be("SENT", "");
+  } else if (mark == "DOWNLOADED" && _parts.queue.report(id).isRestore.value_or(false)) {
+    be("DOWNLOADED", "");
+  } else {
+    be("PENDING", "its package arrived, and nothing was reported of its install");
+  }
+  return outcome;
+}
+
+std::string SyncRun::reasonForSkipping(const std::string& id) const {
+  auto& device = _parts.session.device();
+  if (device.setting("app-installation") == "forbidden") return "installing apps is restricted";
+  auto open = _openInstalls.find(id);
+  if (open != _openInstalls.end()) {
+    return open->second == platform::RVClientMercato ? "the store installs it" : "its install is under way";
+  }
+  return "the plug-in did not ask for its package";
+}
+
+}  // namespace tsd

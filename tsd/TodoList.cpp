@@ -1,0 +1,50 @@
+#include "tsd/TodoList.h"
+
+#include "plist/PropertyList.h"
+
+namespace tsd {
+
+using platform::Value;
+
+namespace {
+
+Value readFile(platform::FileSystem& files, std::string_view path) {
+  auto bytes = files.readFile(path);
+  return bytes ? plist::read(std::move(*bytes)) : Value();
+}
+
+/// The dictionary under the key, made when there is none.
+platform::Dictionary& level(platform::Dictionary& parent, std::string_view key) {
+  if (!parent.dictionary(key)) parent.set(key, Value::makeDictionary());
+  return *parent.dictionary(key);
+}
+
+}  // namespace
+
+std::vector<TodoEntry> readTodoList(platform::FileSystem& files) {
+  std::vector<TodoEntry> entries;
+  Value list = readFile(files, todoListPath);
+  const auto* items = list.array();
+  if (!items) return entries;
+  entries.reserve(items->size());
+  for (const auto& item : *items) {
+    const auto* fields = item.dictionary();
+    if (!fields) continue;
+    auto text = [&](std::string_view key) { return std::string((*fields)[key].string().value_or("")); };
+    entries.push_back({text("identifier"), text("operation"), text("name"), text("version")});
+  }
+  return entries;
+}
+
+bool recordPackagePath(platform::FileSystem& files, const std::string& identifier, const std::string& version,
+                       const std::string& path, platform::ErrorRef* error) {
+  Value state = readFile(files, restoreStatePath);
+  if (!state.dictionary()) state = Value::makeDictionary();
+  level(level(*state.dictionary(), identifier), version).set("path", path);
+  auto bytes = plist::writeXML(state, error);
+  std::string parent(restoreStatePath.substr(0, restoreStatePath.rfind('/')));
+  return bytes && files.createDirectory(parent, true, {}, error) &&
+         files.writeAtomically(restoreStatePath, *bytes, error);
+}
+
+}  // namespace tsd

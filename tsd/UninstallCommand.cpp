@@ -1,0 +1,26 @@
+#include "tsd/CommandError.h"
+#include "tsd/Commands.h"
+#include "tsd/DeviceSession.h"
+#include "tsd/Output.h"
+
+namespace tsd {
+
+ExitCode runUninstall(const CommandContext& context, const UninstallOptions& options) {
+  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
+  platform::ErrorRef error;
+  if (!session.device().uninstallByPerson(options.app, &error)) {
+    throw CommandError(options.app + ": " + textOf(error));
+  }
+  session.device().events().drain();
+  if (context.options.json) {
+    auto document = startDocument(context.options.command);
+    document.dictionary()->set("result", "done");
+    document.dictionary()->set("app", options.app);
+    writeDocument(document);
+  } else {
+    writeOutput(printable(options.app) + ": uninstalled by the person\n");
+  }
+  return ExitCode::done;
+}
+
+}  // namespace tsd

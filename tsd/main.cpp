@@ -1,0 +1,278 @@
+#include <CLI/CLI.hpp>
+#include <csignal>
+#include <exception>
+#include <functional>
+#include <map>
+#include <memory>
+#include <new>
+#include <string>
+#include <vector>
+
+#include "tsd/CommandError.h"
+#include "tsd/Commands.h"
+#include "tsd/Output.h"
+
+namespace tsd {
+namespace {
+
+/// What the command line asked for.
+struct Invocation {
+  CommonOptions common;
+  std::vector<std::string> rules;
+  std::function<ExitCode(const CommandContext&)> run;
+};
+
+/// Adds a subcommand with the common options; `run` gets `options` as they were parsed.
+template <class Options>
+CLI::App* addCommand(CLI::App& program, Invocation& invocation, const char* name, const char* description,
+                     ExitCode (*run)(const CommandContext&, const Options&), const std::shared_ptr<Options>& options) {
+  static const std::map<std::string, ProgressMode> modes{{"auto", ProgressMode::automatic},
+                                                         {"plain", ProgressMode::plain},
+                                                         {"tty", ProgressMode::tty},
+                                                         {"none", ProgressMode::none}};
+  CLI::App* command = program.add_subcommand(name, description);
+  CommonOptions& common = invocation.common;
+  command->add_flag("--json", common.json, "One JSON document on standard output, errors included")->group("Common");
+  command->add_option("--progress", common.progress, "How progress is shown: auto, plain, tty or none")
+      ->transform(CLI::Transformer(modes).description(""))
+      ->check(CLI::IsMember(modes).description(""))
+      ->option_text("MODE")
+      ->group("Common");
+  command->add_option("--log", common.log, "Write the system log to this file")->option_text("FILE")->group("Common");
+  command->add_option("--calls", common.calls, "Write the journal of all calls to this file")
+      ->option_text("FILE")
+      ->group("Common");
+  command->add_option("--inject", invocation.rules, "Inject a fault: POINT[:APP][@N]=ACTION (repeatable)")
+      ->option_text("RULE")
+      ->expected(1)
+      ->take_all()
+      ->group("Common");
+  command->add_option("--plugin", common.plugin, "The plug-in's file; by default the one beside this program")
+      ->option_text("FILE")
+      ->group("Common");
+  command->callback([&invocation, name, run, options] {
+    invocation.common.command = name;
+    invocation.run = [run, options](const CommandContext& context) { return run(context, *options); };
+  });
+  return command;
+}
+
+void addDevice(CLI::App* command, std::string& device) {
+  command->add_option("DEVICE", device, "The device's folder")->required()->option_text(" ");
+}
+
+void addApp(CLI::App* command, std::string& app) {
+  command->add_option("APP", app, "The app's bundle identifier")->required()->option_text(" ");
+}
+
+void addHost(CLI::App* command, std::string& host) {
+  command->add_option("HOST", host, "The host's folder")->required()->option_text(" ");
+}
+
+void addSample(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<SampleOptions>();
+  auto* command =
+      addCommand(program, invocation, "sample", "Write a host folder to try things with", runSample, options);
+  addHost(command, options->host);
+  command->add_option("--apps", options->apps, "Apps in the todo list (8)")
+      ->option_text("N")
+      ->check(CLI::Range(1, 100000).description(""));
+  command->add_option("--package-size", options->packageSize, "Size of each package, about (262144)")
+      ->option_text("BYTES");
+  command->add_option("--seed", options->seed, "The same seed gives the same folder (1)")->option_text("S");
+  command->add_flag("--demo", options->demo,
+                    "Make three entries special: a damaged package, a bad identifier and an app to remove; "
+                    "older versions of the first app and of the one to remove lie in Packages/older, to be put on "
+                    "the device with 'tsd store DEVICE APP --finish --package FILE'");
+}
+
+template <class Options>
+void addDeviceCommand(CLI::App& program, Invocation& invocation, const char* name, const char* description,
+                      ExitCode (*run)(const CommandContext&, const Options&)) {
+  auto options = std::make_shared<Options>();
+  addDevice(addCommand(program, invocation, name, description, run, options), options->device);
+}
+
+void addSync(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<SyncOptions>();
+  auto* command = addCommand(program, invocation, "sync", "Sync a device with a host folder", runSync, options);
+  addDevice(command, options->device);
+  addHost(command, options->host);
+  command
+      ->add_option_function<std::vector<std::string>>(
+          "--asset",
+          [options](const std::vector<std::string>& texts) {
+            for (const auto& text : texts) addAssetReport(options->reports, text);
+          },
+          "What is reported of an app's asset: APP:KEY=VALUE,... with isDownload, isRestore, completedAssetParts, "
+          "path (relative, absolute, none, recorded or a text), or stall (repeatable)")
+      ->option_text("TEXT")
+      ->expected(1)
+      ->take_all();
+  command
+      ->add_option_function<std::string>(
+          "--end-phase", [options](const std::string& text) { options->endPhase = text == "success"; },
+          "What the transfer phase is said to have ended with, whatever happened")
+      ->option_text("success|failed")
+      ->check(CLI::IsMember({"success", "failed"}).description(""));
+  command->add_flag("--daemon-reports", options->daemonReports, "Report the installs' outcomes to the plug-in as well");
+  command->add_option("--repeat", options->repeat, "Syncs in a row, with one plug-in object (1)")
+      ->option_text("N")
+      ->check(CLI::Range(1, 1000000).description(""));
+  command->add_option("--transfers", options->transfers, "Packages in flight (2)")
+      ->option_text("N")
+      ->check(CLI::Range(1, 256).description(""));
+}
+
+void addRestore(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<RestoreOptions>();
+  auto* command =
+      addCommand(program, invocation, "restore", "Bring back a host's apps as placeholders", runRestore, options);
+  addDevice(command, options->device);
+  addHost(command, options->host);
+  command->add_option("--type", options->type, "Type of the restore; 2 and 3 bring apps back (2)")->option_text("N");
+  command->add_flag("--in-daemon", options->inDaemon, "Run in the daemon's own process, not the migration component's");
+}
+
+void addQuery(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<QueryOptions>();
+  auto* command = addCommand(program, invocation, "query", "Ask the plug-in a question", runQuery, options);
+  addDevice(command, options->device);
+  command->add_option("QUESTION", options->question, "metrics, accounts, vantor-ids or disabled-asset-types")
+      ->required()
+      ->option_text(" ")
+      ->check(CLI::IsMember({"metrics", "accounts", "vantor-ids", "disabled-asset-types"}).description(""));
+}
+
+void addSet(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<SetOptions>();
+  auto* command = addCommand(program, invocation, "set", "Change settings of a device", runSet, options);
+  addDevice(command, options->device);
+  command
+      ->add_option("KEY=VALUE", options->settings,
+                   "app-installation, app-removal = allowed or forbidden; icon-size = 16 to 1024; "
+                   "backup-placeholders, device-service-prioritize, device-service-cancel = yes or no; "
+                   "backup-error = no or yes")
+      ->required()
+      ->option_text("...");
+}
+
+void addUninstall(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<UninstallOptions>();
+  auto* command = addCommand(program, invocation, "uninstall", "Uninstall an app as the person on the device would",
+                             runUninstall, options);
+  addDevice(command, options->device);
+  addApp(command, options->app);
+}
+
+void addStore(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<StoreOptions>();
+  auto* command =
+      addCommand(program, invocation, "store", "Start or finish an install of the store's own", runStore, options);
+  addDevice(command, options->device);
+  addApp(command, options->app);
+  auto* finish =
+      command->add_flag("--finish", options->finish, "Finish the install; begin it first where there is none");
+  command->add_option("--package", options->package, "The package to finish with, a file of the host")
+      ->option_text("FILE")
+      ->needs(finish);
+  auto& install = options->install;
+  command->add_option("--type", install.installType, "Install type (1)")->option_text("N");
+  command->add_option("--state", install.installState, "Install state (1)")->option_text("N");
+  command->add_option("--phase", install.installPhase, "Install phase (0)")->option_text("N");
+  command->add_flag("--paused", install.paused, "The install is paused");
+  command->add_flag("!--no-progress", install.hasProgress, "Without install progress");
+  command->add_option("--app-type", install.applicationType, "Application type (User)")->option_text("T");
+  command->add_flag("--system-bundle", install.systemBundle, "Registered as a system bundle");
+  command->add_flag("!--no-coordinator", install.createsCoordinator, "Without a coordinator");
+}
+
+void addCommands(CLI::App& program, Invocation& invocation) {
+  program.require_subcommand(1);
+  program.set_version_flag("--version", "tsd 1.0.0");
+  addSample(program, invocation);
+  addDeviceCommand(program, invocation, "init", "Make an empty device", runInit);
+  addSync(program, invocation);
+  addRestore(program, invocation);
+  addDeviceCommand(program, invocation, "status", "Show the apps of a device and the installs under way", runStatus);
+  addQuery(program, invocation);
+  addDeviceCommand(program, invocation, "backup", "Make the apps' store metadata ready for a backup", runBackup);
+  addDeviceCommand(program, invocation, "clear", "Forget all sync data and placeholders", runClear);
+  addSet(program, invocation);
+  addUninstall(program, invocation);
+  addStore(program, invocation);
+}
+
+std::vector<device::InjectionRule> parseRules(const std::vector<std::string>& texts) {
+  std::vector<device::InjectionRule> rules;
+  for (const auto& text : texts) {
+    platform::ErrorRef error;
+    auto rule = device::InjectionRule::parse(text, &error);
+    if (!rule) throw CommandError(ExitCode::usage, "--inject: " + textOf(error));
+    rules.push_back(std::move(*rule));
+  }
+  return rules;
+}
+
+/// Runs what was asked for; every failure ends here, as a message and, when asked for, a document.
+ExitCode carryOut(Invocation& invocation, Console& console) {
+  ExitCode code = ExitCode::failed;
+  std::string message;
+  try {
+    invocation.common.rules = parseRules(invocation.rules);
+    return invocation.run({invocation.common, console});
+  } catch (const CommandError& error) {
+    code = error.code();
+    message = error.what();
+  } catch (const std::bad_alloc&) {
+    message = "out of memory";
+  } catch (const std::exception& error) {
+    message = error.what();
+  }
+  console.message(message);
+  if (invocation.common.json) writeFailure(invocation.common, code, message);
+  return code;
+}
+
+bool asksForJson(int count, char** arguments) {
+  for (int i = 1; i < count; ++i) {
+    if (std::string(arguments[i]) == "--json") return true;
+  }
+  return false;
+}
+
+ExitCode run(int count, char** arguments) {
+  Console console;
+  Invocation invocation;
+  CLI::App program("Plays the sync daemon and its host against a device in a folder.", "tsd");
+  addCommands(program, invocation);
+  std::string message;
+  try {
+    program.parse(count, arguments);
+    return carryOut(invocation, console);
+  } catch (const CLI::Success& wish) {
+    program.exit(wish);
+    return ExitCode::done;
+  } catch (const CLI::ParseError& error) {
+    message = error.what();
+  } catch (const CommandError& error) {
+    message = error.what();
+  }
+  console.message(message + " ('tsd --help' tells more)");
+  invocation.common.json = asksForJson(count, arguments);
+  if (invocation.common.json) writeFailure(invocation.common, ExitCode::usage, message);
+  return ExitCode::usage;
+}
+
+}  // namespace
+}  // namespace tsd
+
+int main(int count, char** arguments) {
+  // A reader that goes away must not end a sync in the middle.
+  std::signal(SIGPIPE, SIG_IGN);
+  try {
+    return static_cast<int>(tsd::run(count, arguments));
+  } catch (const std::exception&) {
+    return static_cast<int>(tsd::ExitCode::failed);
+  }
+}
