@@ -150,7 +150,7 @@ void Dictionary::makeRoom() {
       _capacity += front;
       _index->movePlacesToFront();
     } else {
-      std::size_t wanted = std::max<std::size_t>(4, std::size_t{_capacity} * 2);
+      std::size_t wanted = std::max<std::size_t>(4, std::size_t{_capacity} + _capacity / 2);
       void* moved = _arena->allocate(wanted * sizeof(Entry));
       if (_size) std::memcpy(moved, static_cast<const void*>(_entries), _size * sizeof(Entry));
       _arena->recycle(block, places * sizeof(Entry));

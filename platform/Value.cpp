@@ -164,48 +164,6 @@ void Value::recycleInto(Arena& arena) const noexcept {
   }
 }
 
-std::optional<bool> Value::boolean() const noexcept {
-  if (_kind != Kind::boolean) return {};
-  return _payload.bits != 0;
-}
-
-std::optional<std::int64_t> Value::integer() const noexcept {
-  if (_kind != Kind::integer || _unsigned) return {};
-  return static_cast<std::int64_t>(_payload.bits);
-}
-
-std::optional<std::uint64_t> Value::unsignedInteger() const noexcept {
-  if (_kind != Kind::integer || (!_unsigned && static_cast<std::int64_t>(_payload.bits) < 0)) return {};
-  return _payload.bits;
-}
-
-std::optional<double> Value::real() const noexcept {
-  if (_kind != Kind::real) return {};
-  return _payload.real;
-}
-
-std::optional<Date> Value::date() const noexcept {
-  if (_kind != Kind::date) return {};
-  return Date{_payload.real};
-}
-
-std::optional<std::string_view> Value::string() const noexcept {
-  if (_kind != Kind::string) return {};
-  return bytes();
-}
-
-std::optional<BytesView> Value::data() const noexcept {
-  if (_kind != Kind::data) return {};
-  return bytes();
-}
-
-const Array* Value::array() const noexcept { return _kind == Kind::array ? _payload.array : nullptr; }
-Array* Value::array() noexcept { return _kind == Kind::array ? _payload.array : nullptr; }
-const Dictionary* Value::dictionary() const noexcept {
-  return _kind == Kind::dictionary ? _payload.dictionary : nullptr;
-}
-Dictionary* Value::dictionary() noexcept { return _kind == Kind::dictionary ? _payload.dictionary : nullptr; }
-
 bool Value::boolValue() const noexcept {
   if (_kind == Kind::boolean || _kind == Kind::integer) return _payload.bits != 0;
   return _kind == Kind::real && _payload.real != 0;

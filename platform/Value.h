@@ -63,22 +63,35 @@ class Value {
   Kind kind() const noexcept { return _kind; }
   bool isAbsent() const noexcept { return _kind == Kind::absent; }
 
-  std::optional<bool> boolean() const noexcept;
+  std::optional<bool> boolean() const noexcept {
+    return _kind == Kind::boolean ? std::optional(_payload.bits != 0) : std::nullopt;
+  }
   /// Integers only; nothing for those above the signed 64-bit range.
-  std::optional<std::int64_t> integer() const noexcept;
+  std::optional<std::int64_t> integer() const noexcept {
+    return isInteger() && !_unsigned ? std::optional(static_cast<std::int64_t>(_payload.bits)) : std::nullopt;
+  }
   /// Integers only; nothing for negative ones.
-  std::optional<std::uint64_t> unsignedInteger() const noexcept;
-  std::optional<double> real() const noexcept;
-  std::optional<Date> date() const noexcept;
+  std::optional<std::uint64_t> unsignedInteger() const noexcept {
+    bool negative = !_unsigned && static_cast<std::int64_t>(_payload.bits) < 0;
+    return isInteger() && !negative ? std::optional(_payload.bits) : std::nullopt;
+  }
+  std::optional<double> real() const noexcept {
+    return _kind == Kind::real ? std::optional(_payload.real) : std::nullopt;
+  }
+  std::optional<Date> date() const noexcept {
+    return _kind == Kind::date ? std::optional(Date{_payload.real}) : std::nullopt;
+  }
   /// UTF-8. Borrowed: valid as long as this Value is neither changed nor gone.
-  std::optional<std::string_view> string() const noexcept;
+  std::optional<std::string_view> string() const noexcept {
+    return _kind == Kind::string ? std::optional(bytes()) : std::nullopt;
+  }
   /// Borrowed like string().
-  std::optional<BytesView> data() const noexcept;
+  std::optional<BytesView> data() const noexcept { return _kind == Kind::data ? std::optional(bytes()) : std::nullopt; }
   /// Null when the value is of another kind. Borrowed from this Value.
-  const Array* array() const noexcept;
-  Array* array() noexcept;
-  const Dictionary* dictionary() const noexcept;
-  Dictionary* dictionary() noexcept;
+  const Array* array() const noexcept { return _kind == Kind::array ? _payload.array : nullptr; }
+  Array* array() noexcept { return _kind == Kind::array ? _payload.array : nullptr; }
+  const Dictionary* dictionary() const noexcept { return _kind == Kind::dictionary ? _payload.dictionary : nullptr; }
+  Dictionary* dictionary() noexcept { return _kind == Kind::dictionary ? _payload.dictionary : nullptr; }
 
   /// How a flag of a property-list entry reads: a boolean says it itself, a number is true unless it is 0,
   /// everything else (text included) is false.
@@ -106,6 +119,7 @@ class Value {
 
   static Value own(Kind kind, std::string_view bytes);
   std::string_view bytes() const noexcept { return {_payload.bytes, _length}; }
+  bool isInteger() const noexcept { return _kind == Kind::integer; }
   bool holdsBytes() const noexcept { return _kind == Kind::string || _kind == Kind::data; }
   void take(Value& other) noexcept;
   void release() noexcept;
