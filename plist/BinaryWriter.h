@@ -1,0 +1,71 @@
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <optional>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "platform/Error.h"
+#include "platform/Value.h"
+#include "plist/StringTable.h"
+
+namespace plist {
+
+/// Writes one binary document.
+///
+/// A first pass counts: it numbers the strings, finds the sizes of everything, and whatever cannot be written. The
+/// second one writes into a block of the right size, first the strings, then the other objects, each container
+/// after what it holds. So the outermost value is the last object. Lists may be long, so each table goes as soon as
+/// nothing needs it, and before the output it would lie beside.
+class BinaryWriter {
+ public:
+  /// Nothing, with the error set, when the value has no binary form.
+  std::optional<platform::Bytes> write(const platform::Value& value, platform::ErrorRef& error);
+
+ private:
+  /// What a dictionary had at some place. The entries of a list mostly have the same keys in the same order.
+  struct Key {
+    std::string_view text;
+    std::uint32_t number = 0;
+    bool isKnown = false;
+  };
+
+  bool count(const platform::Value& value, std::size_t depth);
+  bool countString(std::string_view text);
+  bool countKey(std::string_view text, std::size_t place);
+  bool countContainer(std::size_t items, std::size_t references, std::size_t depth);
+  void countObject(std::size_t size);
+
+  void writeStrings();
+  void writeStringOffsets();
+  std::uint32_t writeValue(const platform::Value& value);
+  std::uint32_t writeArray(const platform::Array& array);
+  std::uint32_t writeDictionary(const platform::Dictionary& dictionary);
+  void writeInteger(const platform::Value& value);
+  void writeMarker(unsigned kind, std::uint64_t count);
+  void writeBytes(std::string_view bytes);
+  void writeTrailer(std::uint32_t top);
+  std::uint32_t beginObject();
+
+  std::optional<StringTable> _strings{std::in_place};
+  std::vector<std::uint32_t> _stringNumbers;  // of every key and string, in the order of both passes
+  std::array<Key, 8> _lastKeys;
+  std::size_t _objects = 0;
+  std::size_t _references = 0;
+  std::size_t _stringsSize = 0;
+  std::size_t _size = 0;  // of the other objects, without references
+
+  const std::uint32_t* _nextString = nullptr;
+  std::uint32_t _nextObject = 0;
+  std::vector<std::uint32_t> _pending;  // the numbers that containers being written will refer to
+  unsigned _referenceSize = 0;
+  unsigned _offsetSize = 0;
+  char* _begin = nullptr;
+  char* _at = nullptr;
+  char* _offsets = nullptr;
+  platform::ErrorRef _error;
+};
+
+}  // namespace plist

@@ -1,0 +1,38 @@
+#include "plist/StringTable.h"
+
+#include <cstring>
+
+#include "platform/TextHash.h"
+
+namespace plist {
+
+StringTable::StringTable() : _seed(platform::textHashSeed()), _mask(255), _slots(_mask + 1) {}
+
+StringTable::Number StringTable::number(std::string_view text) {
+  auto hash = static_cast<std::uint32_t>(platform::textHash(text, _seed));
+  std::uint32_t at = hash & _mask;
+  for (; _slots[at]; at = (at + 1) & _mask) {
+    const String& known = _strings[_slots[at] - 1];
+    if (known.hash == hash && known.size == text.size() && std::memcmp(known.bytes, text.data(), text.size()) == 0) {
+      return {_slots[at] - 1, false};
+    }
+  }
+  auto number = static_cast<std::uint32_t>(_strings.size());
+  _strings.push_back({text.data(), static_cast<std::uint32_t>(text.size()), hash});
+  _slots[at] = number + 1;
+  if (_strings.size() * 4 > _slots.size() * 3) grow();
+  return {number, true};
+}
+
+void StringTable::grow() {
+  std::vector<std::uint32_t> slots(_slots.size() * 4);
+  _mask = static_cast<std::uint32_t>(slots.size() - 1);
+  for (std::uint32_t number = 0; number < _strings.size(); ++number) {
+    std::uint32_t at = _strings[number].hash & _mask;
+    while (slots[at]) at = (at + 1) & _mask;
+    slots[at] = number + 1;
+  }
+  _slots = std::move(slots);
+}
+
+}  // namespace plist
