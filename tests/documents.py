@@ -1,0 +1,68 @@
+#!/usr/bin/env python3
+"""The documents keep their word: links lead somewhere, and every shell block in them runs.
+
+usage: documents.py [BIN]
+
+BIN is the folder of the built program. With it the blocks marked `sh` are run, document by document, in an empty folder
+where `build/release/bin` is BIN; each has to end with 0. Blocks marked otherwise (`console`, `text`, …) are only shown.
+"""
+
+import os
+import pathlib
+import re
+import subprocess
+import sys
+import tempfile
+
+ROOT = pathlib.Path(__file__).resolve().parent.parent
+LINK = re.compile(r"\[[^\]]*\]\(([^)\s]+)\)")
+FENCE = re.compile(r"^```(\w*)\n(.*?)^```$", re.MULTILINE | re.DOTALL)
+
+
+def anchors_of(text):
+    """The anchors that a reader's viewer makes of the headings."""
+    headings = re.findall(r"^#+ +(.+?) *$", FENCE.sub("", text), re.MULTILINE)
+    return {re.sub(r"[^\w\- ]", "", heading.lower()).replace(" ", "-") for heading in headings}
+
+
+def broken_links(document, text):
+    for target in LINK.findall(FENCE.sub("", text)):
+        if re.match(r"\w+:", target):
+            continue
+        path, _, anchor = target.partition("#")
+        linked = (document.parent / path) if path else document
+        if not linked.exists():
+            yield f"{document.relative_to(ROOT)}: link to {target}, which is not there"
+        elif anchor and anchor not in anchors_of(linked.read_text(encoding="utf-8")):
+            yield f"{document.relative_to(ROOT)}: link to {target}, where there is no such heading"
+
+
+def failing_blocks(document, text, program_folder):
+    with tempfile.TemporaryDirectory() as folder:
+        binaries = pathlib.Path(folder, "build/release/bin")
+        binaries.parent.mkdir(parents=True)
+        binaries.symlink_to(program_folder)
+        for language, block in FENCE.findall(text):
+            if language != "sh":
+                continue
+            run = subprocess.run(["bash", "-euo", "pipefail", "-c", block], cwd=folder, capture_output=True, text=True,
+                                 stdin=subprocess.DEVNULL)
+            if run.returncode != 0:
+                yield (f"{document.relative_to(ROOT)}: ended with {run.returncode}:\n{block}"
+                       f"{run.stdout[-2000:]}{run.stderr[-2000:]}")
+
+
+def main():
+    documents = sorted(path for path in ROOT.rglob("*.md") if "build" not in path.relative_to(ROOT).parts)
+    problems = []
+    for document in documents:
+        text = document.read_text(encoding="utf-8")
+        problems += broken_links(document, text)
+        if len(sys.argv) > 1:
+            problems += failing_blocks(document, text, os.path.abspath(sys.argv[1]))
+    print("\n".join(problems) or f"{len(documents)} documents in order")
+    return bool(problems)
+
+
+if __name__ == "__main__":
+    sys.exit(main())
