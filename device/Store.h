@@ -26,7 +26,8 @@ class Store {
   virtual bool commit(const std::vector<StoreRecord>& changes, platform::ErrorRef* error = nullptr) = 0;
 };
 
-/// One SQLite file. Null with an error when it is none or cannot be opened.
+/// One SQLite file, made when it is not there. Null with an error when it is none of ours or cannot be read. One
+/// process at a time: while it is open, nobody else can open it.
 std::unique_ptr<Store> openDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr);
 /// Forgets everything when it goes.
 std::unique_ptr<Store> makeMemoryStore();
