@@ -1,0 +1,50 @@
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "device/Boundary.h"
+#include "device/CoordinatorRecord.h"
+#include "device/InstallEngine.h"
+#include "platform/Mutex.h"
+#include "platform/RVPlaceholder.h"
+
+namespace device {
+
+class LocalTransferPromise;
+
+/// A placeholder in the making. A coordinator takes what it is when it is attached.
+class LocalPlaceholder final : public platform::RVPlaceholder {
+ public:
+  LocalPlaceholder(InstallEngine& engine, Boundary& boundary, PlaceholderRecord record);
+
+  bool attachTo(LocalCoordinator& coordinator, platform::ErrorRef* error);
+
+  bool setIconPromise(const std::shared_ptr<platform::RVPromisedTransferToPath>& promise,
+                      platform::ErrorRef* error) override;
+  bool setMetadata(const std::shared_ptr<platform::CVStoreMetadata>& metadata, platform::ErrorRef* error) override;
+  bool setPlaceholderAttributes(const std::shared_ptr<platform::RVPlaceholderAttributes>& attributes,
+                                platform::ErrorRef* error) override;
+  bool setSinfData(platform::BytesView data, platform::ErrorRef* error) override;
+  bool setConfigurationComplete(platform::ErrorRef* error) override;
+  bool cancelForReason(const platform::ErrorRef& reason, platform::RVClientIdentifier client,
+                       platform::ErrorRef* error) override;
+  std::string describe() const override;
+
+ private:
+  /// Runs `edit` on the record, unless nothing may be changed any more.
+  template <class Edit>
+  bool change(platform::ErrorRef* error, Edit&& edit) EXCLUDES(_mutex);
+
+  InstallEngine& _engine;
+  Boundary& _boundary;
+  const std::string _app;
+  const std::string _describe;
+  platform::Mutex _mutex;
+  PlaceholderRecord _record GUARDED_BY(_mutex);
+  std::shared_ptr<LocalTransferPromise> _icon GUARDED_BY(_mutex);
+  bool _cancelled GUARDED_BY(_mutex) = false;
+  std::weak_ptr<LocalCoordinator> _coordinator GUARDED_BY(_mutex);
+};
+
+}  // namespace device
