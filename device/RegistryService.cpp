@@ -1,0 +1,73 @@
+#include "device/RegistryService.h"
+
+#include <vector>
+
+namespace device {
+
+namespace {
+
+constexpr const char* className = "OBApplicationWorkspace";
+using Lock = platform::Mutex::Lock;
+
+constexpr std::uint64_t everyBundle = 0;
+constexpr std::uint64_t applications = 1;
+constexpr std::uint64_t systemBundles = 7;
+
+}  // namespace
+
+void RegistryService::addObserver(std::weak_ptr<platform::OBApplicationWorkspaceObserverProtocol> observer) {
+  auto alive = observer.lock();
+  _boundary.call({className, "addObserver"}, nullptr, {{"observer", alive}}, [&] { _reports.addObserver(observer); });
+}
+
+void RegistryService::removeObserver(const platform::OBApplicationWorkspaceObserverProtocol* observer) {
+  _boundary.call({className, "removeObserver"}, nullptr, {CallArgument::object("observer", "observer", observer)},
+                 [&] { _reports.removeObserver(observer); });
+}
+
+bool RegistryService::applicationIsInstalled(std::string_view bundleIdentifier) {
+  return _boundary.call({className, "applicationIsInstalled", bundleIdentifier}, nullptr,
+                        {{"bundleIdentifier", bundleIdentifier}}, [&] {
+                          Lock lock(_records.mutex);
+                          const auto* app = _records.state().app(bundleIdentifier);
+                          return app && !app->isPlaceholder;
+                        });
+}
+
+void RegistryService::enumerateBundlesOfType(
+    std::uint64_t type, const std::function<void(const platform::OBBundleProxyRef& bundle, bool& stop)>& block) {
+  std::vector<platform::OBBundleProxyRef> bundles;
+  _boundary.call({className, "enumerateBundlesOfType"}, nullptr, {{"type", type}}, [&] {
+    Lock lock(_records.mutex);
+    for (const auto& [id, app] : _records.state().apps) {
+      // Every bundle of this device is an application.
+      bool listed = type == everyBundle || type == applications || (type == systemBundles && app.systemBundle);
+      if (listed) bundles.push_back(app.proxy);
+    }
+  });
+  // The block is the caller's own, on its own thread; what it does is not part of the call.
+  bool stop = false;
+  for (const auto& bundle : bundles) {
+    block(bundle, stop);
+    if (stop) break;
+  }
+}
+
+bool RegistryService::uninstallApplication(std::string_view bundleIdentifier) {
+  return _boundary.call({className, "uninstallApplication", bundleIdentifier}, nullptr,
+                        {{"bundleIdentifier", bundleIdentifier}},
+                        [&] { return _engine.uninstall(bundleIdentifier, nullptr); });
+}
+
+platform::OBApplicationProxyRef RegistryService::applicationProxyForIdentifier(std::string_view bundleIdentifier,
+                                                                               bool placeholder) {
+  return _boundary.call({className, "applicationProxyForIdentifier", bundleIdentifier}, nullptr,
+                        {{"bundleIdentifier", bundleIdentifier}, {"placeholder", placeholder}},
+                        [&]() -> platform::OBApplicationProxyRef {
+                          Lock lock(_records.mutex);
+                          const auto* app = _records.state().app(bundleIdentifier);
+                          return app && app->isPlaceholder == placeholder ? app->proxy : nullptr;
+                        });
+}
+
+}  // namespace device
