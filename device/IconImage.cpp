@@ -1,0 +1,89 @@
+#include "device/IconImage.h"
+
+#include <cstdint>
+#include <cstring>
+#include <new>
+
+namespace device {
+
+namespace {
+
+constexpr std::uint32_t maximumPixels = 4096;
+constexpr double cornerShare = 0.225;  // of the side
+
+using Surface = std::unique_ptr<cairo_surface_t, void (*)(cairo_surface_t*)>;
+using Context = std::unique_ptr<cairo_t, void (*)(cairo_t*)>;
+
+std::uint32_t bigEndian(const char* bytes) {
+  std::uint32_t number = 0;
+  for (int i = 0; i < 4; ++i) number = number << 8 | static_cast<unsigned char>(bytes[i]);
+  return number;
+}
+
+/// Whether the header is a PNG's and its size one that may be decoded: the pixels cost memory before anything shows
+/// that they are not there.
+bool isDrawable(platform::BytesView png) {
+  constexpr char signature[] = "\x89PNG\r\n\x1a\n";
+  if (png.size() < 33 || png.substr(0, 8) != platform::BytesView(signature, 8) || png.substr(12, 4) != "IHDR")
+    return false;
+  auto width = bigEndian(png.data() + 16);
+  auto height = bigEndian(png.data() + 20);
+  return width > 0 && height > 0 && width <= maximumPixels && height <= maximumPixels;
+}
+
+cairo_status_t readBytes(void* source, unsigned char* data, unsigned int length) {
+  auto& rest = *static_cast<platform::BytesView*>(source);
+  if (rest.size() < length) return CAIRO_STATUS_READ_ERROR;
+  std::memcpy(data, rest.data(), length);
+  rest.remove_prefix(length);
+  return CAIRO_STATUS_SUCCESS;
+}
+
+cairo_status_t writeBytes(void* target, const unsigned char* data, unsigned int length) {
+  try {
+    static_cast<platform::Bytes*>(target)->append(reinterpret_cast<const char*>(data), length);
+    return CAIRO_STATUS_SUCCESS;
+  } catch (const std::bad_alloc&) {
+    return CAIRO_STATUS_NO_MEMORY;
+  }
+}
+
+void traceRoundedSquare(cairo_t* context, double side) {
+  constexpr double quarter = 1.5707963267948966;
+  double radius = side * cornerShare;
+  cairo_new_sub_path(context);
+  cairo_arc(context, side - radius, radius, radius, -quarter, 0);
+  cairo_arc(context, side - radius, side - radius, radius, 0, quarter);
+  cairo_arc(context, radius, side - radius, radius, quarter, 2 * quarter);
+  cairo_arc(context, radius, radius, radius, 2 * quarter, 3 * quarter);
+  cairo_close_path(context);
+}
+
+}  // namespace
+
+std::shared_ptr<const IconImage> IconImage::fromPNG(platform::BytesView png, int size) {
+  if (!isDrawable(png)) return nullptr;
+  Surface source(cairo_image_surface_create_from_png_stream(&readBytes, &png), &cairo_surface_destroy);
+  if (cairo_surface_status(source.get()) != CAIRO_STATUS_SUCCESS) return nullptr;
+  Surface target(cairo_image_surface_create(CAIRO_FORMAT_ARGB32, size, size), &cairo_surface_destroy);
+  {
+    Context context(cairo_create(target.get()), &cairo_destroy);
+    traceRoundedSquare(context.get(), size);
+    cairo_clip(context.get());
+    cairo_scale(context.get(), double(size) / cairo_image_surface_get_width(source.get()),
+                double(size) / cairo_image_surface_get_height(source.get()));
+    cairo_set_source_surface(context.get(), source.get(), 0, 0);
+    cairo_pattern_set_filter(cairo_get_source(context.get()), CAIRO_FILTER_GOOD);
+    cairo_pattern_set_extend(cairo_get_source(context.get()), CAIRO_EXTEND_PAD);
+    cairo_paint(context.get());
+    if (cairo_status(context.get()) != CAIRO_STATUS_SUCCESS) return nullptr;
+  }
+  if (cairo_surface_status(target.get()) != CAIRO_STATUS_SUCCESS) return nullptr;
+  return std::make_shared<IconImage>(target.release());
+}
+
+bool IconImage::encodePNG(platform::Bytes& out) const {
+  return cairo_surface_write_to_png_stream(_surface.get(), &writeBytes, &out) == CAIRO_STATUS_SUCCESS;
+}
+
+}  // namespace device
