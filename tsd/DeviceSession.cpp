@@ -29,6 +29,9 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
   options.deviceService = setup.deviceService;
   options.changed = setup.changed;
   options.rules = _context.options.rules;
+  options.fileFailed = [this](std::string_view operation, std::string_view path, std::string_view reason) {
+    _context.console.message(std::string(path) + ": " + std::string(operation) + " failed: " + std::string(reason));
+  };
   if (_log) {
     options.log = [this](const device::LogRecord& record) {
       const char* level = record.level == platform::LogLevel::error ? "error" : "default";

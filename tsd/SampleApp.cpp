@@ -24,9 +24,9 @@ std::string lowered(std::string text) {
 }
 
 /// Every pair of parts once, then again with a number.
-std::string sampleName(std::size_t place) {
+std::string sampleName(std::size_t first, std::size_t place) {
   std::size_t pairs = std::size(firstParts) * std::size(secondParts);
-  std::size_t pair = place % pairs;
+  std::size_t pair = (first + place) % pairs;
   // Neighbours differ in both parts.
   std::string name = firstParts[pair % std::size(firstParts)];
   name += secondParts[(pair + pair / std::size(firstParts)) % std::size(secondParts)];
@@ -97,7 +97,7 @@ std::vector<SampleApp> makeSampleApps(std::size_t count, SampleNumbers& numbers)
   apps.reserve(count);
   for (std::size_t i = 0; i < count; ++i) {
     SampleApp app{};
-    app.name = sampleName(first + i);
+    app.name = sampleName(first, i);
     app.id = identifierFor(app.name);
     app.version = std::to_string(2 + numbers.below(6)) + "." + std::to_string(numbers.below(10));
     app.maker = makers[numbers.below(std::size(makers))];

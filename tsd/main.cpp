@@ -1,4 +1,5 @@
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <csignal>
 #include <exception>
 #include <functional>
@@ -22,6 +23,28 @@ struct Invocation {
   std::function<ExitCode(const CommandContext&)> run;
 };
 
+/// For the right column of a help text on a terminal of 80 columns.
+std::string wrapped(const std::string& text) {
+  constexpr std::size_t width = 50;
+  std::string result;
+  std::size_t lineLength = 0;
+  for (std::size_t start = 0; start < text.size();) {
+    std::size_t end = std::min(text.find(' ', start), text.size());
+    std::size_t word = end - start;
+    if (lineLength > 0 && lineLength + 1 + word > width) {
+      result += '\n';
+      lineLength = 0;
+    } else if (lineLength > 0) {
+      result += ' ';
+      ++lineLength;
+    }
+    result += text.substr(start, word);
+    lineLength += word;
+    start = end + 1;
+  }
+  return result;
+}
+
 /// Adds a subcommand with the common options; `run` gets `options` as they were parsed.
 template <class Options>
 CLI::App* addCommand(CLI::App& program, Invocation& invocation, const char* name, const char* description,
@@ -32,7 +55,8 @@ CLI::App* addCommand(CLI::App& program, Invocation& invocation, const char* name
                                                          {"none", ProgressMode::none}};
   CLI::App* command = program.add_subcommand(name, description);
   CommonOptions& common = invocation.common;
-  command->add_flag("--json", common.json, "One JSON document on standard output, errors included")->group("Common");
+  command->add_flag("--json", common.json, wrapped("One JSON document on standard output, errors included"))
+      ->group("Common");
   command->add_option("--progress", common.progress, "How progress is shown: auto, plain, tty or none")
       ->transform(CLI::Transformer(modes).description(""))
       ->check(CLI::IsMember(modes).description(""))
@@ -47,7 +71,7 @@ CLI::App* addCommand(CLI::App& program, Invocation& invocation, const char* name
       ->expected(1)
       ->take_all()
       ->group("Common");
-  command->add_option("--plugin", common.plugin, "The plug-in's file; by default the one beside this program")
+  command->add_option("--plugin", common.plugin, wrapped("The plug-in's file; by default the one beside this program"))
       ->option_text("FILE")
       ->group("Common");
   command->callback([&invocation, name, run, options] {
@@ -81,9 +105,9 @@ void addSample(CLI::App& program, Invocation& invocation) {
       ->option_text("BYTES");
   command->add_option("--seed", options->seed, "The same seed gives the same folder (1)")->option_text("S");
   command->add_flag("--demo", options->demo,
-                    "Make three entries special: a damaged package, a bad identifier and an app to remove; "
-                    "older versions of the first app and of the one to remove lie in Packages/older, to be put on "
-                    "the device with 'tsd store DEVICE APP --finish --package FILE'");
+                    wrapped("Make three entries special: a damaged package, a bad identifier and an app to remove. "
+                            "Packages/older then holds older versions of the first app and of the one to remove, to "
+                            "be put on the device with 'tsd store DEVICE APP --finish --package FILE'"));
 }
 
 template <class Options>
@@ -104,18 +128,20 @@ void addSync(CLI::App& program, Invocation& invocation) {
           [options](const std::vector<std::string>& texts) {
             for (const auto& text : texts) addAssetReport(options->reports, text);
           },
-          "What is reported of an app's asset: APP:KEY=VALUE,... with isDownload, isRestore, completedAssetParts, "
-          "path (relative, absolute, none, recorded or a text), or stall (repeatable)")
+          wrapped("What is reported of an app's asset: APP:KEY=VALUE,... with the keys isDownload, isRestore (true or "
+                  "false), completedAssetParts (a number), path (relative, absolute, none, recorded or a text), or "
+                  "stall alone: progress and never an end (repeatable)"))
       ->option_text("TEXT")
       ->expected(1)
       ->take_all();
   command
       ->add_option_function<std::string>(
           "--end-phase", [options](const std::string& text) { options->endPhase = text == "success"; },
-          "What the transfer phase is said to have ended with, whatever happened")
+          wrapped("What the transfer phase is said to have ended with, whatever happened"))
       ->option_text("success|failed")
       ->check(CLI::IsMember({"success", "failed"}).description(""));
-  command->add_flag("--daemon-reports", options->daemonReports, "Report the installs' outcomes to the plug-in as well");
+  command->add_flag("--daemon-reports", options->daemonReports,
+                    wrapped("Report the installs' outcomes to the plug-in as well"));
   command->add_option("--repeat", options->repeat, "Syncs in a row, with one plug-in object (1)")
       ->option_text("N")
       ->check(CLI::Range(1, 1000000).description(""));
@@ -131,7 +157,8 @@ void addRestore(CLI::App& program, Invocation& invocation) {
   addDevice(command, options->device);
   addHost(command, options->host);
   command->add_option("--type", options->type, "Type of the restore; 2 and 3 bring apps back (2)")->option_text("N");
-  command->add_flag("--in-daemon", options->inDaemon, "Run in the daemon's own process, not the migration component's");
+  command->add_flag("--in-daemon", options->inDaemon,
+                    wrapped("Run in the daemon's own process, not the migration component's"));
 }
 
 void addQuery(CLI::App& program, Invocation& invocation) {
@@ -150,9 +177,9 @@ void addSet(CLI::App& program, Invocation& invocation) {
   addDevice(command, options->device);
   command
       ->add_option("KEY=VALUE", options->settings,
-                   "app-installation, app-removal = allowed or forbidden; icon-size = 16 to 1024; "
-                   "backup-placeholders, device-service-prioritize, device-service-cancel = yes or no; "
-                   "backup-error = no or yes")
+                   wrapped("app-installation, app-removal = allowed or forbidden; icon-size = 16 to 1024; "
+                           "backup-placeholders, device-service-prioritize, device-service-cancel = yes or no; "
+                           "backup-error = no or yes"))
       ->required()
       ->option_text("...");
 }
@@ -172,7 +199,7 @@ void addStore(CLI::App& program, Invocation& invocation) {
   addDevice(command, options->device);
   addApp(command, options->app);
   auto* finish =
-      command->add_flag("--finish", options->finish, "Finish the install; begin it first where there is none");
+      command->add_flag("--finish", options->finish, wrapped("Finish the install; begin it first where there is none"));
   command->add_option("--package", options->package, "The package to finish with, a file of the host")
       ->option_text("FILE")
       ->needs(finish);
@@ -189,6 +216,9 @@ void addStore(CLI::App& program, Invocation& invocation) {
 
 void addCommands(CLI::App& program, Invocation& invocation) {
   program.require_subcommand(1);
+  program.footer(
+      "Exit codes: 0 done, 1 failed, 2 usage, 3 some apps failed, 4 cancelled by a\n"
+      "signal, 5 a deadline passed, 6 the device is in use.");
   program.set_version_flag("--version", "tsd 1.0.0");
   addSample(program, invocation);
   addDeviceCommand(program, invocation, "init", "Make an empty device", runInit);
@@ -234,6 +264,15 @@ ExitCode carryOut(Invocation& invocation, Console& console) {
   return code;
 }
 
+/// The subcommand's name when the first argument is one.
+std::string commandNamed(CLI::App& program, int count, char** arguments) {
+  if (count < 2) return {};
+  for (const auto* command : program.get_subcommands({})) {
+    if (command->get_name() == arguments[1]) return arguments[1];
+  }
+  return {};
+}
+
 bool asksForJson(int count, char** arguments) {
   for (int i = 1; i < count; ++i) {
     if (std::string(arguments[i]) == "--json") return true;
@@ -246,8 +285,12 @@ ExitCode run(int count, char** arguments) {
   Invocation invocation;
   CLI::App program("Plays the sync daemon and its host against a device in a folder.", "tsd");
   addCommands(program, invocation);
+  std::string command = commandNamed(program, count, arguments);
   std::string message;
   try {
+    if (count > 1 && arguments[1][0] != '-' && command.empty()) {
+      throw CommandError(ExitCode::usage, "there is no subcommand '" + std::string(arguments[1]) + "'");
+    }
     program.parse(count, arguments);
     return carryOut(invocation, console);
   } catch (const CLI::Success& wish) {
@@ -258,7 +301,8 @@ ExitCode run(int count, char** arguments) {
   } catch (const CommandError& error) {
     message = error.what();
   }
-  console.message(message + " ('tsd --help' tells more)");
+  console.message(message + " ('tsd " + (command.empty() ? "" : command + " ") + "--help' tells more)");
+  invocation.common.command = command;
   invocation.common.json = asksForJson(count, arguments);
   if (invocation.common.json) writeFailure(invocation.common, ExitCode::usage, message);
   return ExitCode::usage;
