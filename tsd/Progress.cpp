@@ -82,7 +82,7 @@ void Progress::sending(const std::string& id, double fraction) {
   if (_mode == ProgressMode::plain && sent < line->shownPercent + plainStep && sent < 100) return;
   if (_mode == ProgressMode::plain && line->shownPercent == 100) return;
   line->shownPercent = _mode == ProgressMode::plain ? (sent == 100 ? 100 : sent / plainStep * plainStep) : 0;
-  changed(*line, "sent " + percentText(line->shownPercent), false);
+  changed(*line, "sent " + std::to_string(line->shownPercent) + " %", false);
 }
 
 void Progress::installing(const std::string& id) {

@@ -30,7 +30,7 @@ void finish(const CommandContext& context, DeviceSession& session, const StoreOp
   bool done = begun && device.finishStoreInstall(options.app, path, &error);
   device.events().drain();
   if (!path.empty() && session.files().fileExists(path)) session.files().removeItem(path);
-  if (!done) throw CommandError(options.app + ": " + textOf(error));
+  if (!done) throw CommandError(textOf(error));
 }
 
 }  // namespace
@@ -43,7 +43,7 @@ ExitCode runStore(const CommandContext& context, const StoreOptions& options) {
   } else {
     platform::ErrorRef error;
     if (!device.beginStoreInstall(options.app, options.install, &error)) {
-      throw CommandError(options.app + ": " + textOf(error));
+      throw CommandError(textOf(error));
     }
     device.events().drain();
   }

@@ -105,9 +105,9 @@ std::string SyncReport::text() const {
     text += "The last placeholder was on the home screen after " + secondsText(*placeholderSeconds) + ".\n";
   }
   auto good = std::count_if(apps.begin(), apps.end(), [](const AppOutcome& app) { return app.isGood(); });
-  std::string counts =
-      apps.empty() ? "" : ": " + std::to_string(good) + " of " + std::to_string(apps.size()) + " apps well";
-  text += std::string("Sync ") + nameOfResult(code) + counts + ", " + secondsText(seconds) + ".\n";
+  text += std::string("Sync ") + nameOfResult(code) + " after " + secondsText(seconds);
+  if (!apps.empty()) text += ": " + std::to_string(good) + " of " + std::to_string(apps.size()) + " apps in order";
+  text += ".\n";
   return text;
 }
 

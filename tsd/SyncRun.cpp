@@ -101,6 +101,9 @@ void SyncRun::requestPackages() {
     _report.requested.push_back(asset->identifier());
     _requested.insert(asset->identifier());
     _parts.progress.add(asset->identifier(), asset->prettyName().value_or(""));
+    // It is there already; the device's report may come later.
+    auto app = _parts.session.device().app(asset->identifier());
+    if (app && !app->state.empty()) _parts.progress.placeholderShown(asset->identifier());
   }
 }
 

@@ -9,7 +9,7 @@ ExitCode runUninstall(const CommandContext& context, const UninstallOptions& opt
   DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
   platform::ErrorRef error;
   if (!session.device().uninstallByPerson(options.app, &error)) {
-    throw CommandError(options.app + ": " + textOf(error));
+    throw CommandError(textOf(error));
   }
   session.device().events().drain();
   if (context.options.json) {

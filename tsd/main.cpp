@@ -23,6 +23,11 @@ struct Invocation {
   std::function<ExitCode(const CommandContext&)> run;
 };
 
+const std::map<std::string, ProgressMode> progressModes{{"auto", ProgressMode::automatic},
+                                                        {"plain", ProgressMode::plain},
+                                                        {"tty", ProgressMode::tty},
+                                                        {"none", ProgressMode::none}};
+
 /// For the right column of a help text on a terminal of 80 columns.
 std::string wrapped(const std::string& text) {
   constexpr std::size_t width = 50;
@@ -49,17 +54,15 @@ std::string wrapped(const std::string& text) {
 template <class Options>
 CLI::App* addCommand(CLI::App& program, Invocation& invocation, const char* name, const char* description,
                      ExitCode (*run)(const CommandContext&, const Options&), const std::shared_ptr<Options>& options) {
-  static const std::map<std::string, ProgressMode> modes{{"auto", ProgressMode::automatic},
-                                                         {"plain", ProgressMode::plain},
-                                                         {"tty", ProgressMode::tty},
-                                                         {"none", ProgressMode::none}};
   CLI::App* command = program.add_subcommand(name, description);
   CommonOptions& common = invocation.common;
   command->add_flag("--json", common.json, wrapped("One JSON document on standard output, errors included"))
       ->group("Common");
-  command->add_option("--progress", common.progress, "How progress is shown: auto, plain, tty or none")
-      ->transform(CLI::Transformer(modes).description(""))
-      ->check(CLI::IsMember(modes).description(""))
+  command
+      ->add_option_function<std::string>(
+          "--progress", [&common](const std::string& mode) { common.progress = progressModes.at(mode); },
+          "How progress is shown: auto, plain, tty or none")
+      ->check(CLI::IsMember({"auto", "plain", "tty", "none"}).description(""))
       ->option_text("MODE")
       ->group("Common");
   command->add_option("--log", common.log, "Write the system log to this file")->option_text("FILE")->group("Common");
