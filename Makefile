@@ -19,7 +19,8 @@ build: packages ## the program and the plug-in, into build/release/bin
 	@$(call PRESET,release)
 
 demo: build ## a whole life of a device, from the first sync to a restore, in a minute
-	@.ci/demo build/release/bin/tsd build/demo
+	@rm -rf build/demo
+	@examples/demo build/release/bin/tsd build/demo
 
 test: build ## all tests (SEEDS=N: that many random scenarios)
 	@cd build/release && $(WITH_SEEDS) $(CTEST)

@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""The documents keep their word: links lead somewhere, and every shell block in them runs.
+"""The documents keep their word: links lead somewhere, C++ is that of the examples, and every shell block runs.
 
 usage: documents.py [BIN]
 
@@ -37,6 +37,14 @@ def broken_links(document, text):
             yield f"{document.relative_to(ROOT)}: link to {target}, where there is no such heading"
 
 
+def strange_examples(document, text):
+    """Blocks of C++ that are not in a program of examples/, where they are compiled and run."""
+    programs = [path.read_text(encoding="utf-8") for path in (ROOT / "examples").glob("*.cpp")]
+    for language, block in FENCE.findall(text):
+        if language == "cpp" and not any(block in program for program in programs):
+            yield f"{document.relative_to(ROOT)}: not in any program of examples/:\n{block}"
+
+
 def failing_blocks(document, text, program_folder):
     with tempfile.TemporaryDirectory() as folder:
         binaries = pathlib.Path(folder, "build/release/bin")
@@ -58,6 +66,7 @@ def main():
     for document in documents:
         text = document.read_text(encoding="utf-8")
         problems += broken_links(document, text)
+        problems += strange_examples(document, text)
         if len(sys.argv) > 1:
             problems += failing_blocks(document, text, os.path.abspath(sys.argv[1]))
     print("\n".join(problems) or f"{len(documents)} documents in order")
