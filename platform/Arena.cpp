@@ -58,6 +58,7 @@ void* Arena::allocateChunk(std::size_t size) {
 }
 
 bool Arena::extend(void* block, std::size_t size, std::size_t newSize) noexcept {
+  if (!block) return false;
   char* start = static_cast<char*>(block);
   std::size_t wanted = sizeClass(newSize).size;
   if (start + sizeClass(size).size != _next || wanted > static_cast<std::size_t>(_end - start)) return false;

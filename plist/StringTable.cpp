@@ -1,7 +1,5 @@
 #include "plist/StringTable.h"
 
-#include <cstring>
-
 #include "platform/TextHash.h"
 
 namespace plist {
@@ -13,7 +11,7 @@ StringTable::Number StringTable::number(std::string_view text) {
   std::uint32_t at = hash & _mask;
   for (; _slots[at]; at = (at + 1) & _mask) {
     const String& known = _strings[_slots[at] - 1];
-    if (known.hash == hash && known.size == text.size() && std::memcmp(known.bytes, text.data(), text.size()) == 0) {
+    if (known.hash == hash && std::string_view(known.bytes, known.size) == text) {
       return {_slots[at] - 1, false};
     }
   }

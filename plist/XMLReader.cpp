@@ -297,7 +297,8 @@ const char* XMLReader::inInput(std::string_view piece) {
 
 /// The leaf's text, where it stays as long as the document's values.
 std::string_view XMLReader::keptText() {
-  if (_textInInput || _text.empty()) return _text;
+  if (_text.empty()) return {"", 0};
+  if (_textInInput) return _text;
   char* kept = _builder.allocateText(_text.size());
   std::memcpy(kept, _text.data(), _text.size());
   return {kept, _text.size()};
