@@ -3,8 +3,8 @@
 
 usage: documents.py [BIN]
 
-BIN is the folder of the built program. With it the blocks marked `sh` are run, document by document, in an empty folder
-where `build/release/bin` is BIN; each has to end with 0. Blocks marked otherwise (`console`, `text`, …) are only shown.
+BIN is the folder of the built program. With it the blocks marked `sh` are run, those of a document as one script that
+has to end with 0, in an empty folder where `build/release/bin` is BIN. Blocks marked otherwise are only shown.
 """
 
 import os
@@ -45,19 +45,18 @@ def strange_examples(document, text):
             yield f"{document.relative_to(ROOT)}: not in any program of examples/:\n{block}"
 
 
-def failing_blocks(document, text, program_folder):
+def failing_commands(document, text, program_folder):
+    script = "".join(block for language, block in FENCE.findall(text) if language == "sh")
+    if not script:
+        return
     with tempfile.TemporaryDirectory() as folder:
         binaries = pathlib.Path(folder, "build/release/bin")
         binaries.parent.mkdir(parents=True)
         binaries.symlink_to(program_folder)
-        for language, block in FENCE.findall(text):
-            if language != "sh":
-                continue
-            run = subprocess.run(["bash", "-euo", "pipefail", "-c", block], cwd=folder, capture_output=True, text=True,
-                                 stdin=subprocess.DEVNULL)
-            if run.returncode != 0:
-                yield (f"{document.relative_to(ROOT)}: ended with {run.returncode}:\n{block}"
-                       f"{run.stdout[-2000:]}{run.stderr[-2000:]}")
+        run = subprocess.run(["bash", "-xeuo", "pipefail", "-c", script], cwd=folder, capture_output=True, text=True,
+                             stdin=subprocess.DEVNULL)
+    if run.returncode != 0:
+        yield f"{document.relative_to(ROOT)}: its commands ended with {run.returncode}:\n{run.stderr[-4000:]}"
 
 
 def main():
@@ -68,7 +67,7 @@ def main():
         problems += broken_links(document, text)
         problems += strange_examples(document, text)
         if len(sys.argv) > 1:
-            problems += failing_blocks(document, text, os.path.abspath(sys.argv[1]))
+            problems += failing_commands(document, text, os.path.abspath(sys.argv[1]))
     print("\n".join(problems) or f"{len(documents)} documents in order")
     return bool(problems)
 
