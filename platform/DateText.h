@@ -9,11 +9,11 @@ namespace platform {
 
 /// Dates have a text from 0001-01-01T00:00:00Z to 9999-12-31T23:59:59Z, in the proleptic Gregorian calendar.
 inline constexpr double earliestDateWithText = -63113904000;
-inline constexpr double latestDateWithText = 252423993599;
+inline constexpr double endOfDatesWithText = 252423993600;
 
 /// Written so that what is not a number has none as well.
 constexpr bool hasText(Date date) noexcept {
-  return date.seconds >= earliestDateWithText && date.seconds <= latestDateWithText;
+  return date.seconds >= earliestDateWithText && date.seconds < endOfDatesWithText;
 }
 
 /// "YYYY-MM-DDThh:mm:ssZ".

@@ -33,6 +33,7 @@ class ValueBuilder;
 /// and copying one out copy deeply, so nothing a caller keeps can dangle; moving an outermost Value is cheap.
 ///
 /// Typed access never throws and never converts: it answers nothing when the value is of another kind.
+/// A string or data of 4 GiB or more throws std::length_error, as a lack of memory throws std::bad_alloc.
 /// Not synchronised: one thread at a time may touch a Value that anybody changes.
 class Value {
  public:

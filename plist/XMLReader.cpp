@@ -228,7 +228,7 @@ void XMLReader::fail(ErrorCode code, const std::string& description) {
 
 void XMLReader::start(const char* name) {
   Element element = elementNamed(name);
-  if (element == Element::none) return fail(ErrorCode::malformed, "no element is named <" + quoted(name) + ">");
+  if (element == Element::none) return fail(ErrorCode::malformed, "no element is named " + quoted(name));
   if (_leaf != Element::none) return fail(ErrorCode::malformed, "an element inside of one that holds text only");
   if (_open.empty() != (element == Element::plist)) {
     return fail(ErrorCode::malformed, "<plist> must be the outermost element and no other");
@@ -379,7 +379,9 @@ Value XMLReader::integer(std::string_view text) {
 
 Value XMLReader::real(std::string_view text) {
   double number = 0;
-  std::errc result = plist::parse(text, number);
+  // What is not a number may carry a payload for the parser below, but not here.
+  bool payload = text.ends_with(')');
+  std::errc result = payload ? std::errc::invalid_argument : plist::parse(text, number);
   if (result == std::errc()) return Value(number);
   if (result == std::errc::result_out_of_range) {
     fail(ErrorCode::outOfRange, "the real " + quoted(text) + " is beyond what a real can be");
