@@ -35,6 +35,15 @@ Value arrayOf(const std::vector<std::string>& texts) {
   return array;
 }
 
+std::string reasonForPeople(std::string_view description) {
+  std::size_t colon = description.find(": ");
+  std::string_view front = description.substr(0, colon);
+  std::size_t space = front.rfind(' ');
+  bool isCode = colon != std::string_view::npos && space != std::string_view::npos && front.find(' ') == space &&
+                front.find_first_not_of("-0123456789", space + 1) == std::string_view::npos;
+  return std::string(isCode ? description.substr(colon + 2) : description);
+}
+
 std::vector<std::size_t> Table::widths() const {
   constexpr std::size_t lineWidth = 80;
   constexpr std::size_t gap = 2;

@@ -20,6 +20,9 @@ void writeFailure(const CommonOptions& options, ExitCode code, std::string_view 
 /// An array of strings.
 platform::Value arrayOf(const std::vector<std::string>& texts);
 
+/// An error's one-line description without its domain and code, where words follow them.
+std::string reasonForPeople(std::string_view description);
+
 /// A table for people: columns as wide as their content, the whole no wider than 80 columns as long as the columns
 /// that may be shortened allow it.
 class Table {

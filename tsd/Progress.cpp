@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <utility>
 
 namespace tsd {
 namespace {
@@ -111,12 +112,23 @@ void Progress::headline(const std::string& text) {
   if (_mode == ProgressMode::tty) draw();
 }
 
+void Progress::countdown(const std::string& text, long long seconds) {
+  constexpr long long plainInterval = 10;
+  {
+    std::lock_guard lock(_mutex);
+    bool begins = std::exchange(_countingDown, text) != text;
+    if (_mode == ProgressMode::plain && !begins && seconds % plainInterval != 0) return;
+  }
+  headline(text + ", " + std::to_string(seconds) + " s left");
+}
+
 void Progress::finish() {
   std::lock_guard lock(_mutex);
   if (_mode == ProgressMode::tty) _console.setRegion({});
   _lines.clear();
   _places.clear();
   _headline.clear();
+  _countingDown.clear();
 }
 
 Progress::Line* Progress::find(const std::string& id) {

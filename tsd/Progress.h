@@ -35,6 +35,8 @@ class Progress {
   void ended(const std::string& id, const std::string& outcome, const std::string& reason, bool good);
   /// A line of its own about the whole, above the apps; on a terminal replaced by the next one, empty to take it away.
   void headline(const std::string& text);
+  /// A headline with the seconds that are left.
+  void countdown(const std::string& text, long long seconds);
   /// Takes what is redrawn in place from the console.
   void finish();
 
@@ -64,6 +66,7 @@ class Progress {
   std::vector<Line> _lines;
   std::map<std::string, std::size_t, std::less<>> _places;
   std::string _headline;
+  std::string _countingDown;  // in plain mode, the text of a countdown that has begun
   Instant _lastDrawn{};
 };
 

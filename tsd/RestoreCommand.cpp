@@ -76,11 +76,11 @@ const char* nameOfState(const device::AppStatus& app) {
   if (app.state != "placeholder") return app.state == "updating" ? "updating" : "installed";
   switch (app.installType) {
     case 2:
-      return "placeholder, restoring";
+      return "restoring";
     case 7:
-      return "placeholder, demoted automatically";
+      return "demoted automatically";
     case 8:
-      return "placeholder, demoted by hand";
+      return "demoted by hand";
     default:
       return "placeholder";
   }
@@ -155,9 +155,8 @@ void Restore::pushLists(FileConduit& conduit) {
 
 void Restore::reconcile(DeviceSession& session, Progress& progress) {
   const auto& services = session.device().platform();
-  CountdownClock clock(services.clock, [&](long long seconds) {
-    progress.headline("Waiting for placeholders, " + std::to_string(seconds) + " s left");
-  });
+  CountdownClock clock(services.clock,
+                       [&](long long seconds) { progress.countdown("Waiting for placeholders", seconds); });
   platform::Platform platform{services.process,       clock,
                               services.fileSystem,    services.propertyLists,
                               services.systemLog,     services.support,
@@ -221,7 +220,7 @@ Value Restore::document(ExitCode code) const {
   std::string message = _declined ? "the backup service declined: " + textOf(_declined) : _list.problem;
   if (!message.empty()) {
     Value error = Value::makeDictionary();
-    error.dictionary()->set("exitCode", static_cast<int>(code));
+    if (code != ExitCode::done) error.dictionary()->set("exitCode", static_cast<int>(code));
     error.dictionary()->set("message", message);
     entries.set("error", error);
   }
@@ -235,7 +234,7 @@ std::string Restore::text(ExitCode code) const {
   }
   std::string text;
   if (!_list.apps.empty()) {
-    Table table({{"APP", 20}, {"NAME", 12}, {"VERSION", 7}, {"STATE"}});
+    Table table({{"APP"}, {"NAME", 12}, {"VERSION", 7}, {"STATE"}});
     for (const auto& app : _list.apps) {
       table.add({app.id, app.name, app.version, app.state.empty() ? "missing" : app.state});
     }

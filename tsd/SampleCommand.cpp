@@ -59,7 +59,7 @@ ExitCode runSample(const CommandContext& context, const SampleOptions& options) 
     writeDocument(document(context.options, host));
     return ExitCode::done;
   }
-  Table table({{"APP", 16}, {"NAME", 12}, {"VERSION"}, {"TODO"}});
+  Table table({{"APP"}, {"NAME", 12}, {"VERSION"}, {"TODO"}});
   for (const auto& entry : host.entries()) {
     table.add({entry.app.id, entry.app.name, entry.app.version, nameOfRole(entry.role)});
   }

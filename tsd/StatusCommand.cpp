@@ -46,16 +46,16 @@ std::string lastOutcomeText(const device::AppStatus& app) {
 
 std::string text(const device::DeviceStatus& status) {
   std::string text;
-  Table apps({{"APP", 20}, {"NAME", 12}, {"VERSION", 7}, {"STATE"}, {"LAST OUTCOME"}});
+  Table apps({{"APP"}, {"NAME", 12}, {"VERSION", 7}, {"STATE"}, {"LAST OUTCOME"}});
   for (const auto& app : status.apps) {
     apps.add({app.id, app.name, app.version, app.state.empty() ? "-" : app.state, lastOutcomeText(app)});
   }
   text += apps.empty() ? "No apps.\n" : apps.text();
   for (const auto& app : status.apps) {
-    if (!app.lastReason.empty()) text += printable(app.id) + ": " + printable(app.lastReason) + "\n";
+    if (!app.lastReason.empty()) text += printable(app.id) + ": " + printable(reasonForPeople(app.lastReason)) + "\n";
   }
   if (!status.coordinators.empty()) {
-    Table open({{"OPEN COORDINATOR", 20}, {"KIND"}, {"CLIENT"}});
+    Table open({{"OPEN COORDINATOR"}, {"KIND"}, {"CLIENT"}});
     for (const auto& each : status.coordinators) open.add({each.app, each.kind, std::to_string(each.client)});
     text += "\n" + open.text();
   }

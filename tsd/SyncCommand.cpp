@@ -1,4 +1,5 @@
 #include <cstdlib>
+#include <filesystem>
 
 #include "tsd/CommandError.h"
 #include "tsd/Commands.h"
@@ -35,6 +36,10 @@ void show(const CommandContext& context, const std::vector<SyncReport>& reports)
 }  // namespace
 
 ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
+  std::error_code problem;
+  if (!std::filesystem::is_directory(options.host, problem)) {
+    throw CommandError(options.host + ": " + (problem ? problem.message() : "not a folder"));
+  }
   StopSignal stop;
   Progress progress(context.console, context.options.progress);
   AppWatch watch(progress);

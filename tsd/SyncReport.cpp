@@ -90,7 +90,7 @@ Value SyncReport::document(const std::string& command) const {
 std::string SyncReport::text() const {
   std::string text;
   if (!apps.empty()) {
-    Table table({{"APP", 20}, {"NAME", 12}, {"VERSION", 7}, {"OUTCOME"}});
+    Table table({{"APP"}, {"NAME", 12}, {"VERSION", 7}, {"OUTCOME"}});
     for (const auto& app : apps) table.add({app.id, app.name, app.version, lowered(app.outcome)});
     text += table.text();
     for (const auto& app : apps) {

@@ -6,6 +6,7 @@
 
 #include "tsd/CommandError.h"
 #include "tsd/FileConduit.h"
+#include "tsd/Output.h"
 #include "tsd/QuietWatch.h"
 
 namespace tsd {
@@ -105,6 +106,12 @@ void SyncRun::requestPackages() {
     auto app = _parts.session.device().app(asset->identifier());
     if (app && !app->state.empty()) _parts.progress.placeholderShown(asset->identifier());
   }
+  showOutcomes(true);
+  for (const auto& entry : _wanted) {
+    if (entry.operation != "install" || _requested.count(entry.identifier)) continue;
+    _parts.progress.ended(entry.identifier, isSafeIdentifier(entry.identifier) ? "not asked for" : "refused", "",
+                          false);
+  }
 }
 
 void SyncRun::recordPackagePaths() {
@@ -200,7 +207,7 @@ void SyncRun::showOutcomes(bool always) {
     if (entry.operation == "INSTALLED") _parts.progress.ended(entry.identifier, "installed", "", true);
     if (entry.operation == "FAILED") {
       auto app = _parts.session.device().app(entry.identifier);
-      _parts.progress.ended(entry.identifier, "failed", app ? app->lastReason : "", false);
+      _parts.progress.ended(entry.identifier, "failed", app ? reasonForPeople(app->lastReason) : "", false);
     }
   }
 }
@@ -253,8 +260,8 @@ AppOutcome SyncRun::outcomeOf(const std::string& id, const std::string& mark) co
   if (mark == "INSTALLED") {
     be("INSTALLED", "");
   } else if (mark == "FAILED") {
-    std::string reason = app ? app->lastReason : "";
-    be("FAILED", !reason.empty() ? reason : requested ? "the install failed" : "it could not be prepared");
+    std::string reason = app ? reasonForPeople(app->lastReason) : "";
+    be("FAILED", !requested ? "its install could not be prepared" : !reason.empty() ? reason : "the install failed");
   } else if (!requested) {
     if (isSafeIdentifier(id))
       be("SKIPPED", reasonForSkipping(id));
@@ -267,7 +274,7 @@ AppOutcome SyncRun::outcomeOf(const std::string& id, const std::string& mark) co
   } else if (result.end == End::interrupted || result.end == End::none) {
     be("INTERRUPTED", "its package had not arrived");
   } else if (app && app->lastOutcome == "CANCELED") {
-    be("CANCELLED", result.end == End::stalled ? "its package never arrived" : app->lastReason);
+    be("CANCELLED", result.end == End::stalled ? "its package never arrived" : reasonForPeople(app->lastReason));
   } else if (result.end == End::stalled) {
     be("PENDING", "its package never arrived");
   } else if (mark == "SENT") {
