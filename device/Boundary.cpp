@@ -140,8 +140,10 @@ void Boundary::begin(Visit& visit, CallArguments arguments) {
   const Crossing& crossing = visit.crossing;
   if (_journaled) {
     visit.arguments = Value::makeDictionary();
-    for (const auto& argument : arguments)
+    for (const auto& argument : arguments) {
       visit.arguments.dictionary()->set(argument.name, argument.journalValue(*this));
+      visit.argumentNames.push_back(argument.name);
+    }
   }
   _state->forEachRule(crossing.service, crossing.operation, crossing.app, [&](const InjectionRule& rule) {
     if (_state->actBefore(rule)) return;
@@ -157,7 +159,8 @@ void Boundary::begin(Visit& visit, CallArguments arguments) {
   });
   if (!_journaled || visit.direction == Direction::out || visit.order != Order::run) return;
   CallRecord record = makeRecord(crossing);
-  record.arguments = visit.arguments;
+  record.arguments = std::move(visit.arguments);
+  record.argumentNames = std::move(visit.argumentNames);
   _state->write(std::move(record));
 }
 
@@ -173,7 +176,9 @@ void Boundary::finish(Visit& visit, Value result, const ErrorRef* error) {
   bool inward = visit.direction == Direction::in;
   if (_journaled && !(inward && visit.order != Order::run)) {
     CallRecord record = makeRecord(visit.crossing);
-    if (!inward) record.arguments = std::move(visit.arguments);
+    // Those of a call into the plug-in stand in its first record.
+    record.arguments = inward ? Value::makeDictionary() : std::move(visit.arguments);
+    record.argumentNames = std::move(visit.argumentNames);
     record.result = std::move(result);
     if (error) record.error = *error;
     record.end = inward;

@@ -110,10 +110,11 @@ struct CallRecord {
   std::string service;
   std::string operation;
   std::string app;
-  platform::Value arguments;  // a dictionary
-  platform::Value result;     // absent for none
-  platform::ErrorRef error;   // absent for none
-  bool end = false;           // the return of a call into the plug-in
+  platform::Value arguments;               // a dictionary; without those that are absent
+  std::vector<const char*> argumentNames;  // of all of them, in order
+  platform::Value result;                  // absent for none
+  platform::ErrorRef error;                // absent for none
+  bool end = false;                        // the return of a call into the plug-in
 };
 
 /// The one wrapper that every call runs through that crosses between the plug-in and the device, in either direction:
@@ -211,6 +212,7 @@ class Boundary {
     bool dies = false;
     std::int64_t number = 0;
     platform::Value arguments{};
+    std::vector<const char*> argumentNames{};
   };
 
   /// Finds out what the rules order, lets the bystander act, and keeps the arguments as they are before the body.

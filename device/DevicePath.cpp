@@ -23,7 +23,7 @@ int splitDevicePath(std::string_view path, std::vector<std::string_view>& names)
 std::string textOfErrorNumber(int errorNumber) { return std::generic_category().message(errorNumber); }
 
 platform::ErrorRef fileError(int errorNumber, std::string_view path) {
-  std::string text(path);
+  std::string text(path.empty() ? "(no path)" : path);
   for (char& c : text) {
     if (static_cast<unsigned char>(c) < ' ' || c == '\x7f') c = '?';
   }

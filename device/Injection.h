@@ -33,7 +33,7 @@ struct InjectionRule {
   std::uint64_t match = 0;  // 0: every match
   Action action = Action::fail;
   std::int64_t number = 0;  // of `value`
-  std::string target;       // of cancel, prioritize, uninstall, store
+  std::string target{};     // of cancel, prioritize, uninstall, store
 
   /// Whether the rule is about calls of this operation for this app (empty: for none).
   bool matches(std::string_view service, std::string_view operation, std::string_view app) const;

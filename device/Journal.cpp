@@ -1,6 +1,5 @@
 #include "device/Journal.h"
 
-#include <cmath>
 #include <nlohmann/json.hpp>
 
 #include "platform/Describe.h"
@@ -50,6 +49,11 @@ ordered_json jsonOf(const Value& value) {
   return nullptr;
 }
 
+void addArguments(ordered_json& object, const CallRecord& record) {
+  const auto* arguments = record.arguments.dictionary();
+  for (const char* name : record.argumentNames) object[name] = arguments ? jsonOf((*arguments)[name]) : ordered_json();
+}
+
 std::string textOf(const ordered_json& json, int indent) {
   return json.dump(indent, ' ', false, ordered_json::error_handler_t::replace);
 }
@@ -67,12 +71,10 @@ std::string journalLine(const CallRecord& record) {
   line["app"] = record.app.empty() ? ordered_json() : ordered_json(record.app);
   if (record.service == "log") {
     // A message has neither parameters nor an outcome that anybody would look for.
-    if (auto* arguments = record.arguments.dictionary()) {
-      for (const auto& [name, value] : *arguments) line[std::string(name)] = jsonOf(value);
-    }
+    addArguments(line, record);
     return textOf(line, -1);
   }
-  line["args"] = record.arguments.isAbsent() ? ordered_json::object() : jsonOf(record.arguments);
+  addArguments(line["args"] = ordered_json::object(), record);
   line["result"] = jsonOf(record.result);
   line["error"] = jsonOf(journalValueOfError(record.error));
   if (record.end) line["end"] = true;
