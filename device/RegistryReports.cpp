@@ -56,6 +56,8 @@ void RegistryReports::installCancelled(platform::OBApplicationProxyRef app) {
 }
 
 void RegistryReports::appChanged(AppStatus status) {
+  // The owner is no caller that has to get ready first, and is told in the order of the changes, whoever made them.
+  EventQueue::OutsideCall outside;
   _events.post(Lane::registry, [this, status = std::move(status)] { _changed(status); });
 }
 

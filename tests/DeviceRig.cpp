@@ -1,0 +1,246 @@
+#include "tests/DeviceRig.h"
+
+#include <cairo.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "device/Store.h"
+#include "plist/PropertyList.h"
+#include "tests/ZipArchive.h"
+
+namespace tests {
+
+namespace {
+
+/// Parts that outlive the device they are given to.
+class SharedStore final : public device::Store {
+ public:
+  SharedStore(device::Store& store, const bool& broken) : _store(store), _broken(broken) {}
+  std::vector<device::StoreRecord> load() override { return _store.load(); }
+  bool commit(const std::vector<device::StoreRecord>& changes, ErrorRef* error) override {
+    if (!_broken) return _store.commit(changes, error);
+    platform::setError(error, platform::makeError("Store", 28, "no space left"));
+    return false;
+  }
+
+ private:
+  device::Store& _store;
+  const bool& _broken;
+};
+
+class SharedTree final : public device::FileTree {
+ public:
+  explicit SharedTree(device::FileTree& tree) : _tree(tree) {}
+  bool removeItem(std::string_view path, ErrorRef* error) override { return _tree.removeItem(path, error); }
+  bool createDirectory(std::string_view path, bool intermediates, const Value& attributes, ErrorRef* error) override {
+    return _tree.createDirectory(path, intermediates, attributes, error);
+  }
+  bool moveItem(std::string_view from, std::string_view to, ErrorRef* error) override {
+    return _tree.moveItem(from, to, error);
+  }
+  bool copyItem(std::string_view from, std::string_view to, ErrorRef* error) override {
+    return _tree.copyItem(from, to, error);
+  }
+  bool fileExists(std::string_view path, bool* isDirectory) override { return _tree.fileExists(path, isDirectory); }
+  std::optional<platform::FileAttributes> attributesOfItem(std::string_view path, ErrorRef* error) override {
+    return _tree.attributesOfItem(path, error);
+  }
+  bool createFile(std::string_view path, platform::BytesView contents, const Value& attributes) override {
+    return _tree.createFile(path, contents, attributes);
+  }
+  std::optional<Bytes> readFile(std::string_view path, ErrorRef* error) override { return _tree.readFile(path, error); }
+  bool writeAtomically(std::string_view path, platform::BytesView contents, ErrorRef* error) override {
+    return _tree.writeAtomically(path, contents, error);
+  }
+  int utimes(std::string_view path, int& number) override { return _tree.utimes(path, number); }
+  std::optional<std::vector<Entry>> list(std::string_view path, ErrorRef* error) override {
+    return _tree.list(path, error);
+  }
+  std::unique_ptr<device::FileWriter> createNew(std::string_view path, bool executable, ErrorRef* error) override {
+    return _tree.createNew(path, executable, error);
+  }
+  std::unique_ptr<device::FileReader> openForReading(std::string_view path, ErrorRef* error) override {
+    return _tree.openForReading(path, error);
+  }
+  bool syncDirectory(std::string_view path, ErrorRef* error) override { return _tree.syncDirectory(path, error); }
+
+ private:
+  device::FileTree& _tree;
+};
+
+}  // namespace
+
+struct DeviceRig::SharedParts {
+  std::unique_ptr<device::FileTree> files;
+  std::unique_ptr<device::Store> store;
+  bool broken = false;
+};
+
+std::string nameOfMedium(const testing::TestParamInfo<Medium>& info) {
+  return info.param == Medium::disk ? "disk" : "memory";
+}
+
+Value dictionaryOf(std::initializer_list<std::pair<std::string_view, Value>> entries) {
+  auto value = Value::makeDictionary();
+  for (const auto& [key, entry] : entries) value.dictionary()->set(key, entry);
+  return value;
+}
+
+Bytes packageOf(const std::string& identifier, const std::string& version) {
+  auto manifest = plist::writeBinary(dictionaryOf(
+      {{"KBBundleIdentifier", identifier}, {"KBBundleVersion", version}, {"KBBundleDisplayName", "Packaged"}}));
+  return ZipArchive::of({{"Maps.app/Info.plist", *manifest}, {"Maps.app/data/tiles", "0123456789", 0104755}});
+}
+
+Bytes pngOf(int width, int height) {
+  Bytes bytes;
+  auto* surface = cairo_image_surface_create(CAIRO_FORMAT_ARGB32, width, height);
+  auto* context = cairo_create(surface);
+  cairo_set_source_rgb(context, 0.9, 0.3, 0.1);
+  cairo_paint(context);
+  cairo_destroy(context);
+  cairo_surface_write_to_png_stream(
+      surface,
+      [](void* out, const unsigned char* data, unsigned length) {
+        static_cast<Bytes*>(out)->append(reinterpret_cast<const char*>(data), length);
+        return CAIRO_STATUS_SUCCESS;
+      },
+      &bytes);
+  cairo_surface_destroy(surface);
+  return bytes;
+}
+
+std::string RecordingObserver::textOf(const Proxies& proxies) {
+  std::string text;
+  for (const auto& proxy : proxies) {
+    text += ' ' + proxy->applicationIdentifier.value_or("?");
+    if (const auto& progress = proxy->installProgressSync)
+      text += '/' + std::to_string(progress->installState) + std::to_string(progress->installPhase);
+  }
+  return text;
+}
+
+DeviceRig::DeviceRig(Medium medium) : _medium(medium), _parts(std::make_unique<SharedParts>()) {
+  ErrorRef error;
+  if (_medium == Medium::disk) {
+    std::string pattern = testing::TempDir() + "device-rig-XXXXXX";
+    _folder = ::mkdtemp(pattern.data());
+    EXPECT_TRUE(device::createDevice(_folder, &error)) << error->describe();
+    _parts->files = device::openDiskFileTree(_folder + "/fs", &error);
+    _parts->store = device::openDatabaseStore(_folder + "/device.db", &error);
+  } else {
+    _parts->files = device::makeMemoryFileTree();
+    _parts->store = device::makeMemoryStore();
+    EXPECT_TRUE(device::makeDeviceParts(*_parts->files, *_parts->store, &error)) << error->describe();
+  }
+  open();
+}
+
+DeviceRig::~DeviceRig() {
+  _device.reset();
+  _parts.reset();
+  if (!_folder.empty()) std::filesystem::remove_all(_folder);
+}
+
+void DeviceRig::open() {
+  auto events = device::makeManualEventQueue();
+  _events = events.get();
+  device::DeviceOptions options;
+  options.changed = [this](const device::AppStatus& app) {
+    _told.push_back(app.id + ' ' + app.state + (app.lastOutcome.empty() ? "" : ' ' + app.lastOutcome));
+  };
+  ErrorRef error;
+  _device = device::LocalDevice::open(std::make_unique<SharedTree>(*_parts->files),
+                                      std::make_unique<SharedStore>(*_parts->store, _parts->broken), std::move(events),
+                                      std::move(options), &error);
+  ASSERT_TRUE(_device) << (error ? error->describe() : "no reason");
+}
+
+void DeviceRig::reopen() {
+  _device.reset();
+  _told.clear();
+  open();
+}
+
+void DeviceRig::breakStore(bool broken) { _parts->broken = broken; }
+
+Coordinator DeviceRig::coordinator(Kind kind, const std::string& app, platform::RVClientIdentifier client) {
+  ErrorRef error;
+  auto result = platform().installCoordination.coordinatorForAppWithBundleID(kind, app, client, true, nullptr, &error);
+  EXPECT_TRUE(result) << (error ? error->describe() : "no reason");
+  return result;
+}
+
+std::shared_ptr<platform::RVPlaceholder> DeviceRig::placeholder(const std::string& app, std::uint64_t type,
+                                                                bool configured) {
+  auto& service = platform().installCoordination;
+  auto result = service.makeAppPlaceholder("Maps", app, type, 3);
+  std::string iconPath = "/var/mobile/tmp/" + app + ".png";
+  write(iconPath, pngOf(4, 4));
+  auto icon = service.makePromisedTransferToPath(app + "-Icon", 3, iconPath, 100);
+  icon->setComplete(true);
+  EXPECT_TRUE(result->setIconPromise(icon));
+  auto attributes = service.makePlaceholderAttributesWithInfoPlistDictionary(
+      dictionaryOf({{"KBBundleIconFile", "missing"}, {"Genre", "Travel"}}));
+  attributes->setBundleVersion("2");
+  attributes->setLaunchProhibited(true);
+  EXPECT_TRUE(result->setPlaceholderAttributes(attributes));
+  EXPECT_TRUE(result->setMetadata(platform().installer.makeStoreMetadata(dictionaryOf({{"vantorId", "placeholder"}}))));
+  if (configured) {
+    EXPECT_TRUE(result->setConfigurationComplete());
+  }
+  return result;
+}
+
+std::shared_ptr<platform::RVPromisedTransferToPath> DeviceRig::promise(const Coordinator& coordinator,
+                                                                       const std::string& app) {
+  auto options = platform().installer.makeInstallOptions();
+  options->setObInstallType(4);
+  EXPECT_TRUE(coordinator->setInstallOptions(options));
+  auto result = platform().installCoordination.makePromisedTransferToPathWithoutPath(app + "-Asset", 3, 0);
+  EXPECT_TRUE(coordinator->setAppAssetPromise(result));
+  return result;
+}
+
+std::shared_ptr<platform::RVPromisedTransferToPath> DeviceRig::begin(Kind kind, const std::string& app) {
+  auto handle = coordinator(kind, app);
+  auto result = promise(handle, app);
+  ErrorRef error;
+  EXPECT_TRUE(handle->setPlaceholderPromise(placeholder(app), &error)) << (error ? error->describe() : "");
+  return result;
+}
+
+void DeviceRig::write(const std::string& path, const Bytes& content) {
+  files().createDirectory(path.substr(0, path.rfind('/')), true, {});
+  EXPECT_TRUE(files().createFile(path, content, {})) << path;
+}
+
+void DeviceRig::install(const std::string& app, const std::string& version) {
+  write(packagePath(app), packageOf(app, version));
+  ErrorRef error;
+  EXPECT_TRUE(device().installFromPackage(packagePath(app), &error)) << (error ? error->describe() : "");
+}
+
+Value DeviceRig::list(const std::string& path) {
+  auto bytes = files().readFile(path);
+  return bytes ? plist::read(std::move(*bytes)) : Value();
+}
+
+std::size_t DeviceRig::containerCount() { return files().list(containers).value().size(); }
+
+std::string DeviceRig::stateOf(const std::string& app) {
+  auto status = device().app(app);
+  if (!status || status->state.empty()) return "";
+  return status->state + ' ' + std::to_string(status->installType) +
+         (status->version.empty() ? "" : ' ' + status->version);
+}
+
+bool DeviceRig::isShown(const std::string& app) {
+  for (const auto& id : device().status().home) {
+    if (id == app) return true;
+  }
+  return false;
+}
+
+}  // namespace tests

@@ -1,0 +1,337 @@
+#include "tests/PluginRig.h"
+
+#include <archive.h>
+#include <archive_entry.h>
+#include <cairo.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+
+#include "platform/Describe.h"
+#include "platform/FileSystem.h"
+#include "platform/NotificationCenter.h"
+#include "platform/Plugin.h"
+#include "plist/PropertyList.h"
+
+extern "C" const platform::PluginTable* TSPluginTable();
+
+namespace tests {
+
+using device::CallRecord;
+
+bool matches(std::string_view pattern, std::string_view text) {
+  auto star = pattern.find('*');
+  if (star == pattern.npos) return pattern == text;
+  if (text.substr(0, star) != pattern.substr(0, star)) return false;
+  std::string_view rest = pattern.substr(star + 1);
+  for (std::size_t at = star; at <= text.size(); ++at) {
+    if (matches(rest, text.substr(at))) return true;
+  }
+  return false;
+}
+
+Value dictionaryOf(std::initializer_list<std::pair<std::string_view, Value>> entries) {
+  Value value = Value::makeDictionary();
+  for (const auto& [key, entry] : entries) value.dictionary()->set(key, entry);
+  return value;
+}
+
+Value arrayOf(const std::vector<std::string>& elements) {
+  Value value = Value::makeArray();
+  for (const auto& element : elements) value.array()->append(element);
+  return value;
+}
+
+Bytes binaryList(const Value& value) { return plist::writeBinary(value).value(); }
+
+Bytes packageOf(const std::string& identifier, const std::string& version, std::size_t contentSize) {
+  Bytes manifest = binaryList(dictionaryOf({{"KBBundleIdentifier", identifier},
+                                            {"KBBundleVersion", version},
+                                            {"KBBundleDisplayName", "Packaged " + identifier}}));
+  Bytes bytes(contentSize + 8192, '\0');
+  std::size_t used = 0;
+  std::unique_ptr<archive, int (*)(archive*)> zip(archive_write_new(), archive_write_free);
+  archive_write_set_format_zip(zip.get());
+  archive_write_set_options(zip.get(), "zip:compression=store");
+  archive_write_open_memory(zip.get(), bytes.data(), bytes.size(), &used);
+  auto add = [&](const std::string& name, const Bytes& content) {
+    std::unique_ptr<archive_entry, void (*)(archive_entry*)> entry(archive_entry_new(), archive_entry_free);
+    archive_entry_set_pathname(entry.get(), name.c_str());
+    archive_entry_set_mode(entry.get(), AE_IFREG | 0644);
+    archive_entry_set_size(entry.get(), static_cast<la_int64_t>(content.size()));
+    archive_write_header(zip.get(), entry.get());
+    archive_write_data(zip.get(), content.data(), content.size());
+  };
+  add("App.app/Info.plist", manifest);
+  add("App.app/content", Bytes(contentSize, 'c'));
+  archive_write_close(zip.get());
+  bytes.resize(used);
+  return bytes;
+}
+
+const Bytes& iconImage() {
+  static const Bytes image = [] {
+    Bytes bytes;
+    cairo_surface_t* surface = cairo_image_surface_create(CAIRO_FORMAT_ARGB32, 8, 8);
+    cairo_surface_write_to_png_stream(
+        surface,
+        [](void* out, const unsigned char* data, unsigned length) {
+          static_cast<Bytes*>(out)->append(reinterpret_cast<const char*>(data), length);
+          return CAIRO_STATUS_SUCCESS;
+        },
+        &bytes);
+    cairo_surface_destroy(surface);
+    return bytes;
+  }();
+  return image;
+}
+
+void DaemonTransfers::prioritizeAsset(const TSAssetRef& asset, std::function<void(ErrorRef)> completion) {
+  std::lock_guard lock(_mutex);
+  _prioritized.push_back(asset->identifier());
+  _completions.push_back(std::move(completion));
+}
+
+void DaemonTransfers::cancelAssetTransferForFailedAsset(const TSAssetRef& asset) {
+  std::lock_guard lock(_mutex);
+  _cancelled.push_back(asset->identifier());
+}
+
+std::vector<std::string> DaemonTransfers::prioritized() const {
+  std::lock_guard lock(_mutex);
+  return _prioritized;
+}
+
+bool DaemonTransfers::wasCancelled(const std::string& identifier) const {
+  std::lock_guard lock(_mutex);
+  return std::count(_cancelled.begin(), _cancelled.end(), identifier) != 0;
+}
+
+bool DaemonTransfers::complete() {
+  std::vector<std::function<void(ErrorRef)>> completions;
+  {
+    std::lock_guard lock(_mutex);
+    completions.swap(_completions);
+  }
+  for (auto& completion : completions) completion(nullptr);
+  return !completions.empty();
+}
+
+static bool isTransactionMessage(const CallRecord& record) {
+  return record.service == "log" && (*record.arguments.dictionary())["category"].string() == "tsd.appsync";
+}
+
+PluginRig::PluginRig(const Options& options) {
+  device::DeviceOptions chosen;
+  chosen.mainBundleIdentifier = options.process;
+  chosen.deviceService = &_transfers;
+  if (options.journaled) {
+    chosen.journal = [this](const CallRecord& record) {
+      // What the transaction log makes of its records says the same again.
+      if (!isTransactionMessage(record)) _records.push_back(record);
+    };
+  }
+  for (const auto& rule : options.rules) {
+    ErrorRef error;
+    auto parsed = device::InjectionRule::parse(rule, &error);
+    if (parsed) chosen.rules.push_back(*parsed);
+    EXPECT_TRUE(parsed) << error->describe();
+  }
+  if (options.threaded) {
+    _device = device::makeMemoryDevice(device::makeThreadedEventQueue(), std::move(chosen));
+  } else {
+    auto events = device::makeManualEventQueue();
+    _manualEvents = events.get();
+    _device = device::makeMemoryDevice(std::move(events), std::move(chosen));
+  }
+  _transfers.serve(*_device);
+  EXPECT_TRUE(_device->set("icon-size", "16"));
+  load();
+}
+
+PluginRig::~PluginRig() {
+  unload();
+  _device->events().stop();
+}
+
+void PluginRig::load() {
+  const platform::PluginTable* table = TSPluginTable();
+  ASSERT_EQ(table->interfaceVersion, platform::pluginInterfaceVersion);
+  ASSERT_STREQ(table->dataclass, "Application");
+  _client = table->create(platform());
+  ASSERT_TRUE(_client);
+}
+
+void PluginRig::unload() {
+  deliver();
+  _client = nullptr;
+  _device->events().drain();
+}
+
+void PluginRig::postStartup() {
+  platform().notifications.notify_post(startupNotification);
+  deliver();
+}
+
+void PluginRig::deliver() {
+  do _device->events().drain();
+  while (_transfers.complete());
+}
+
+Value PluginRig::installedAssets() {
+  return enter("installedAssets", [&] { return _client->installedAssets(); });
+}
+bool PluginRig::reconcileSync(ErrorRef* error) {
+  return enter("reconcileSync", [&] {
+    return _client->reconcileSync(
+        1, "anchor", [](double) {}, error);
+  });
+}
+std::vector<TSAssetRef> PluginRig::outstandingAssetTransfers() {
+  return enter("outstandingAssetTransfers", [&] { return _client->outstandingAssetTransfers(); });
+}
+void PluginRig::progress(const TSAssetRef& asset, double fraction) {
+  asset->setDownloadProgress(static_cast<float>(fraction));
+  enter(
+      "assetTransferUpdatedProgress", [&] { _client->assetTransferUpdatedProgress(asset, fraction); },
+      asset->identifier());
+}
+void PluginRig::transferEnded(const TSAssetRef& asset, bool succeeded, const ErrorRef& error) {
+  enter(
+      "assetTransferSucceeded", [&] { _client->assetTransferSucceeded(asset, succeeded, error); }, asset->identifier());
+}
+void PluginRig::installSucceeded(const TSAssetRef& asset) {
+  enter(
+      "assetInstallSucceeded", [&] { _client->assetInstallSucceeded(asset); }, asset->identifier());
+}
+void PluginRig::installFailed(const TSAssetRef& asset, const ErrorRef& error) {
+  enter(
+      "assetInstallFailed", [&] { _client->assetInstallFailed(asset, error); }, asset->identifier());
+}
+void PluginRig::phaseEnded(bool success) {
+  enter("assetTransferEndedWithSuccess", [&] { _client->assetTransferEndedWithSuccess(success); });
+}
+void PluginRig::syncEnded(bool success) {
+  enter("syncEndedWithSuccess", [&] { _client->syncEndedWithSuccess(success); });
+}
+void PluginRig::clearSyncData() {
+  enter("clearSyncData", [&] { _client->clearSyncData(); });
+}
+bool PluginRig::reconcileRestore(std::int32_t type, ErrorRef* error) {
+  return enter("reconcileRestoreOfType", [&] { return _client->reconcileRestoreOfType(type, error); });
+}
+
+void PluginRig::write(const std::string& path, const Bytes& content) {
+  auto& files = _device->files();
+  EXPECT_TRUE(files.createDirectory(path.substr(0, path.rfind('/')), true, {})) << path;
+  EXPECT_TRUE(files.createFile(path, content, {})) << path;
+}
+
+std::optional<Bytes> PluginRig::read(const std::string& path) { return _device->files().readFile(path); }
+
+Value PluginRig::readList(const std::string& path) {
+  auto bytes = read(path);
+  return bytes ? plist::read(std::move(*bytes)) : Value();
+}
+
+bool PluginRig::exists(const std::string& path) { return _device->files().fileExists(path); }
+
+void PluginRig::install(const std::string& identifier, const std::string& version) {
+  ErrorRef error;
+  std::string path = receivePackage(identifier, packageOf(identifier, version));
+  EXPECT_TRUE(_device->installFromPackage(path, &error)) << error->describe();
+}
+
+std::string PluginRig::receivePackage(const std::string& identifier, const Bytes& content) {
+  std::string path = std::string(packagesDirectory) + "/" + identifier + ".pkg";
+  write(path, content);
+  return path;
+}
+
+std::vector<const CallRecord*> PluginRig::recordsIn(std::string_view operation, std::size_t nth) const {
+  std::vector<const CallRecord*> found;
+  bool inside = false;
+  std::string thread;
+  for (const auto& record : _records) {
+    if (record.service == "AppsClient" && record.operation == operation) {
+      if (inside && record.end && record.thread == thread) return found;
+      if (!record.end && --nth == 0) {
+        inside = true;
+        thread = record.thread;
+      }
+    } else if (inside && record.thread == thread) {
+      found.push_back(&record);
+    }
+  }
+  return found;
+}
+
+std::vector<std::string> PluginRig::messagesIn(std::string_view operation, std::size_t nth) const {
+  std::vector<std::string> lines;
+  for (const auto* record : recordsIn(operation, nth)) {
+    if (record->service == "log") lines.push_back(lineOf(*record));
+  }
+  return lines;
+}
+
+std::vector<std::string> PluginRig::traceIn(std::string_view operation, const std::string& app, std::size_t nth) const {
+  std::vector<std::string> lines;
+  for (const auto* record : recordsIn(operation, nth)) {
+    std::string line = lineOf(*record);
+    if (record->app == app || line.find(app) != line.npos) lines.push_back(std::move(line));
+  }
+  return lines;
+}
+
+std::vector<std::string> PluginRig::messages() const {
+  std::vector<std::string> lines;
+  for (const auto& record : _records) {
+    if (record.service == "log") lines.push_back(lineOf(record));
+  }
+  return lines;
+}
+
+std::size_t PluginRig::countOf(std::string_view operation, std::string_view app) const {
+  return static_cast<std::size_t>(std::count_if(_records.begin(), _records.end(), [&](const CallRecord& record) {
+    return !record.end && record.operation == operation && (app.empty() || record.app == app);
+  }));
+}
+
+static std::string lineOfMessage(const CallRecord& record) {
+  constexpr std::string_view prefix = "com.vantor.tsd.appsync|";
+  const auto& arguments = *record.arguments.dictionary();
+  std::string category = platform::describe(arguments["category"]);
+  std::string_view text = arguments["text"].string().value_or("");
+  std::string line = record.operation == "error" ? "E " : "";
+  if (category != "8") line += "[" + category + "] ";
+  if (category != "0") {
+    if (text.substr(0, prefix.size()) != prefix) return line + "without the prefix: " + std::string(text);
+    text.remove_prefix(prefix.size());
+  }
+  return line += text;
+}
+
+std::string lineOf(const CallRecord& record) {
+  if (record.service == "log") return lineOfMessage(record);
+  const auto& arguments = *record.arguments.dictionary();
+  auto text = [&](std::string_view name) { return platform::describe(arguments[name]); };
+  auto outcome = [&] { return arguments["success"].boolValue() ? " y " : " n "; };
+  if (record.operation == "logStep") {
+    return "step " + text("step") + '/' + text("party") + '/' + text("phase") + outcome() + record.app + ' ' + text("description");
+  }
+  if (record.operation == "logScenario") {
+    return "scenario " + text("scenario") + ' ' + text("step") + outcome() + record.app + ' ' + text("description");
+  }
+  std::string line = record.operation + '(';
+  for (const auto& [key, value] : arguments) {
+    if (key == "self") continue;
+    if (line.back() != '(') line += ", ";
+    line += platform::describe(value);
+  }
+  line += ')';
+  if (!record.result.isAbsent()) line += " = " + platform::describe(record.result);
+  if (record.error) line += " ! " + record.error->domain() + ' ' + std::to_string(record.error->code());
+  return line;
+}
+
+}  // namespace tests
