@@ -23,31 +23,30 @@ std::vector<Setting> parse(const std::vector<std::string>& texts) {
   return settings;
 }
 
-/// All of them, or none.
-void applyAll(device::LocalDevice& device, const std::vector<Setting>& settings) {
-  std::vector<Setting> before;
+void apply(device::LocalDevice& device, const std::vector<Setting>& settings) {
   for (const auto& setting : settings) {
-    Setting old{setting.key, device.setting(setting.key)};
     platform::ErrorRef error;
-    if (device.set(setting.key, setting.value, &error)) {
-      before.push_back(std::move(old));
-      continue;
-    }
-    while (!before.empty()) {
-      device.set(before.back().key, before.back().value);
-      before.pop_back();
-    }
+    if (device.set(setting.key, setting.value, &error)) continue;
     bool unknown = error && error->code() == static_cast<std::int64_t>(device::LocalDeviceError::unknownSetting);
     throw CommandError(unknown ? ExitCode::usage : ExitCode::failed, textOf(error));
   }
+}
+
+/// Throws when a setting is not known, so that the device gets all of them or none.
+void rehearse(const std::vector<Setting>& settings) {
+  auto device = device::makeMemoryDevice(device::makeManualEventQueue(), {});
+  tsd::apply(*device, settings);
+  device->events().drain();
+  device->events().stop();
 }
 
 }  // namespace
 
 ExitCode runSet(const CommandContext& context, const SetOptions& options) {
   auto settings = parse(options.settings);
+  rehearse(settings);
   DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
-  applyAll(session.device(), settings);
+  tsd::apply(session.device(), settings);
   auto document = startDocument(context.options.command);
   document.dictionary()->set("result", "done");
   auto values = platform::Value::makeDictionary();

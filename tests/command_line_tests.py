@@ -1,0 +1,336 @@
+#!/usr/bin/env python3
+"""The program from its command line: exit codes, what stands on which stream, and the state of devices afterwards.
+
+usage: command_line_tests.py TSD [unittest arguments]
+"""
+
+import collections
+import fcntl
+import json
+import os
+import pathlib
+import plistlib
+import re
+import shutil
+import signal
+import subprocess
+import sys
+import tempfile
+import unittest
+
+TSD = None
+DONE, FAILED, USAGE, SOME_FAILED, CANCELLED, DEADLINE, BUSY = range(7)
+
+# A command line in a folder that has an empty device `dev`, a host `host` of 3 apps and a few things that are neither;
+# what its exit code, standard output and standard error have to be (regular expressions; empty output where None).
+Row = collections.namedtuple("Row", "line code out err", defaults=(None, None))
+
+ONE_LINE = r"\Atsd: [^\n]*{}[^\n]*\n\Z"
+
+
+def says(text):
+    return ONE_LINE.format(re.escape(text))
+
+
+COMMAND_LINES = [
+    # What the program says about itself.
+    Row("--help", DONE, r"Subcommands:(.|\n)*sample(.|\n)*Exit codes:"),
+    Row("--version", DONE, r"^tsd \d+\.\d+\.\d+$"),
+    Row("sync --help", DONE, r"--asset(.|\n)*--end-phase(.|\n)*--inject"),
+    # Command lines that make no sense.
+    Row("", USAGE, err=says("subcommand")),
+    Row("frobnicate dev", USAGE, err=says("there is no subcommand 'frobnicate'")),
+    Row("sync dev", USAGE, err=says("HOST is required")),
+    Row("status dev --frobnicate", USAGE, err=says("--frobnicate")),
+    Row("status dev --progress loud", USAGE, err=says("loud")),
+    Row("sync dev host --transfers 0", USAGE, err=says("--transfers")),
+    Row("sync dev host --transfers many", USAGE, err=says("many")),
+    Row("sync dev host --end-phase maybe", USAGE, err=says("maybe")),
+    Row("sync dev host --asset com.example.a", USAGE, err=says("APP:KEY=VALUE is expected")),
+    Row("sync dev host --asset com.example.a:colour=red", USAGE, err=says("colour=red")),
+    Row("sync dev host --asset com.example.a:isDownload=perhaps", USAGE, err=says("isDownload=perhaps")),
+    Row("sync dev host --asset com.example.a:completedAssetParts=2x", USAGE, err=says("completedAssetParts=2x")),
+    Row("sync dev host --inject nowhere=fail", USAGE, err=says("nowhere")),
+    Row("sync dev host --inject writeAtomically=explode", USAGE, err=says("explode")),
+    Row("sync dev host --inject writeAtomically", USAGE, err=says("writeAtomically")),
+    Row("query dev weather", USAGE, err=says("weather")),
+    Row("set dev app-removal", USAGE, err=says("KEY=VALUE is expected")),
+    Row("set dev app-removal=sometimes", USAGE, err=says("sometimes")),
+    Row("set dev app-removal=forbidden colour=red", USAGE, err=says("colour")),
+    Row("store dev com.example.a --package host/ApplicationsSync.plist", USAGE, err=says("--finish")),
+    Row("sample new --demo --apps 4", USAGE, err=says("--demo")),
+    # Things that are not what they should be; the device stays as it is.
+    Row("init dev", FAILED, err=says("dev")),
+    Row("init file/below", FAILED, err=says("file/below")),
+    Row("status nowhere", FAILED, err=says("nowhere: No such file")),
+    Row("status host", FAILED, err=says("host: not a device")),
+    Row("status file", FAILED, err=says("file: not a folder")),
+    Row("status broken", FAILED, err=says("broken")),
+    Row("sync dev nowhere", FAILED, err=says("nowhere: No such file")),
+    Row("sync dev file", FAILED, err=says("file: not a folder")),
+    Row("sync dev oddhost --progress none", FAILED, err=says("oddhost/ApplicationsSync.plist: a symbolic link")),
+    Row("restore dev nowhere", FAILED, err=says("nowhere: No such file")),
+    Row("sample host", FAILED, err=says("host: there is something already")),
+    Row("uninstall dev com.example.nobody", FAILED, err=says("com.example.nobody")),
+    Row("store dev com.example.a --finish --package nowhere", FAILED, err=says("nowhere: No such file")),
+    Row("status dev --log nowhere/log", FAILED, err=says("nowhere/log: No such file")),
+    Row("query dev metrics --plugin nowhere.so", FAILED, err=says("nowhere.so: the plug-in is not there")),
+    Row("query dev metrics --plugin file", FAILED, err=says("file: cannot be loaded as a plug-in")),
+    Row("query dev metrics --plugin C-LIBRARY", FAILED, err=says("no entry point 'TSPluginTable'")),
+    # What goes well says nothing on standard error.
+    Row("status dev", DONE, r"^No apps\.$"),
+    Row("query dev metrics", DONE, r"^_Count 0$"),
+    Row("query dev disabled-asset-types", DONE, r"^none$"),
+    Row("sync dev emptyhost --progress none", DONE, r"^Nothing to do\.$"),
+    Row("restore dev emptyhost --progress none", DONE, r"^Nothing to do"),
+    Row("backup dev", DONE, r"ready"),
+    Row("clear dev", DONE, r"cleared"),
+]
+
+# The same with --json: standard output is one document, whatever happens.
+DOCUMENTS = [
+    Row("frobnicate --json", USAGE, r'"result": "failed"', r"frobnicate"),
+    Row("sync dev --json", USAGE, r'"command": "sync"', r"HOST"),
+    Row("status nowhere --json", FAILED, r'"message": "nowhere: No such file', r"nowhere"),
+    Row("sync dev nowhere --json", FAILED, r'"exitCode": 1', r"nowhere"),
+    Row("sync dev emptyhost --json --progress none", DONE, r'"result": "done"'),
+    Row("restore dev emptyhost --json --progress none", DONE, r'"missing": \[\]'),
+    Row("set dev icon-size=120 --json", DONE, r'"icon-size": "120"'),
+    Row("query dev vantor-ids --json", DONE, r'"answer": \[\]'),
+    Row("status dev --json", DONE, r'"coordinators": \[\]'),
+]
+
+
+def c_library():
+    return next(str(path) for path in pathlib.Path("/").glob("lib/*/libc.so.6"))
+
+
+def tree_of(folder):
+    """Every file's content but the lock's, as other processes are told there who holds it."""
+    folder = pathlib.Path(folder)
+    return {str(path.relative_to(folder)): path.read_bytes() if path.is_file() else None
+            for path in folder.rglob("*") if path.name != "lock"}
+
+
+class Folder(unittest.TestCase):
+    """Each test in an empty folder of its own."""
+
+    def setUp(self):
+        folder = tempfile.mkdtemp()
+        self.addCleanup(shutil.rmtree, folder)
+        self.addCleanup(os.chdir, os.getcwd())
+        os.chdir(folder)
+
+    def tsd(self, *arguments, code=DONE):
+        run = subprocess.run([TSD, *arguments], capture_output=True, text=True, timeout=120, stdin=subprocess.DEVNULL)
+        self.assertEqual(run.returncode, code, f"{' '.join(arguments)}\n{run.stdout}{run.stderr}")
+        return run
+
+    def document(self, *arguments, code=DONE):
+        return json.loads(self.tsd(*arguments, "--json", code=code).stdout)
+
+    def sync(self, *arguments, code=DONE):
+        return self.document("sync", *arguments, "--progress", "none", code=code)
+
+    def make(self, apps=3, device="dev", *more):
+        self.tsd("init", device)
+        return [app["id"] for app in self.document("sample", "host", "--apps", str(apps), *more)["apps"]]
+
+
+class CommandLines(Folder):
+    def setUp(self):
+        super().setUp()
+        self.make()
+        os.mkdir("emptyhost")
+        os.mkdir("oddhost")
+        os.symlink("../host/ApplicationsSync.plist", "oddhost/ApplicationsSync.plist")
+        os.makedirs("broken/fs")
+        pathlib.Path("broken/device.db").write_text("not a database, but long enough to be looked at" * 40)
+        pathlib.Path("file").write_text("a file")
+
+    def check(self, row):
+        with self.subTest(row.line):
+            line = row.line.replace("C-LIBRARY", c_library()).split()
+            before = tree_of(".") if row.code != DONE else None
+            run = self.tsd(*line, code=row.code)
+            self.assertRegex(run.stdout, re.compile(row.out or r"\A\Z", re.MULTILINE))
+            self.assertRegex(run.stderr, row.err or r"\A\Z")
+            if before is not None:
+                self.assertEqual(tree_of("."), before)
+            return run
+
+    def test_command_lines(self):
+        for row in COMMAND_LINES:
+            self.check(row)
+
+    def test_documents(self):
+        for row in DOCUMENTS:
+            run = self.check(row)
+            if run:
+                self.assertEqual(json.loads(run.stdout)["schema"], 1)
+
+    def test_a_device_in_use_names_its_holder(self):
+        self.tsd("status", "dev")
+        with open("dev/lock", "r+") as lock:
+            fcntl.flock(lock, fcntl.LOCK_EX)
+            lock.write("4711 (tsd sync dev host)\n")
+            lock.flush()
+            self.assertRegex(self.tsd("status", "dev", code=BUSY).stderr, says("dev: in use by process 4711 (tsd sync"))
+        self.tsd("status", "dev")
+
+
+class Syncs(Folder):
+    def outcomes(self, report):
+        return {app["id"]: app["outcome"] for app in report["apps"]}
+
+    def test_what_is_reported_of_an_asset(self):
+        # (options, outcome, todo mark, state afterwards or None, exit code), of the first app of two
+        table = [
+            ([], "INSTALLED", "INSTALLED", "installed", DONE),
+            (["--asset", "APP:path=relative"], "INSTALLED", "INSTALLED", "installed", DONE),
+            (["--asset", "APP:path=recorded"], "INSTALLED", "INSTALLED", "installed", DONE),
+            (["--asset", "APP:path=none"], "PENDING", "install", "placeholder", SOME_FAILED),
+            (["--asset", "APP:path=/var/mobile/../x"], "PENDING", "install", "placeholder", SOME_FAILED),
+            (["--asset", "APP:isDownload=false"], "SENT", "SENT", "placeholder", DONE),
+            (["--asset", "APP:isRestore=true"], "DOWNLOADED", "DOWNLOADED", "placeholder", DONE),
+            (["--asset", "APP:stall"], "CANCELLED", "install", None, SOME_FAILED),
+            (["--asset", "APP:stall", "--end-phase", "success"], "PENDING", "install", "placeholder", SOME_FAILED),
+            (["--inject", "transfer:APP@2=fail"], "FAILED", "install", "placeholder", SOME_FAILED),
+            (["--inject", "transfer:APP@2=cancel=APP"], "CANCELLED", "install", None, SOME_FAILED),
+            (["--inject", "setAppAssetPromise:APP=fail"], "FAILED", "FAILED", None, SOME_FAILED),
+            (["--inject", "coordinatorDidCompleteSuccessfully:APP=none"], "PENDING", "DOWNLOADED", "installed",
+             SOME_FAILED),
+            (["--daemon-reports", "--inject", "coordinatorDidCompleteSuccessfully:APP=none"], "INSTALLED", "INSTALLED",
+             "installed", DONE),
+        ]
+        apps = self.make(2)
+        for number, (options, outcome, mark, state, code) in enumerate(table):
+            with self.subTest(options):
+                device = f"dev{number}"
+                self.tsd("init", device)
+                report = self.sync(device, "host", *[each.replace("APP", apps[0]) for each in options], code=code)
+                self.assertEqual(self.outcomes(report), {apps[0]: outcome, apps[1]: "INSTALLED"})
+                self.assertEqual(report["todo"][0], {"identifier": apps[0], "operation": mark})
+                states = {app["id"]: app["state"] for app in self.document("status", device)["apps"]}
+                self.assertEqual(states.get(apps[0]), state)
+
+    def test_a_recorded_package_is_found_again(self):
+        apps = self.make(1)
+        self.sync("dev", "host", "--asset", f"{apps[0]}:isDownload=false")
+        self.sync("dev", "host", "--asset", f"{apps[0]}:path=recorded", "--log", "log")
+        self.assertIn(f"Recovered download path for {apps[0]} at", pathlib.Path("log").read_text())
+
+    def test_a_killed_sync_is_made_good_by_the_next(self):
+        self.make(4, "dev", "--package-size", "100000")
+        self.tsd("init", "whole")
+        self.sync("whole", "host")
+        for rule in ["transfer@3=kill", "transfer@9=kill-after", "setPlaceholderPromise@2=kill-after"]:
+            with self.subTest(rule):
+                shutil.rmtree("dev")
+                self.tsd("init", "dev")
+                self.tsd("sync", "dev", "host", "--inject", rule, code=-signal.SIGKILL)
+                self.sync("dev", "host")
+                self.assertEqual(self.document("status", "dev"), self.document("status", "whole"))
+
+    def test_a_signal_leaves_packages_unfinished(self):
+        apps = self.make(2, "dev", "--package-size", "1000")
+        for app in apps:
+            os.truncate(f"host/Packages/{app}.pkg", 1 << 28)
+        run = subprocess.Popen([TSD, "sync", "dev", "host", "--json", "--progress", "plain", "--log", "log"],
+                               stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True)
+        for line in run.stderr:
+            if "sent 25 %" in line:
+                break
+        # Most of the packages is still to come; nothing moves until the signal is there.
+        run.send_signal(signal.SIGSTOP)
+        run.send_signal(signal.SIGINT)
+        run.send_signal(signal.SIGCONT)
+        out, _ = run.communicate(timeout=60)
+        self.assertEqual(run.returncode, CANCELLED)
+        report = json.loads(out)
+        self.assertEqual(report["result"], "cancelled")
+        self.assertEqual(set(self.outcomes(report).values()), {"INTERRUPTED"})
+        log = pathlib.Path("log").read_text()
+        self.assertIn("asset transfer ended withsuccess: n", log)
+        self.assertIn("sync ended with success: n", log)
+        self.assertNotIn("asset transfer succeeded", log)
+
+    def test_the_order_of_packages_can_be_changed(self):
+        apps = self.make(4)
+        report = self.sync("dev", "host", "--transfers", "1", "--calls", "calls",
+                           "--inject", "transfer@2=prioritize=" + self.last_of_the_layout())
+        calls = [json.loads(line) for line in pathlib.Path("calls").read_text().splitlines()]
+        ended = [call["app"] for call in calls if call["op"] == "assetTransferSucceeded" and not call.get("end")]
+        asked = report["requested"]
+        self.assertEqual(ended, [asked[0], asked[-1], *asked[1:-1]])
+        self.assertEqual(sorted(asked), sorted(apps))
+        self.assertEqual([call["n"] for call in calls], list(range(1, len(calls) + 1)))
+
+    def last_of_the_layout(self):
+        pages = plistlib.loads(pathlib.Path("host/PanelloIconState.plist").read_bytes())
+        return pages[-1][-1]
+
+    def test_hosts_that_are_odd(self):
+        apps = self.make(2)
+        os.mkfifo(f"host/{apps[0]}/pipe")
+        os.symlink("/etc/passwd", f"host/{apps[0]}/link")
+        os.remove(f"host/Packages/{apps[1]}.pkg")
+        run = self.tsd("sync", "dev", "host", "--progress", "none", code=SOME_FAILED)
+        self.assertIn(f"host/{apps[0]}/pipe: not pushed: a named pipe", run.stderr)
+        self.assertIn(f"host/{apps[0]}/link: not pushed: a symbolic link", run.stderr)
+        self.assertIn(f"{apps[1]}: host/Packages/{apps[1]}.pkg: No such file", run.stdout)
+        for content in [b"", b"no list at all", plistlib.dumps({"a": "dictionary"}), plistlib.dumps(["a text", 5])]:
+            with self.subTest(content):
+                pathlib.Path("host/ApplicationsSync.plist").write_bytes(content)
+                self.tsd("init", "other")
+                self.assertEqual(self.sync("other", "host")["apps"], [])
+                shutil.rmtree("other")
+
+    def test_restrictions(self):
+        apps = self.make(2)
+        self.tsd("set", "dev", "app-installation=forbidden")
+        report = self.sync("dev", "host")
+        self.assertEqual(report["requested"], [])
+        self.assertEqual(self.outcomes(report), dict.fromkeys(apps, "SKIPPED"))
+
+    def test_a_removed_app_is_told_to_the_host_once(self):
+        apps = self.make(2)
+        self.sync("dev", "host")
+        self.tsd("uninstall", "dev", apps[0])
+        os.remove("host/ApplicationsSync.plist")
+        reports = self.sync("dev", "host", "--repeat", "2")["runs"]
+        self.assertEqual([report["deleted"] for report in reports], [[apps[0]], []])
+
+
+class Restores(Folder):
+    def test_placeholders_and_what_is_missing(self):
+        self.make(6)
+        report = self.document("restore", "dev", "host")
+        self.assertEqual([app["installType"] for app in report["apps"]], [2, 2, 8, 7, 7])
+        self.assertEqual(self.document("status", "dev")["syncing"], 1)
+        missing = report["apps"][3]["id"]
+        self.tsd("init", "other")
+        run = self.tsd("restore", "other", "host", "--inject", f"RVAppInstallCoordinator.setPlaceholderPromise:{missing}=fail",
+                       code=DEADLINE)
+        self.assertRegex(run.stdout, rf"Placeholders missing at the end:\n  {missing}\n")
+
+    def test_the_store_finishes_and_a_sync_follows(self):
+        apps = self.make(5)
+        self.document("restore", "dev", "host")
+        self.tsd("store", "dev", apps[0], "--finish")
+        self.tsd("store", "dev", apps[1], "--finish", "--package", f"host/Packages/{apps[1]}.pkg")
+        self.sync("dev", "host")
+        status = self.document("status", "dev")
+        self.assertEqual({app["state"] for app in status["apps"]}, {"installed"})
+        self.assertEqual(status["coordinators"], [])
+
+    def test_lists_that_are_none(self):
+        self.make(2)
+        pathlib.Path("host/Restore/RestoreApplications.plist").write_bytes(b"no list")
+        run = self.tsd("restore", "dev", "host", "--progress", "none", code=FAILED)
+        self.assertIn("host/Restore/RestoreApplications.plist: ", run.stderr)
+
+
+if __name__ == "__main__":
+    TSD = str(pathlib.Path(sys.argv.pop(1)).resolve())
+    unittest.main()
