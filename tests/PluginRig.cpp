@@ -317,7 +317,8 @@ std::string lineOf(const CallRecord& record) {
   auto text = [&](std::string_view name) { return platform::describe(arguments[name]); };
   auto outcome = [&] { return arguments["success"].boolValue() ? " y " : " n "; };
   if (record.operation == "logStep") {
-    return "step " + text("step") + '/' + text("party") + '/' + text("phase") + outcome() + record.app + ' ' + text("description");
+    return "step " + text("step") + '/' + text("party") + '/' + text("phase") + outcome() + record.app + ' ' +
+           text("description");
   }
   if (record.operation == "logScenario") {
     return "scenario " + text("scenario") + ' ' + text("step") + outcome() + record.app + ' ' + text("description");

@@ -244,6 +244,8 @@ class SyncModel {
       app.ownCoordinator = true;
     }
     if (fails("creatorIdentifier", id) || foreign) return false;
+    // Nobody hears of the coordinator, unless the process listens to all of them.
+    if (fails("setObserver", id) && _scenario.process != "com.vantor.tsd") _unheard.insert(id);
     if (fails("makeInstallOptions") || fails("setInstallOptions", id) || fails("setInitialZDRAssetPromises", id) ||
         fails("makePromisedTransferToPathWithoutPath", id)) {
       cancel("coordinator", id, "TSError 1");
@@ -300,7 +302,7 @@ class SyncModel {
       endCoordinator(app.id);
       if (app.person == App::Person::uninstalls) remove(app.id);
     }
-    bool stops = cancelled && !hasSetting("device-service-cancel", "no");
+    bool stops = cancelled && !_unheard.count(app.id) && !hasSetting("device-service-cancel", "no");
     if (!stops) {
       progress(app);
       if (app.transfer == App::Transfer::stalls) return;
@@ -337,7 +339,7 @@ class SyncModel {
       if (succeeds) app.installed = true;
       if (succeeds) app.placeholder = false;
       endCoordinator(id);
-      if (fails("bundleID", id)) continue;
+      if (_unheard.count(id) || fails("bundleID", id)) continue;
       bool seemsFine = fails("error", id) || succeeds;
       mark(id, seemsFine ? "INSTALLED" : "FAILED");
     }
@@ -378,6 +380,7 @@ class SyncModel {
   std::vector<std::string> _layout;
   std::vector<std::string> _shown;
   std::set<std::string> _stagedFolder;  // candidates whose files are the host's
+  std::set<std::string> _unheard;
   std::set<std::string> _updating;
   std::set<std::string> _outstanding;
   std::vector<std::pair<std::string, bool>> _installs;  // and whether it will succeed
