@@ -40,24 +40,19 @@ std::shared_ptr<platform::RVAppInstallCoordinator> InstallCoordinationService::c
 
 void InstallCoordinationService::uninstallAppWithBundleID(std::string_view bundleID, bool requestUserConfirmation,
                                                           std::function<void(ErrorRef)> completion) {
-  ErrorRef failure;
-  auto complete = [&](ErrorRef outcome) {
-    _events.post(Lane::coordination, [this, app = std::string(bundleID), completion, outcome] {
-      _boundary.enter({"AppsClient", "uninstallCompletion", app}, {{"error", outcome}}, [&] { completion(outcome); });
-    });
-  };
-  bool ran = false;
+  ErrorRef failure, outcome;
   _boundary.call({className, "uninstallAppWithBundleID", bundleID}, &failure,
                  {{"bundleID", bundleID}, {"requestUserConfirmation", requestUserConfirmation}}, [&] {
-                   ErrorRef outcome;
-                   ran = true;
                    _engine.uninstall(bundleID, &outcome);
-                   if (completion) complete(outcome);
                    return true;
                  });
-  // Inside the call what is posted waits for the caller's next one; this has to wait as well.
+  if (!completion) return;
+  if (failure) outcome = failure;
+  // The completion waits for the caller's next call, as all does that this one caused.
   EventQueue::InsideCall inside;
-  if (!ran && completion) complete(failure);
+  _events.post(Lane::coordination, [this, app = std::string(bundleID), completion = std::move(completion), outcome] {
+    _boundary.enter({"AppsClient", "uninstallCompletion", app}, {{"error", outcome}}, [&] { completion(outcome); });
+  });
 }
 
 std::shared_ptr<platform::RVPromisedTransferToPath> InstallCoordinationService::makePromisedTransferToPath(

@@ -80,7 +80,7 @@ class WholeDevice final : public LocalDevice {
         _coordinatorReports(_boundary, *_events),
         _engine(_records, *_files, _boundary, *_events, _registryReports, _coordinatorReports),
         _process(_boundary, *_files, options.mainBundleIdentifier),
-        _fileSystem(_boundary, *_files, nullptr),
+        _fileSystem(_boundary, *_files, options.fileFailed),
         _propertyLists(_boundary),
         _systemLog(_boundary, options.log),
         _support(_boundary, _systemLog),
@@ -108,9 +108,8 @@ class WholeDevice final : public LocalDevice {
   }
 
   bool load(ErrorRef* error) {
-    if (!makeDirectories(*_files, error)) return false;
     auto loaded = _records.load(error);
-    if (!loaded) return false;
+    if (!loaded || !makeDirectories(*_files, error)) return false;
     {
       Lock lock(_records.mutex);
       for (const auto& [name, state] : _records.state().notificationStates) _notifications.restoreState(name, state);
