@@ -5,7 +5,8 @@
 
 namespace tsd {
 
-DeviceSession::DeviceSession(const CommandContext& context, Setup setup) : _context(context), _lock(setup.folder) {
+DeviceSession::DeviceSession(const CommandContext& context, const Setup& setup)
+    : _context(context), _lock(setup.folder) {
   if (!context.options.log.empty()) _log.emplace(context.options.log);
   if (!context.options.calls.empty()) _calls.emplace(context.options.calls);
   platform::ErrorRef error;

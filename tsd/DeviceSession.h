@@ -27,7 +27,7 @@ class DeviceSession {
   };
 
   /// Throws a `CommandError` when any of it fails.
-  DeviceSession(const CommandContext& context, Setup setup);
+  DeviceSession(const CommandContext& context, const Setup& setup);
   ~DeviceSession();
   DeviceSession(const DeviceSession&) = delete;
   DeviceSession& operator=(const DeviceSession&) = delete;

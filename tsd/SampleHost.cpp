@@ -135,7 +135,8 @@ void SampleHost::writeAppFolder(const SampleApp& app, bool binary) const {
 }
 
 void SampleHost::writePackages() const {
-  std::string folder = _options.host + "/Packages";
+  const std::string folder = _options.host + "/Packages";
+  const std::string olderFolder = folder + "/older";
   makeFolder(folder);
   std::uint64_t seed = _options.seed * 1000;
   for (const auto& entry : _entries) {
@@ -150,10 +151,10 @@ void SampleHost::writePackages() const {
       if (problem) throw CommandError(folder + file + ": " + problem.message());
     }
     if (entry.role == SampleRole::older || entry.role == SampleRole::remove) {
-      makeFolder(folder + "/older");
+      makeFolder(olderFolder);
       SampleApp older = entry.app;
       older.version = olderVersion;
-      writeSamplePackage(folder + "/older" + file, older, _options.packageSize / 2, seed);
+      writeSamplePackage(olderFolder + file, older, _options.packageSize / 2, seed);
     }
   }
 }

@@ -115,8 +115,9 @@ void SyncRun::requestPackages() {
 }
 
 void SyncRun::recordPackagePaths() {
-  for (const auto& [id, report] : _parts.options.reports) {
-    if (report.path != AssetReport::Path::recorded) continue;
+  for (const auto& reported : _parts.options.reports) {
+    const std::string& id = reported.first;
+    if (reported.second.path != AssetReport::Path::recorded) continue;
     auto entry = std::find_if(_wanted.begin(), _wanted.end(), [&](const auto& each) { return each.identifier == id; });
     auto app = _parts.session.device().app(id);
     std::string version = entry != _wanted.end() ? entry->version : app ? app->version : "";
