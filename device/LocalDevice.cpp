@@ -44,7 +44,7 @@ constexpr std::string_view directories[] = {
     "/var/mobile/tmp",
     "/var/mobile/Library",
     "/var/mobile/Library/Preferences",
-    "/var/mobile/Library/Logs",
+    "/var/mobile/Library/Logs/MediaServices",
     "/var/mobile/Media/PublicStaging",
     "/var/mobile/Media/PublicStaging/Packages",
     containersDirectory,
