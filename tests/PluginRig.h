@@ -92,6 +92,8 @@ class PluginRig {
   void load();
   /// Lets the plug-in object go, after everything under way has been delivered.
   void unload();
+  /// Lets it go at once, whoever may be calling back.
+  void forget() { _client = nullptr; }
   void postStartup();
   /// Delivers everything that is due, also what follows from it.
   void deliver();

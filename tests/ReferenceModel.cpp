@@ -395,9 +395,12 @@ class RestoreModel {
     _plan.enter("reconcileRestoreOfType");
     bool asked = _scenario.type == 2 || _scenario.type == 3;
     bool unasked = asked && fails("tessaroShouldCreateAppPlaceholders");
-    bool declines = unmanaged || unasked || hasSetting("backup-placeholders", "no");
-    if (unasked) _outcome.error = "Injection";
-    if (asked && !unasked && hasSetting("backup-error", "yes")) _outcome.error = "BackupService";
+    bool errs = hasSetting("backup-error", "yes");
+    bool declines = unmanaged || unasked || errs || hasSetting("backup-placeholders", "no");
+    bool agreesWithError =
+        std::count(_scenario.rules.begin(), _scenario.rules.end(), "tessaroShouldCreateAppPlaceholders=error") != 0;
+    if (asked && errs) _outcome.error = "BackupService";
+    if (unasked || agreesWithError) _outcome.error = "Injection";
     if (asked && !declines && _scenario.hasList && !_plan.next("fileExists", "", restoreListPath)) {
       processList();
       _plan.enter("reconcileRestoreOfType");

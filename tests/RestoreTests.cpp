@@ -1,0 +1,362 @@
+#include <gtest/gtest.h>
+
+#include <algorithm>
+
+#include "platform/InstallCoordination.h"
+#include "plist/PropertyList.h"
+#include "tests/ReferenceModel.h"
+
+namespace tests {
+namespace {
+
+using Entry = RestoreApp::Entry;
+using Kind = platform::RVCoordinatorKind;
+using Lines = std::vector<std::string>;
+
+struct Row {
+  RestoreScenario given;
+  std::string outcome;
+  Lines says{};
+  Lines neverSays{};
+};
+
+void expectRows(const std::vector<Row>& rows) {
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.given.name);
+    PluginRig rig(optionsOf(row.given));
+    auto outcome = run(rig, row.given);
+    EXPECT_EQ(outcome.text(), row.outcome);
+    EXPECT_EQ(outcome.text(), predict(row.given).text());
+    EXPECT_TRUE(inOrder(rig.messages(), row.says));
+    for (const auto& pattern : row.neverSays) EXPECT_FALSE(inOrder(rig.messages(), {pattern})) << pattern;
+  }
+}
+
+Bytes list(const Value& value) { return plist::writeXML(value).value(); }
+
+/// One app's whole preparation, calls and messages.
+Lines preparation(const std::string& app, int status, const std::string& name, const std::string& version) {
+  const std::string type = status == 0 ? "2" : status == 1 ? "8" : "7";
+  const std::string icon = "/var/mobile/tmp/com.vantor.tsd.Apps/" + app + ".app/Icon.png";
+  const std::string step = status == 0 ? " Restore app" : " Restore demoted app";
+  const std::string kind = status == 0 ? "RVRestoringAppInstallCoordinator" : "RVRestoringDemotedAppInstallCoordinator";
+  Lines lines = {"processing harlune restore info for '" + app + "' demotionStatus :" + std::to_string(status),
+                 "processing app restore for " + std::string(status == 0 ? "non demoted" : "demoted") + " bundle '" +
+                     app + "' with install coordination",
+                 "step 2/1/1 y " + app + step,
+                 "coordinatorForAppWithBundleID(" + kind + ", " + app + ", 3, 1) = coordinator#*"};
+  if (status == 0) lines.push_back("appAssetPromiseResponsibleClient() = 0");
+  Lines rest = {"setObserver(observer#*)",
+                "hasUserDataPromise() = 0",
+                "makePromisedOutOfBandTransfer(" + app + "-UserData, 3, 0) = promise#*",
+                "setPercentComplete(1)",
+                "setComplete(1)",
+                "setUserDataPromise(promise#*) = 1",
+                "Added out of band user data promise for for " + app,
+                "hasPlaceholderPromise() = 0",
+                "createDirectory(*/" + app + ".app, 1, {FX* = mobile; FX* = mobile}) = 1",
+                "Created app directory for '" + app + "' at *.app with err=(null)",
+                "createFile(" + icon + ", *, {FX* = mobile; FX* = mobile}) = 1",
+                "attributesOfItem(" + icon + ") = *",
+                "icon data for '" + app + "' was writen to " + icon +
+                    " with status:1 fileSize:" + std::to_string(iconImage().size()),
+                "step 4/1/1 y " + app + " Create placeholder",
+                "makeAppPlaceholder(" + name + ", " + app + ", " + type + ", 3) = placeholder#*",
+                "step 4/1/2 y " + app + " Finished creating placeholder",
+                "Created placeholder <*> for '" + app + "' of type " + type,
+                "makePromisedTransferToPath(" + app + "-Icon, 3, " + icon + ", *) = promise#*",
+                "setPercentComplete(1)",
+                "setComplete(1)",
+                "setIconPromise(promise#*) = 1",
+                "Added icon promise to placeholder for '" + app + "'",
+                "setPlaceholderAttributes(attributes#*) = 1",
+                "set <*version " + version + "*> placeholder attributes for " + app,
+                "setMetadata(metadata#*) = 1",
+                "set store metadata on placeholder for " + app,
+                "setSinfData(6) = 1",
+                "set SINF data on placeholder for " + app,
+                "setConfigurationComplete() = 1",
+                "set placeholder configuration complete for " + app,
+                "setPlaceholderPromise(placeholder#*) = 1",
+                "Shiftwell will wait for RC to install placeholder for " + app + ", _restoringPlaceholderCount *",
+                "added placeholder promise for " + app};
+  lines.insert(lines.end(), rest.begin(), rest.end());
+  if (status == 0) lines.push_back("setAppAssetPromiseResponsibleClient(1) = 1");
+  if (status == 0) lines.push_back("set RVClientMercato to satisfy app asset promise for " + app);
+  lines.push_back("processing app restore for " + std::string(status == 0 ? "" : "demoted app ") + app +
+                  " finished with status 1 error (null)");
+  lines.push_back("step 2/1/2 y " + app + step);
+  return lines;
+}
+
+TEST(Restore, EveryAppStepByStep) {
+  RestoreScenario scenario{
+      .apps = {{.id = "app.plain", .metadata = {{"title", "T"}, {"itemName", "I"}, {"bundleVersion", "3.1"}}},
+               {.id = "app.named", .metadata = {{"itemName", "I"}, {"launchProhibited", true}}},
+               {.id = "app.hand", .demotedByHand = true, .metadata = {{"title", 5}}},
+               {.id = "app.auto",
+                .demotedAutomatically = true,
+                .metadata = {{"OBApplicationLaunchProhibited", false}, {"launchProhibited", true}}},
+               {.id = "app.both", .demotedAutomatically = true, .demotedByHand = true}}};
+  PluginRig rig(optionsOf(scenario));
+  auto outcome = run(rig, scenario);
+  EXPECT_EQ(outcome.text(),
+            "open [app.named restoring]; open [app.plain restoring]; app.auto is placeholder 7; app.both is "
+            "placeholder 7; app.hand is placeholder 8; app.named is placeholder 2; app.plain is placeholder 2; waited "
+            "0; filed away; ");
+  auto trace = [&](const std::string& app) {
+    Lines lines = rig.traceIn("reconcileRestoreOfType", app);
+    auto begin = std::find_if(lines.begin(), lines.end(), [](const std::string& line) {
+      return matches("processing harlune restore info for*", line);
+    });
+    return Lines(begin, lines.end());
+  };
+  EXPECT_TRUE(exactly(trace("app.plain"), preparation("app.plain", 0, "T", "3.1")));
+  EXPECT_TRUE(exactly(trace("app.named"), preparation("app.named", 0, "I", "(null)")));
+  EXPECT_TRUE(exactly(trace("app.hand"), preparation("app.hand", 1, "app.hand", "(null)")));
+  EXPECT_TRUE(exactly(trace("app.auto"), preparation("app.auto", 2, "app.auto", "(null)")));
+  EXPECT_TRUE(exactly(trace("app.both"), preparation("app.both", 2, "app.both", "(null)")));
+  Lines lines;
+  for (const auto& record : rig.records()) lines.push_back(lineOf(record));
+  EXPECT_TRUE(inOrder(lines, {"setLaunchProhibited(0)", "setBundleVersion(3.1)",
+                              "makeStoreMetadata({title = T; itemName = I; bundleVersion = 3.1}) = metadata#*",
+                              "setLaunchProhibited(1)", "setBundleVersion()", "setLaunchProhibited(0)",
+                              "setLaunchProhibited(0)", "setLaunchProhibited(0)"}));
+  EXPECT_TRUE(inOrder(
+      rig.messages(),
+      {"reconcileRestoreOfType 2", "Notifying PN we are starting syncing", "processing harlune restore info",
+       "[15] Demoted Apps: {AutomaticDowngrades = (app.auto, app.both); IntentionalDowngrades = (app.hand, app.both)}",
+       "Will wait for 25 seconds for 5 placeholders to install",
+       "RC finished installing placeholder for app.plain, _restoringPlaceholderCount 4",
+       "RC finished installing placeholder for app.both, _restoringPlaceholderCount 0",
+       "Finished waiting for placeholder installs"}));
+  EXPECT_EQ(rig.device().status().home.size(), 5u);
+  EXPECT_EQ(rig.device().status().syncing, 1u);
+
+  // The list is used once; reports after the wait are nothing.
+  EXPECT_TRUE(rig.reconcileRestore(2));
+  EXPECT_TRUE(exactly(rig.messagesIn("reconcileRestoreOfType", 2),
+                      {"reconcileRestoreOfType 2", "Notifying PN we are starting syncing",
+                       "no harlune restore plist found - skipping processing of harlune restored apps"}));
+}
+
+TEST(Restore, WhatIsAskedAndWhatIsThere) {
+  const std::string one = "open [app.a restoring]; app.a is placeholder 2; waited 0; filed away; ";
+  const Lines skipped = {"no harlune restore plist found - skipping processing of harlune restored apps"};
+  expectRows({
+      {.given = {.name = "type 3", .apps = {{.id = "app.a"}}, .type = 3}, .outcome = one},
+      {.given = {.name = "another type", .apps = {{.id = "app.a"}}, .type = 1, .settings = {{"backup-error", "yes"}}},
+       .outcome = "waited 0; ",
+       .says = {"reconcileRestoreOfType 1"},
+       .neverSays = {"Will not*", "*harlune*"}},
+      {.given = {.name = "the backup service declines",
+                 .apps = {{.id = "app.a"}},
+                 .type = 3,
+                 .settings = {{"backup-placeholders", "no"}}},
+       .outcome = "waited 0; ",
+       .says = {"Will not reconcile restore of type 3 - error (null)"}},
+      {.given = {.name = "declines with an error",
+                 .apps = {{.id = "app.a"}},
+                 .type = 3,
+                 .settings = {{"backup-placeholders", "no"}, {"backup-error", "yes"}}},
+       .outcome = "waited 0; error BackupService; ",
+       .says = {"Will not reconcile restore of type 3 - error BackupService *"}},
+      {.given = {.name = "agrees with an error",
+                 .apps = {{.id = "app.a"}},
+                 .rules = {"tessaroShouldCreateAppPlaceholders=error"}},
+       .outcome = one + "error Injection; "},
+      {.given = {.name = "no list", .apps = {{.id = "app.a"}}, .hasList = false},
+       .outcome = "waited 0; ",
+       .says = skipped,
+       .neverSays = {"Will wait*"}},
+      {.given = {.name = "no property list", .rawList = "text"},
+       .outcome = "waited 0; filed away; ",
+       .says = {"processing harlune restore info", "failed to parse harlune app restore info. err=plist *"},
+       .neverSays = {"Will wait*"}},
+      {.given = {.name = "no dictionary", .rawList = list(arrayOf({"app.a"}))},
+       .outcome = "waited 0; filed away; ",
+       .says = {"failed to parse harlune app restore info. err=(null)"}},
+      {.given = {.name = "unreadable",
+                 .apps = {{.id = "app.a"}},
+                 .failures = {{.point = "FileSystem.readFile", .match = 1, .path = restoreListPath}}},
+       .outcome = "waited 0; filed away; ",
+       .says = {"failed to read harlune app restore info. err=Injection 1: *"},
+       .neverSays = {"processing harlune restore info"}},
+      {.given = {.name = "cannot be filed away",
+                 .apps = {{.id = "app.a"}},
+                 .failures = {{.point = "FileSystem.moveItem", .path = restoreLogPath}}},
+       .outcome = "open [app.a restoring]; app.a is placeholder 2; waited 0; ",
+       .says = {"Finished waiting for placeholder installs", "failed to copy harlune metadata. err=Injection 1: *"}},
+      {.given = {.name = "an empty list", .apps = {}},
+       .outcome = "waited 0; filed away; ",
+       .says = {"Will wait for 0 seconds for 0 placeholders to install"}},
+      {.given = {.name = "demoted apps in no list",
+                 .apps = {{.id = "app.a", .demotedByHand = true}},
+                 .rawDemotedList = "text"},
+       .outcome = one,
+       .says = {"E couldn't parse demoted apps list", "[15] Demoted Apps: (null)"}},
+      {.given = {.name = "demoted apps in an array",
+                 .apps = {{.id = "app.a", .demotedByHand = true}},
+                 .rawDemotedList = list(arrayOf({"app.a"}))},
+       .outcome = one,
+       .says = {"E demoted apps list is not a dictionary"}},
+      {.given = {.name = "demoted apps in an empty file", .apps = {{.id = "app.a"}}, .rawDemotedList = ""},
+       .outcome = one,
+       .says = {"[15] Demoted Apps: (null)"},
+       .neverSays = {"E *"}},
+      {.given = {.name = "entries of every shape",
+                 .apps = {{.id = "app.a", .entry = Entry::notADictionary},
+                          {.id = "app.b", .entry = Entry::noMetadata},
+                          {.id = "app.c", .entry = Entry::metadataIsNoList},
+                          {.id = "app.d", .demotedByHand = true, .entry = Entry::metadataIsNoDictionary},
+                          {.id = "app.e", .hasIcon = false, .hasRights = false}}},
+       .outcome = "open [app.e restoring]; app.e is placeholder 2; waited 0; filed away; ",
+       .says = {"no harlune restore info for 'app.a' - skipping", "no HarluneMetadata for 'app.b' - ignoring",
+                "E failed to parse harlune metadata for 'app.c'. err=plist *",
+                "processing app restore for app.c finished with status 0 error plist *",
+                "E failed to parse harlune metadata for 'app.d'. err=*",
+                "processing app restore for demoted app app.d finished with status 0 error *",
+                "E no icon data for 'app.e'", "set placeholder configuration complete for app.e"},
+       .neverSays = {"set SINF*", "Added icon promise*", "Cancelling*"}},
+  });
+}
+
+TEST(Restore, TheWaitEndsWithTheLastReportOrTheDeadline) {
+  expectRows({
+      {.given = {.name = "one is never installed",
+                 .apps = {{.id = "app.a"}, {.id = "app.b", .neverReported = true}, {.id = "app.c"}}},
+       .outcome = "open [app.a restoring]; open [app.b restoring]; open [app.c restoring]; app.a is placeholder 2; "
+                  "app.b is placeholder 2; app.c is placeholder 2; waited 15; filed away; ",
+       .says = {"Will wait for 15 seconds for 3 placeholders to install",
+                "RC finished installing placeholder for app.c, _restoringPlaceholderCount 1",
+                "Finished waiting for placeholder installs"}},
+      {.given = {.name = "in the daemon's own process no report counts",
+                 .apps = {{.id = "app.a"}},
+                 .process = "com.vantor.tsd"},
+       .outcome = "open [app.a restoring]; app.a is placeholder 2; waited 5; filed away; ",
+       .says = {"coordinatorDidInstallPlaceholder for app.a with error (null)",
+                "Finished waiting for placeholder installs"},
+       .neverSays = {"RC finished*", "E Ignoring*"}},
+  });
+}
+
+TEST(Restore, WhatIsLeftAwaitedIsFreedByACancellation) {
+  RestoreScenario scenario{.apps = {{.id = "app.a", .neverReported = true}, {.id = "app.b", .neverReported = true}}};
+  PluginRig rig(optionsOf(scenario));
+  EXPECT_EQ(run(rig, scenario).waited, 10);
+  EXPECT_TRUE(rig.device().cancelByPerson("app.a"));
+  rig.deliver();
+  // The other one still counts in the next restore of the process.
+  RestoreScenario next{.apps = {{.id = "app.c"}}, .type = 3};
+  EXPECT_EQ(run(rig, next).waited, 10);
+  EXPECT_TRUE(
+      inOrder(rig.messages(), {"RC cancelled coordinator for restoring app bundle app.a _restoringPlaceholderCount 1",
+                               "Will wait for 10 seconds for 2 placeholders to install"}));
+  for (const char* app : {"app.b", "app.c"}) EXPECT_TRUE(rig.device().cancelByPerson(app));
+  rig.deliver();
+  EXPECT_EQ(run(rig, RestoreScenario{}).waited, 0);
+  rig.unload();
+  EXPECT_FALSE(inOrder(rig.messages(), {"*getting dealloc'd*"}));
+}
+
+TEST(Restore, ReportsThatComeTooEarlyOrForNobody) {
+  PluginRig rig({.process = "com.vantor.shiftwell", .rules = {"coordinatorDidInstallPlaceholder=none"}});
+  auto delegate = std::dynamic_pointer_cast<platform::RVAppInstallObserverDelegate>(rig.client());
+  auto early = rig.platform().installCoordination.coordinatorForAppWithBundleID(Kind::RVRestoringAppInstallCoordinator,
+                                                                                "app.a", 3, true);
+  delegate->coordinatorDidInstallPlaceholder(early);
+  EXPECT_EQ(run(rig, RestoreScenario{.apps = {{.id = "app.a"}}}).waited, 5);
+  delegate->coordinatorDidInstallPlaceholder(early);  // too late now
+  delegate = nullptr;
+  rig.unload();
+  EXPECT_TRUE(inOrder(
+      rig.messages(),
+      {"E Ignoring notification from RC about installing placeholder for app.a",
+       "Shiftwell will wait for RC to install placeholder for app.a, _restoringPlaceholderCount 1",
+       "Finished waiting for placeholder installs", "coordinatorDidInstallPlaceholder for app.a with error (null)",
+       "E <AppsClient> getting dealloc'd with {(app.a)}pending placeholder install complete "
+       "notifications"}));
+  EXPECT_FALSE(inOrder(rig.messages(), {"RC finished*"}));
+}
+
+TEST(Restore, ASecondRunUsesWhatTheFirstLeft) {
+  // The first run leaves a demoted app's coordinator without its placeholder, and a plain app to the store.
+  RestoreScenario scenario{.apps = {{.id = "app.a"}, {.id = "app.d", .demotedByHand = true}},
+                           .rules = {"setPlaceholderPromise:app.d@1=fail", "cancelForReason:app.d@1=fail"}};
+  PluginRig rig(optionsOf(scenario));
+  run(rig, scenario);
+  writeRestoreLists(rig, scenario);
+  EXPECT_TRUE(rig.reconcileRestore(2));
+  auto messages = rig.messagesIn("reconcileRestoreOfType", 2);
+  EXPECT_TRUE(inOrder(messages,
+                      {"App asset DRI for app.a is set to 1 - nothing more for tsd to do",
+                       "Coordinator for app.d has a valid user data promise", "added placeholder promise for app.d"}));
+  EXPECT_FALSE(inOrder(messages, {"processing app restore for app.a finished*"}));
+  EXPECT_TRUE(inOrder(rig.traceIn("reconcileRestoreOfType", "app.a", 2), {"step 2/1/1 y *", "step 2/1/2 y *"}));
+}
+
+TEST(Restore, WhatFailsCancelsWhatWasMade) {
+  struct Failing {
+    const char* point;
+    const char* outcome;  // of an app that is not demoted
+    Lines says;
+  };
+  const std::string error = "Injection 1: *";
+  const Lines gaveUp = {"processing app restore for app.a finished with status 0 error *",
+                        "Cancelling coordinator for appBundleIdentifier:app.a"};
+  const char* coordinator = "cancelled [coordinator app.a TSError 29]; waited 0; filed away; ";
+  const char* both =
+      "cancelled [coordinator app.a TSError 29]; cancelled [placeholder app.a TSError 29]; waited 0; filed away; ";
+  const Failing rows[] = {
+      {"InstallCoordination.coordinatorForAppWithBundleID",
+       "waited 0; filed away; ",
+       {"E Error " + error + " creating restore coordinator for app.a", gaveUp[0]}},
+      {"RVAppInstallCoordinator.setUserDataPromise",
+       coordinator,
+       {"E Error " + error + " adding out of band data promise for 'app.a'", gaveUp[0], gaveUp[1]}},
+      {"InstallCoordination.makeAppPlaceholder",
+       coordinator,
+       {"Created placeholder (null) for 'app.a' of type 2",
+        "processing app restore for app.a finished with status 0 error (null)", gaveUp[1]}},
+      {"RVPlaceholder.setIconPromise",
+       "cancelled [coordinator app.a TSError 29]; cancelled [placeholder app.a TSError 29]; cancelled [promise app.a "
+       "TSError 29]; waited 0; filed away; ",
+       {"E Error " + error + " adding icon promise to placeholder for 'app.a'", gaveUp[0]}},
+      {"RVPlaceholder.setPlaceholderAttributes",
+       both,
+       {"E Error " + error + " setting placeholder attributes for 'app.a'", gaveUp[0]}},
+      {"RVPlaceholder.setMetadata", both, {"E Error " + error + " setting store metadata for 'app.a'", gaveUp[0]}},
+      {"RVPlaceholder.setSinfData", both, {"E Error " + error + " setting SINF data for 'app.a'", gaveUp[0]}},
+      {"RVPlaceholder.setConfigurationComplete",
+       both,
+       {"E Error " + error + " setting placeholder configuration as complete for 'app.a'", gaveUp[0]}},
+      {"RVAppInstallCoordinator.setPlaceholderPromise",
+       both,
+       {"E Error " + error + " setting placeholder promise for 'app.a'", gaveUp[0], gaveUp[1],
+        "Cancelling placeholder for appBundleIdentifier:app.a"}},
+      {"RVAppInstallCoordinator.setAppAssetPromiseResponsibleClient",
+       coordinator,
+       {"added placeholder promise for app.a",
+        "E Error " + error + " setting RVClientMercato to satisfy app data promise for 'app.a'", gaveUp[0], gaveUp[1],
+        "Shiftwell cancelled coordinator for restoring app bundle app.a _restoringPlaceholderCount 0"}},
+  };
+  std::vector<Row> table;
+  for (const auto& row : rows) {
+    table.push_back(
+        {.given = {.name = row.point, .apps = {{.id = "app.a"}}, .failures = {{.point = row.point, .app = "app.a"}}},
+         .outcome = row.outcome,
+         .says = row.says});
+  }
+  expectRows(table);
+}
+
+TEST(Restore, ALongListTakesOneWait) {
+  RestoreScenario scenario;
+  for (int i = 0; i < 1000; ++i) scenario.apps.push_back({.id = "app." + std::to_string(i)});
+  PluginRig rig(optionsOf(scenario));
+  EXPECT_EQ(run(rig, scenario).text(), predict(scenario).text());
+  EXPECT_TRUE(inOrder(rig.messages(), {"Will wait for 5000 seconds for 1000 placeholders to install"}));
+}
+
+}  // namespace
+}  // namespace tests
