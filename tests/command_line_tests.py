@@ -279,11 +279,15 @@ class Syncs(Folder):
         self.assertIn(f"host/{apps[0]}/pipe: not pushed: a named pipe", run.stderr)
         self.assertIn(f"host/{apps[0]}/link: not pushed: a symbolic link", run.stderr)
         self.assertIn(f"{apps[1]}: host/Packages/{apps[1]}.pkg: No such file", run.stdout)
-        for content in [b"", b"no list at all", plistlib.dumps({"a": "dictionary"}), plistlib.dumps(["a text", 5])]:
+        table = [(b"", "cannot be read"), (b"no list at all", "cannot be read"),
+                 (plistlib.dumps({"a": "dictionary"}), "not an array"), (plistlib.dumps(["a text", 5]), "")]
+        for content, message in table:
             with self.subTest(content):
                 pathlib.Path("host/ApplicationsSync.plist").write_bytes(content)
                 self.tsd("init", "other")
-                self.assertEqual(self.sync("other", "host")["apps"], [])
+                run = self.tsd("sync", "other", "host", "--json", "--progress", "none")
+                self.assertEqual(json.loads(run.stdout)["apps"], [])
+                self.assertIn(message, run.stderr)
                 shutil.rmtree("other")
 
     def test_restrictions(self):

@@ -43,8 +43,9 @@ std::string bar(int percent, std::size_t columns) {
 
 }  // namespace
 
-Progress::Progress(Console& console, ProgressMode mode)
+Progress::Progress(Console& console, ProgressMode mode, Goal goal)
     : _console(console),
+      _goal(goal),
       _mode(mode != ProgressMode::automatic ? mode
             : Console::isTerminal()         ? ProgressMode::tty
                                             : ProgressMode::plain) {}
@@ -68,8 +69,10 @@ void Progress::placeholderShown(const std::string& id) {
   std::lock_guard lock(_mutex);
   Line* line = find(id);
   if (!line || line->phase >= Phase::placeholder) return;
-  enter(*line, Phase::placeholder, percentPlaceholder);
-  changed(*line, "placeholder on the home screen", false);
+  bool ends = _goal == Goal::placeholder;
+  enter(*line, ends ? Phase::ended : Phase::placeholder, ends ? 100 : percentPlaceholder);
+  line->outcome = "placeholder on the home screen";
+  changed(*line, line->outcome, ends);
 }
 
 void Progress::sending(const std::string& id, double fraction) {
@@ -182,9 +185,14 @@ std::string Progress::drawn(const Line& line, std::size_t columns) const {
 }
 
 std::string Progress::summary() const {
+  std::size_t shown = 0;
   std::size_t ended = 0;
-  for (const auto& line : _lines) ended += line.phase == Phase::ended;
-  return std::to_string(ended) + " of " + std::to_string(_lines.size()) + " apps ended";
+  for (const auto& line : _lines) {
+    shown += line.phase != Phase::waiting;
+    ended += line.phase == Phase::ended;
+  }
+  return std::to_string(_lines.size()) + " apps: " + std::to_string(shown) + " on the home screen, " +
+         std::to_string(ended) + " ended";
 }
 
 }  // namespace tsd

@@ -20,7 +20,10 @@ class Progress {
  public:
   enum class Phase : std::uint8_t { waiting, placeholder, sending, installing, ended };
 
-  Progress(Console& console, ProgressMode mode);
+  /// What an app is to reach: with `placeholder` it has ended when its placeholder is shown.
+  enum class Goal : std::uint8_t { installed, placeholder };
+
+  Progress(Console& console, ProgressMode mode, Goal goal = Goal::installed);
   ~Progress();
   Progress(const Progress&) = delete;
   Progress& operator=(const Progress&) = delete;
@@ -60,6 +63,7 @@ class Progress {
   std::string summary() const;
 
   Console& _console;
+  const Goal _goal;
   const ProgressMode _mode;  // plain, tty or none
   std::mutex _mutex;
   // Guarded by _mutex.

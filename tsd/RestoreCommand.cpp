@@ -114,7 +114,7 @@ class Restore {
 
 ExitCode Restore::run() {
   StopSignal stop;
-  Progress progress(_context.console, _context.options.progress);
+  Progress progress(_context.console, _context.options.progress, Progress::Goal::placeholder);
   AppWatch watch(progress);
   const char* process = _options.inDaemon ? "com.vantor.tsd" : "com.vantor.shiftwell";
   {

@@ -86,7 +86,9 @@ bool SyncRun::begin() {
     _report.message = "the plug-in could not take over the host's files" + (error ? ": " + textOf(error) : "");
     return false;
   }
-  showOutcomes(true);
+  std::string problem;
+  _todo = readTodoList(_parts.session.files(), &problem);
+  if (!problem.empty()) _parts.context.console.message("the host's todo list cannot be read: " + problem);
   _wanted = _todo;
   return true;
 }

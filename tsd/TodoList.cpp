@@ -1,6 +1,7 @@
 #include "tsd/TodoList.h"
 
 #include "plist/PropertyList.h"
+#include "tsd/CommandError.h"
 
 namespace tsd {
 
@@ -8,9 +9,9 @@ using platform::Value;
 
 namespace {
 
-Value readFile(platform::FileSystem& files, std::string_view path) {
-  auto bytes = files.readFile(path);
-  return bytes ? plist::read(std::move(*bytes)) : Value();
+Value readFile(platform::FileSystem& files, std::string_view path, platform::ErrorRef* error = nullptr) {
+  auto bytes = files.readFile(path, error);
+  return bytes ? plist::read(std::move(*bytes), error) : Value();
 }
 
 /// The dictionary under the key, made when there is none.
@@ -21,10 +22,15 @@ platform::Dictionary& level(platform::Dictionary& parent, std::string_view key) 
 
 }  // namespace
 
-std::vector<TodoEntry> readTodoList(platform::FileSystem& files) {
+std::vector<TodoEntry> readTodoList(platform::FileSystem& files, std::string* problem) {
   std::vector<TodoEntry> entries;
-  Value list = readFile(files, todoListPath);
+  platform::ErrorRef error;
+  Value list = readFile(files, todoListPath, &error);
   const auto* items = list.array();
+  if (problem && (items || !files.fileExists(todoListPath)))
+    problem->clear();
+  else if (problem)
+    *problem = list.isAbsent() ? textOf(error) : "it is not an array";
   if (!items) return entries;
   entries.reserve(items->size());
   for (const auto& item : *items) {

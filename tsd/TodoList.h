@@ -20,8 +20,8 @@ constexpr std::string_view todoListPath = "/var/mobile/Library/ApplicationSync/H
 constexpr std::string_view restoreStatePath = "/var/mobile/Library/ApplicationSync/RestoreState.plist";
 
 /// The todo list in the work area. Without one, or when it is not what it should be, nothing; entries that are no
-/// dictionaries are passed over.
-std::vector<TodoEntry> readTodoList(platform::FileSystem& files);
+/// dictionaries are passed over. `problem`, when given, becomes why a list that is there cannot be read, or empty.
+std::vector<TodoEntry> readTodoList(platform::FileSystem& files, std::string* problem = nullptr);
 
 /// Puts the path of an app's package into the restore state, whose other records stay. False with an error when it
 /// cannot be written.
