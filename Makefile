@@ -2,27 +2,31 @@
 # presets of CMakePresets.json, each in build/<preset>.
 
 .DEFAULT_GOAL := help
-.PHONY: help build demo test check asan tsan clang debug sweep simulate format clean packages check-packages
+.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate format clean packages check-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
 SEEDS ?=
 PROCESSORS := $(shell nproc 2>/dev/null || echo 2)
 CTEST := ctest --output-on-failure --no-tests=error --timeout 1800 -j $(PROCESSORS)
 WITH_SEEDS = $(if $(SEEDS),APPSYNC_SEEDS=$(SEEDS))
-PRESET = cmake --preset $(1) >build/$(1).configured && cmake --build --preset $(1)
+# $(call PRESET,name,targets): everything without targets.
+PRESET = mkdir -p build && cmake --preset $(1) >build/$(1).configured && \
+         cmake --build --preset $(1) $(if $(2),--target $(2))
 
 help: ## this list
-	@awk -F ':.*## ' '/^[a-z-]+:.*## / {printf "make %-10s %s\n", $$1, $$2}' Makefile
+	@awk -F ':.*## ' '/^[a-z]+:.*## / {printf "make %-10s %s\n", $$1, $$2}' Makefile
 
 build: packages ## the program and the plug-in, into build/release/bin
-	@mkdir -p build
+	@$(call PRESET,release,tsd ApplicationSync)
+
+build-all: packages
 	@$(call PRESET,release)
 
 demo: build ## a whole life of a device, from the first sync to a restore, in a minute
 	@rm -rf build/demo
 	@examples/demo build/release/bin/tsd build/demo
 
-test: build ## all tests (SEEDS=N: that many random scenarios)
+test: build-all ## all tests (SEEDS=N: that many random scenarios)
 	@cd build/release && $(WITH_SEEDS) $(CTEST)
 
 check: check-packages ## format, clang-tidy, includes, sizes, documents
@@ -31,27 +35,23 @@ check: check-packages ## format, clang-tidy, includes, sizes, documents
 	@.ci/check build/clang
 
 asan: packages ## all tests with the address and undefined-behaviour sanitizers
-	@mkdir -p build
 	@$(call PRESET,asan)
 	@cd build/asan && $(WITH_SEEDS) UBSAN_OPTIONS=print_stacktrace=1 $(CTEST)
 
 tsan: packages ## the threaded tests with the thread sanitizer
-	@mkdir -p build
 	@$(call PRESET,tsan)
 	@.ci/threaded-tests build/tsan
 
 clang: check-packages ## a build with clang, whose thread-safety analysis may find nothing
-	@mkdir -p build
 	@$(call PRESET,clang)
 
 debug: packages ## a build for a debugger
-	@mkdir -p build
 	@$(call PRESET,debug)
 
-sweep: build ## every call of every scenario failed once, all of them
+sweep: build-all ## every call of every scenario failed once, all of them
 	@cd build/release && APPSYNC_SWEEP=all bin/plugin_tests --gtest_filter='*Sweep*' --gtest_brief=1
 
-simulate: build ## random scenarios against the model: make simulate SEEDS=10000
+simulate: build-all ## random scenarios against the model: make simulate SEEDS=10000
 	@cd build/release && $(WITH_SEEDS) bin/plugin_tests --gtest_filter='*Simulation*' --gtest_brief=1
 
 format: check-packages ## puts every source file into the common format
