@@ -204,11 +204,14 @@ bool AppRecords::take(const StoreRecord& record, Loaded& loaded) {
   return true;
 }
 
-bool AppRecords::commit(ChangeSet changes, platform::ErrorRef* error) {
+bool AppRecords::commit(ChangeSet changes, platform::ErrorRef* error) { return keep(&Store::commit, changes, error); }
+bool AppRecords::write(ChangeSet changes, platform::ErrorRef* error) { return keep(&Store::write, changes, error); }
+
+bool AppRecords::keep(Keep keep, const ChangeSet& changes, platform::ErrorRef* error) {
   auto records = _later;
   for (const auto& step : changes._steps) step.encode(_state, records);
   platform::setError(error, nullptr);
-  if (!_store.commit(records, error)) return false;
+  if (!(_store.*keep)(records, error)) return false;
   _later.clear();
   for (const auto& step : changes._steps) {
     if (step.apply) step.apply(_state);

@@ -132,8 +132,11 @@ class AppRecords {
   /// sense.
   std::optional<Loaded> load(platform::ErrorRef* error = nullptr) EXCLUDES(mutex);
 
-  /// All of it or, with an error, nothing of it.
+  /// All of it or, with an error, nothing of it; durable on true.
   bool commit(ChangeSet changes, platform::ErrorRef* error = nullptr) REQUIRES(mutex);
+  /// The same for what a loss of power may take back, though not the death of the process: nothing that was on disk is
+  /// removed because of it.
+  bool write(ChangeSet changes, platform::ErrorRef* error = nullptr) REQUIRES(mutex);
   /// In memory at once, in the store with the next commit: what may be lost with the process.
   void commitLater(ChangeSet changes) REQUIRES(mutex);
   /// Writes what `commitLater` kept back.
@@ -143,6 +146,8 @@ class AppRecords {
 
  private:
   bool take(const StoreRecord& record, Loaded& loaded) REQUIRES(mutex);
+  using Keep = bool (Store::*)(const std::vector<StoreRecord>& changes, platform::ErrorRef* error);
+  bool keep(Keep keep, const ChangeSet& changes, platform::ErrorRef* error) REQUIRES(mutex);
 
   Store& _store;
   DeviceState _state GUARDED_BY(mutex);

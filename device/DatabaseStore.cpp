@@ -79,7 +79,7 @@ class DatabaseStore final : public Store {
     _database.reset(opened);
     if (status != SQLITE_OK) return fail(error);
     sqlite3_extended_result_codes(_database.get(), 1);
-    // One process at a time has a device, so nothing need be shared with another; and every commit is flushed.
+    // One process at a time has a device, so nothing need be shared with another.
     if (!execute("PRAGMA locking_mode=EXCLUSIVE", error) || !checkFormat(error)) return false;
     if (!execute("PRAGMA journal_mode=WAL", error) || !execute("PRAGMA synchronous=FULL", error)) return false;
     return prepare(_put,
@@ -94,7 +94,11 @@ class DatabaseStore final : public Store {
     return _records.all();
   }
 
-  bool commit(const std::vector<StoreRecord>& changes, ErrorRef* error) override {
+  bool commit(const std::vector<StoreRecord>& changes, ErrorRef* error) override { return apply(changes, true, error); }
+  bool write(const std::vector<StoreRecord>& changes, ErrorRef* error) override { return apply(changes, false, error); }
+
+ private:
+  bool apply(const std::vector<StoreRecord>& changes, bool flushes, ErrorRef* error) {
     std::vector<Bytes> values;
     values.reserve(changes.size());
     for (const auto& change : changes) {
@@ -103,10 +107,14 @@ class DatabaseStore final : public Store {
       values.push_back(std::move(*bytes));
     }
     std::lock_guard lock(_mutex);
+    // A flush writes out the whole log, and with it what was written before without one.
+    if (flushes != _flushes && !execute(flushes ? "PRAGMA synchronous=FULL" : "PRAGMA synchronous=NORMAL", error))
+      return false;
+    _flushes = flushes;
     Transaction transaction(_database.get());
     if (!transaction.isOpen()) return fail(error);
     for (std::size_t i = 0; i < changes.size(); ++i) {
-      if (!write(changes[i], values[i])) return fail(error);
+      if (!put(changes[i], values[i])) return fail(error);
     }
     if (!transaction.commit()) return fail(error);
     for (const auto& change : changes) _records.apply(change);
@@ -114,7 +122,6 @@ class DatabaseStore final : public Store {
     return true;
   }
 
- private:
   bool fail(ErrorRef* error, std::string_view text = {}) const {
     if (error) {
       int code = _database ? sqlite3_extended_errcode(_database.get()) : SQLITE_NOMEM;
@@ -177,7 +184,7 @@ class DatabaseStore final : public Store {
     return status == SQLITE_DONE || fail(error);
   }
 
-  bool write(const StoreRecord& change, const Bytes& value) {
+  bool put(const StoreRecord& change, const Bytes& value) {
     sqlite3_stmt* statement = change.value.isAbsent() ? _remove.get() : _put.get();
     bindText(statement, 1, change.kind);
     bindText(statement, 2, change.key);
@@ -194,6 +201,7 @@ class DatabaseStore final : public Store {
   Database _database;
   Statement _put;
   Statement _remove;
+  bool _flushes = true;
   RecordList _records;  // what the file holds
 };
 

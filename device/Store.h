@@ -24,6 +24,11 @@ class Store {
   /// Every record, in the order of first insertion. Nothing lost: an unreadable store is an error when it is opened.
   virtual std::vector<StoreRecord> load() = 0;
   virtual bool commit(const std::vector<StoreRecord>& changes, platform::ErrorRef* error = nullptr) = 0;
+  /// The same for changes that a loss of power may take back: atomic, in order with every other change, and kept when
+  /// the process dies; durable with the next commit. Costs no flush.
+  virtual bool write(const std::vector<StoreRecord>& changes, platform::ErrorRef* error = nullptr) {
+    return commit(changes, error);
+  }
 };
 
 /// One SQLite file, made when it is not there. Null with an error when it is none of ours or cannot be read. One
