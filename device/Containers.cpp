@@ -38,9 +38,10 @@ std::optional<std::string> Containers::makeFresh(platform::ErrorRef* error) {
   return std::nullopt;
 }
 
-bool Containers::writeNew(const std::string& path, platform::BytesView content, platform::ErrorRef* error) {
+bool Containers::writeNew(const std::string& path, platform::BytesView content, bool durable,
+                          platform::ErrorRef* error) {
   auto writer = _files.createNew(path, false, error);
-  return writer && writer->write(content, error) && writer->close(true, error);
+  return writer && writer->write(content, error) && writer->close(durable, error);
 }
 
 bool Containers::writePlaceholder(const std::string& container, const std::string& bundle, platform::Value info,
@@ -54,29 +55,28 @@ bool Containers::writePlaceholder(const std::string& container, const std::strin
     if (attributes && !attributes->isDirectory && attributes->size <= maximumIconBytes)
       icon = _files.readFile(*iconPath);
     if (icon) {
-      if (!writeNew(directory + '/' + std::string(iconName), *icon, error)) return false;
+      if (!writeNew(directory + '/' + std::string(iconName), *icon, false, error)) return false;
       info.dictionary()->set("KBBundleIconFile", iconName);
     }
   }
   auto bytes = plist::writeBinary(info, error);
-  if (!bytes || !writeNew(directory + "/Info.plist", *bytes, error)) return false;
-  if (!metadata.isAbsent() && !writeMetadata(container, metadata, error)) return false;
-  return _files.syncDirectory(directory, error) && sync(container, error);
+  if (!bytes || !writeNew(directory + "/Info.plist", *bytes, false, error)) return false;
+  return metadata.isAbsent() || writeMetadata(container, metadata, false, error);
 }
 
-bool Containers::writeMetadata(const std::string& container, const platform::Value& metadata,
+bool Containers::writeMetadata(const std::string& container, const platform::Value& metadata, bool durable,
                                platform::ErrorRef* error) {
   auto bytes = plist::writeXML(metadata, error);
   // Store metadata comes from the host; what XML cannot carry is kept in the other form.
   if (!bytes) bytes = plist::writeBinary(metadata, error);
-  return bytes && writeNew(container + '/' + std::string(storeMetadataName), *bytes, error);
+  return bytes && writeNew(container + '/' + std::string(storeMetadataName), *bytes, durable, error);
 }
 
 bool Containers::copyMetadata(const std::string& from, const std::string& to, platform::ErrorRef* error) {
   auto name = '/' + std::string(storeMetadataName);
   if (!_files.fileExists(from + name)) return true;
   auto bytes = _files.readFile(from + name, error);
-  return bytes && writeNew(to + name, *bytes, error);
+  return bytes && writeNew(to + name, *bytes, true, error);
 }
 
 bool Containers::sync(const std::string& container, platform::ErrorRef* error) {

@@ -24,13 +24,14 @@ class Containers {
   /// A new, empty directory's path. Nothing on failure.
   std::optional<std::string> makeFresh(platform::ErrorRef* error = nullptr);
 
-  /// Fills a fresh container with a placeholder's bundle; on true it is on disk. `iconPath` is copied as the bundle's
-  /// icon and `info` names it then; an icon that cannot be read is left out. Absent metadata: no metadata file.
+  /// Fills a fresh container with a placeholder's bundle. `iconPath` is copied as the bundle's icon and `info` names it
+  /// then; an icon that cannot be read is left out. Absent metadata: no metadata file. Nothing is flushed: what a loss
+  /// of power takes of a placeholder, the next sync brings again.
   bool writePlaceholder(const std::string& container, const std::string& bundle, platform::Value info,
                         const std::optional<std::string>& iconPath, const platform::Value& metadata,
                         platform::ErrorRef* error = nullptr);
   /// A dictionary, written as XML.
-  bool writeMetadata(const std::string& container, const platform::Value& metadata,
+  bool writeMetadata(const std::string& container, const platform::Value& metadata, bool durable,
                      platform::ErrorRef* error = nullptr);
   /// Takes over another container's metadata file; one that has none counts as done.
   bool copyMetadata(const std::string& from, const std::string& to, platform::ErrorRef* error = nullptr);
@@ -42,7 +43,7 @@ class Containers {
   void removeAllBut(const std::set<std::string>& containers);
 
  private:
-  bool writeNew(const std::string& path, platform::BytesView content, platform::ErrorRef* error);
+  bool writeNew(const std::string& path, platform::BytesView content, bool durable, platform::ErrorRef* error);
 
   FileTree& _files;
 };

@@ -107,7 +107,7 @@ CoordinatorRef InstallEngine::coordinatorForApp(RVCoordinatorKind kind, std::str
   record.creator = client;
   ChangeSet changes;
   changes.put(record);
-  if (!_records.commit(std::move(changes), error)) return nullptr;
+  if (!_records.write(std::move(changes), error)) return nullptr;
   created = true;
   return adopt(std::move(record));
 }
@@ -135,7 +135,7 @@ bool InstallEngine::change(LocalCoordinator& coordinator, const std::function<bo
   if (!edit(changed)) return false;
   ChangeSet changes;
   changes.put(changed);
-  if (!_records.commit(std::move(changes), error)) return false;
+  if (!_records.write(std::move(changes), error)) return false;
   coordinator.state.record = std::move(changed);
   return true;
 }
@@ -251,7 +251,9 @@ bool InstallEngine::putPlaceholder(const CoordinatorRef& coordinator, const Plac
     changes.removeCoordinator(coordinator->app);
   else
     changes.put(record);
-  if (!_records.commit(std::move(changes), error)) return false;
+  bool kept =
+      superfluous.empty() ? _records.write(std::move(changes), error) : _records.commit(std::move(changes), error);
+  if (!kept) return false;
   abandoned = std::move(superfluous);
   coordinator->state.record = std::move(record);
   if (isDemoted) close(*coordinator);

@@ -119,6 +119,8 @@ class InstallEngine {
   void failInstall(const CoordinatorRef& coordinator, const std::string& app, const platform::ErrorRef& reason)
       EXCLUDES(_records.mutex);
   void removePackage(const std::string& path) EXCLUDES(_records.mutex);
+  /// A loss of power may leave a placeholder's record without its files.
+  void removeLostPlaceholders() EXCLUDES(_records.mutex);
 
   AppRecords& _records;
   FileTree& _files;

@@ -7,6 +7,7 @@
 #include "device/Package.h"
 #include "device/ServiceErrors.h"
 #include "device/TemporaryFiles.h"
+#include "plist/PropertyList.h"
 
 // From a package that lies somewhere to an app in the registry, and what an interrupted process leaves of that.
 
@@ -37,7 +38,7 @@ void InstallEngine::beginInstall(const CoordinatorRef& coordinator) {
     changes.put(std::move(installing));
   }
   // Should the store refuse, the install's own commit tells.
-  _records.commit(std::move(changes));
+  _records.write(std::move(changes));
   coordinator->state.fractionUnsaved = false;
   _events.post(Lane::coordination, [this, coordinator] { installAppAsset(coordinator); });
   _registry.installsChanged();
@@ -105,7 +106,7 @@ std::optional<AppRecord> InstallEngine::unpack(const InstallRequest& request, Er
   }
   bool done = true;
   if (!metadata.isAbsent())
-    done = _containers.writeMetadata(app.container, metadata, error);
+    done = _containers.writeMetadata(app.container, metadata, true, error);
   else if (!previous.empty())
     done = _containers.copyMetadata(previous, app.container, error);
   if (!done || !_containers.sync(app.container, error)) return giveUp();
@@ -288,6 +289,30 @@ bool InstallEngine::installFromPackage(std::string_view packagePath, ErrorRef* e
   return install(nullptr, request, error);
 }
 
+void InstallEngine::removeLostPlaceholders() {
+  std::vector<AppRecord> placeholders;
+  {
+    Lock lock(_records.mutex);
+    for (const auto& [id, app] : _records.state().apps) {
+      if (app.isPlaceholder) placeholders.push_back(app);
+    }
+  }
+  for (const auto& app : placeholders) {
+    auto bytes = _files.readFile(app.bundlePath() + "/Info.plist");
+    if (bytes && plist::read(std::move(*bytes)).dictionary()) continue;
+    std::string abandoned;
+    {
+      Lock lock(_records.mutex);
+      auto open = _open.find(app.id);
+      bool isIts = open != _open.end() && open->second->state.record.placeholder;
+      endInstall(isIts ? open->second : nullptr, app.id, Ending::failed,
+                 coordinationError(CoordinationError::installFailed, "the placeholder's files were lost"), 0, abandoned,
+                 nullptr);
+    }
+    if (!abandoned.empty()) _containers.remove(abandoned);
+  }
+}
+
 void InstallEngine::recover(AppRecords::Loaded loaded) {
   std::vector<CoordinatorRef> interrupted;
   std::set<std::string> containers;
@@ -307,6 +332,7 @@ void InstallEngine::recover(AppRecords::Loaded loaded) {
   removeTemporaryFiles(_files);
   for (const auto& path : loaded.leftovers) removePackage(path);
   for (const auto& coordinator : interrupted) installAppAsset(coordinator);
+  removeLostPlaceholders();
   Lock lock(_records.mutex);
   _tells = true;
 }

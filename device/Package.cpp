@@ -194,7 +194,7 @@ class Unpacking {
     for (auto name = _directories.rbegin(); name != _directories.rend(); ++name) {
       if (!_files.syncDirectory(_directory + '/' + *name, &_reason)) return false;
     }
-    return _files.syncDirectory(_directory, &_reason);
+    return true;
   }
 
   struct Seen {
