@@ -12,8 +12,9 @@ std::string identifier(const platform::TSAssetRef& asset) { return asset ? asset
 }  // namespace
 
 bool DeviceServiceBoundary::respondsToPrioritizeAsset() const {
-  return _boundary.call({className, "respondsToPrioritizeAsset"}, nullptr, {},
-                        [&] { return _service && _service->respondsToPrioritizeAsset(); });
+  return _boundary.call({className, "respondsToPrioritizeAsset"}, nullptr, {}, [&] {
+    return _service && _setting("device-service-prioritize") != "no" && _service->respondsToPrioritizeAsset();
+  });
 }
 
 void DeviceServiceBoundary::prioritizeAsset(const platform::TSAssetRef& asset,
@@ -30,8 +31,10 @@ void DeviceServiceBoundary::prioritizeAsset(const platform::TSAssetRef& asset,
 }
 
 bool DeviceServiceBoundary::respondsToCancelAssetTransferForFailedAsset() const {
-  return _boundary.call({className, "respondsToCancelAssetTransferForFailedAsset"}, nullptr, {},
-                        [&] { return _service && _service->respondsToCancelAssetTransferForFailedAsset(); });
+  return _boundary.call({className, "respondsToCancelAssetTransferForFailedAsset"}, nullptr, {}, [&] {
+    return _service && _setting("device-service-cancel") != "no" &&
+           _service->respondsToCancelAssetTransferForFailedAsset();
+  });
 }
 
 void DeviceServiceBoundary::cancelAssetTransferForFailedAsset(const platform::TSAssetRef& asset) {

@@ -1,6 +1,9 @@
 #pragma once
 
 #include <functional>
+#include <string>
+#include <string_view>
+#include <utility>
 
 #include "device/Boundary.h"
 #include "platform/TSDeviceService.h"
@@ -8,12 +11,14 @@
 namespace device {
 
 /// The daemon's device service as the plug-in reaches it: what the device's owner gave, behind the boundary. Without
-/// one, a service that has neither operation.
+/// one, a service that has neither operation; and it lacks those that the device's settings say it lacks.
 class DeviceServiceBoundary final : public platform::TSDeviceService {
  public:
+  using Setting = std::function<std::string(std::string_view key)>;
+
   /// `service` may be null; otherwise it outlives this.
-  DeviceServiceBoundary(platform::TSDeviceService* service, Boundary& boundary)
-      : _service(service), _boundary(boundary) {}
+  DeviceServiceBoundary(Boundary& boundary, Setting setting, platform::TSDeviceService* service)
+      : _boundary(boundary), _setting(std::move(setting)), _service(service) {}
 
   bool respondsToPrioritizeAsset() const override;
   void prioritizeAsset(const platform::TSAssetRef& asset, std::function<void(platform::ErrorRef)> completion) override;
@@ -21,8 +26,9 @@ class DeviceServiceBoundary final : public platform::TSDeviceService {
   void cancelAssetTransferForFailedAsset(const platform::TSAssetRef& asset) override;
 
  private:
-  platform::TSDeviceService* const _service;
   Boundary& _boundary;
+  const Setting _setting;
+  platform::TSDeviceService* const _service;
 };
 
 }  // namespace device

@@ -84,7 +84,8 @@ class WholeDevice final : public LocalDevice {
         _propertyLists(_boundary),
         _systemLog(_boundary, options.log),
         _support(_boundary, _systemLog),
-        _deviceService(options.deviceService, _boundary),
+        _deviceService(
+            _boundary, [this](std::string_view key) { return setting(key); }, options.deviceService),
         _installCoordination(_engine, _coordinatorReports, _boundary, *_events),
         _workspace(_records, _engine, _registryReports, _boundary),
         _installer(_records, _boundary),

@@ -266,6 +266,18 @@ class Syncs(Folder):
         self.assertEqual(sorted(asked), sorted(apps))
         self.assertEqual([call["n"] for call in calls], list(range(1, len(calls) + 1)))
 
+    def test_a_daemon_without_abilities(self):
+        self.make(3)
+        self.tsd("set", "dev", "device-service-prioritize=no", "device-service-cancel=no")
+        last = self.last_of_the_layout()
+        report = self.sync("dev", "host", "--transfers", "1", "--log", "log", "--inject", f"transfer@1=prioritize={last}",
+                           "--inject", f"transfer@2=cancel={last}", code=SOME_FAILED)
+        self.assertEqual(self.outcomes(report)[last], "CANCELLED")
+        log = pathlib.Path("log").read_text()
+        self.assertIn(f"Cannot prioritize {last} as it's not supported", log)
+        self.assertIn(f"Cannot cancel {last} as it's already cancelled 0 OR the call is not supported", log)
+        self.assertIn(f"asset transfer succeeded for {last}", log)
+
     def last_of_the_layout(self):
         pages = plistlib.loads(pathlib.Path("host/PanelloIconState.plist").read_bytes())
         return pages[-1][-1]
