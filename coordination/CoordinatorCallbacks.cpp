@@ -47,8 +47,14 @@ void AppsClient::coordinatorShouldPrioritize(const CoordinatorRef& coordinator) 
   }
   _platform.deviceService.prioritizeAsset(
       assetOf(*bundleIdentifier), [self = shared_from_this(), identifier = *bundleIdentifier](const ErrorRef& error) {
-        say(self->_platform, "Prioritize %{public}@ finished with error %{public}@", identifier, error);
+        self->_prioritizeEnded(identifier, error);
       });
+} catch (...) {
+  swallowException(_platform, "coordinatorShouldPrioritize");
+}
+
+void AppsClient::_prioritizeEnded(std::string_view bundleIdentifier, const ErrorRef& error) try {
+  say(_platform, "Prioritize %{public}@ finished with error %{public}@", bundleIdentifier, error);
 } catch (...) {
   swallowException(_platform, "coordinatorShouldPrioritize");
 }

@@ -11,10 +11,16 @@ void AppsClient::uninstallAppUsingCoordination(std::string_view bundleIdentifier
   _platform.installCoordination.uninstallAppWithBundleID(
       bundleIdentifier, false,
       [self = shared_from_this(), identifier = std::string(bundleIdentifier)](const ErrorRef& error) {
-        say(self->_platform, "Uninstall of %{public}@ with install coordinator succeeded wiht error %{public}@.",
-            identifier, error);
-        endStep(self->_platform.transactionLog, TransactionStep::uninstall, !error, identifier, "Uninstall app");
+        self->_uninstallEnded(identifier, error);
       });
+}
+
+void AppsClient::_uninstallEnded(std::string_view bundleIdentifier, const ErrorRef& error) try {
+  say(_platform, "Uninstall of %{public}@ with install coordinator succeeded wiht error %{public}@.", bundleIdentifier,
+      error);
+  endStep(_platform.transactionLog, TransactionStep::uninstall, !error, bundleIdentifier, "Uninstall app");
+} catch (...) {
+  swallowException(_platform, "uninstallAppUsingCoordination");
 }
 
 }  // namespace appsync

@@ -209,9 +209,15 @@ class AppsClient final : public platform::TSClient,
   void transferCompleteForApp(const TSAssetRef& asset, const ErrorRef& withError, bool isExistingApp);
   void assetSyncFinishedWithStatus(bool status, const StringSet& outstandingItems);
 
+  // The daemon's answer to a request of a callback (coordination/CoordinatorCallbacks.cpp)
+
+  void _prioritizeEnded(std::string_view bundleIdentifier, const ErrorRef& error);
+
   // Removal (coordination/Uninstall.cpp)
 
+  /// Returns before the app is gone; the completion only tells how it went.
   void uninstallAppUsingCoordination(std::string_view bundleIdentifier);
+  void _uninstallEnded(std::string_view bundleIdentifier, const ErrorRef& error);
 
   // ---- Restore from a backup (restore/) ----
 
