@@ -99,6 +99,7 @@ TEST(Restore, EveryAppStepByStep) {
                 .metadata = {{"OBApplicationLaunchProhibited", false}, {"launchProhibited", true}}},
                {.id = "app.both", .demotedAutomatically = true, .demotedByHand = true}}};
   PluginRig rig(optionsOf(scenario));
+  rig.write(restoreLogPath, "an older list");
   auto outcome = run(rig, scenario);
   EXPECT_EQ(outcome.text(),
             "open [app.named restoring]; open [app.plain restoring]; app.auto is placeholder 7; app.both is "
@@ -257,6 +258,15 @@ TEST(Restore, WhatIsLeftAwaitedIsFreedByACancellation) {
   EXPECT_EQ(run(rig, RestoreScenario{}).waited, 0);
   rig.unload();
   EXPECT_FALSE(inOrder(rig.messages(), {"*getting dealloc'd*"}));
+}
+
+TEST(Restore, AnAppIsAwaitedOnceAtATime) {
+  // Its coordinator has ended with its placeholder, but nobody told; the next restore attaches another one.
+  RestoreScenario scenario{.apps = {{.id = "app.a", .demotedByHand = true, .neverReported = true}}};
+  PluginRig rig(optionsOf(scenario));
+  for (int i = 0; i < 2; ++i) EXPECT_EQ(run(rig, scenario).waited, 5);
+  EXPECT_TRUE(inOrder(rig.messagesIn("reconcileRestoreOfType", 2), {"added placeholder promise for app.a"}));
+  EXPECT_FALSE(inOrder(rig.messagesIn("reconcileRestoreOfType", 2), {"Shiftwell will wait*"}));
 }
 
 TEST(Restore, ReportsThatComeTooEarlyOrForNobody) {

@@ -235,6 +235,9 @@ TEST(SyncMessages, WhatFailsInAPreparationIsTold) {
              "Copied icon from * to * with error " + error + " for 'app.a', sizeOnDisk:0"} +
            noIcon,
        {"setIconPromise*"}},
+      {"createDirectory@3=error",
+       {"scenario Harlune App Restore 0 n app.a Failed to create app directory",
+        "Created app directory for 'app.a' at * with err=" + error, "step 5/1/1 y app.a Copying icon"}},
       {"createDirectory@3",
        {"scenario Harlune App Restore 0 n app.a Failed to create app directory",
         "Created app directory for 'app.a' at * with err=" + error, "makeAppPlaceholder(*",
@@ -243,7 +246,8 @@ TEST(SyncMessages, WhatFailsInAPreparationIsTold) {
   };
   for (const auto& row : rows) {
     SCOPED_TRACE(row.point);
-    PluginRig rig({.rules = {std::string(row.point) + "=fail"}});
+    std::string rule = row.point;
+    PluginRig rig({.rules = {rule.find('=') == rule.npos ? rule + "=fail" : rule}});
     request(rig, oneApp);
     Lines lines = rig.traceIn("outstandingAssetTransfers", "app.a");
     EXPECT_TRUE(inOrder(lines, row.says));
@@ -371,6 +375,8 @@ TEST(SyncMessages, TheLayoutReachesTheHomeScreenUnchanged) {
   EXPECT_TRUE(rig.reconcileSync());
   EXPECT_EQ(rig.device().status().home, (Lines{"app.z", "app.y"}));
   EXPECT_TRUE(inOrder(rig.messages(), {"Notifying PN we are starting syncing", "Sending iconlayout to PN"}));
+  rig.outstandingAssetTransfers();
+  EXPECT_EQ(rig.countOf("deallocateMemory"), 1u);
 }
 
 TEST(SyncMessages, TheEndOfASync) {
@@ -454,22 +460,64 @@ TEST(SyncMessages, LifeAndDeath) {
   EXPECT_TRUE(exactly(elsewhere.messages(), {}));
 }
 
-TEST(SyncMessages, CoordinatorsThatAreCancelledTwice) {
+TEST(SyncMessages, CancellationsAreRememberedUntilTheTransferEnds) {
   PluginRig rig;
-  request(rig, oneApp);
+  auto asset = request(rig, oneUpdate)[0];
   auto coordinator = rig.platform().installCoordination.coordinatorForAppWithBundleID(Kind::RVAppInstallCoordinator,
                                                                                       "app.a", 3, false);
   auto delegate = std::dynamic_pointer_cast<platform::RVAppInstallObserverDelegate>(rig.client());
   ASSERT_TRUE(coordinator && delegate);
-  for (int i = 0; i < 2; ++i) delegate->coordinatorCanceledWithReason(coordinator, nullptr, 1);
+  auto cancel = [&] { delegate->coordinatorCanceledWithReason(coordinator, nullptr, 1); };
+  const std::string refuses = "E Cannot cancel app.a as it's already cancelled 1 OR the call is not supported";
+  cancel();
+  cancel();
   rig.phaseEnded(true);  // with nothing outstanding it forgets nothing
-  delegate->coordinatorCanceledWithReason(coordinator, nullptr, 1);
-  EXPECT_TRUE(
-      inOrder(rig.messages(), {"Cancelling asset sync for app.a",
-                               "E Cannot cancel app.a as it's already cancelled 1 OR the call is not supported",
-                               "Notifying PN we are done syncing",
-                               "E Cannot cancel app.a as it's already cancelled 1 OR the call is not supported"}));
+  cancel();
+  EXPECT_TRUE(inOrder(rig.messages(), {"Cancelling asset sync for app.a", refuses, "Notifying PN*", refuses}));
   EXPECT_EQ(rig.countOf("cancelAssetTransferForFailedAsset"), 1u);
+
+  rig.progress(asset, 0.5);
+  rig.phaseEnded(true);  // now it does
+  cancel();
+  EXPECT_EQ(rig.countOf("cancelAssetTransferForFailedAsset"), 2u);
+  rig.progress(asset, 0.5);
+  EXPECT_TRUE(inOrder(rig.traceIn("assetTransferUpdatedProgress", "app.a", 2),
+                      {"coordinatorForAppWithBundleID(RVInitiatingAppInstallCoordinator, app.a, 3, 0) ! *"}));
+
+  // The end of a transfer that the person cancelled is not passed on; the next one's is.
+  rig.transferEnded(asset, false, platform::makeError("Daemon", 1));
+  EXPECT_FALSE(inOrder(rig.traceIn("assetTransferSucceeded", "app.a"), {"step 3/1/1 y *"}));
+  rig.transferEnded(asset, false, platform::makeError("Daemon", 1));
+  EXPECT_TRUE(inOrder(rig.traceIn("assetTransferSucceeded", "app.a", 2), {"step 3/1/1 y *"}));
+}
+
+TEST(SyncMessages, TheRestoreStateIsPruned) {
+  auto record = [](const char* version) { return dictionaryOf({{version, dictionaryOf({{"path", "/p"}})}}); };
+  const Bytes list = binaryList(arrayOf({"app.a"}));
+  const std::pair<Bytes, std::string> rows[] = {
+      {binaryList(dictionaryOf({{"app.a", record("1")}})), "(null)"},
+      {binaryList(dictionaryOf({{"app.a", record("1")}, {"app.b", record("2")}})), "{app.b = {2 = {path = /p}}}"},
+      {binaryList(dictionaryOf({{"app.b", record("2")}})), "{app.b = {2 = {path = /p}}}"},
+      {binaryList(dictionaryOf({})), "(null)"},
+      {"no property list", "(null)"},
+      {list, "(app.a)"},
+  };
+  for (const auto& [content, left] : rows) {
+    PluginRig rig;
+    auto asset = platform::TSAsset::downloadAssetWithIdentifier("app.a", "Application", std::nullopt);
+    rig.write(restoreStatePath, content);
+    rig.installSucceeded(asset);
+    EXPECT_EQ(platform::describe(rig.readList(restoreStatePath)), left);
+    EXPECT_EQ(rig.exists(restoreStatePath), left != "(null)");
+    rig.device().files().removeItem(restoreStatePath);
+    rig.installFailed(asset, nullptr);
+    EXPECT_FALSE(rig.exists(restoreStatePath));
+    asset->setIsRestore(true);
+    rig.installFailed(asset, nullptr);
+    EXPECT_TRUE(inOrder(rig.traceIn("assetInstallFailed", "app.a", 2),
+                        {"app.a install failed but was recoverable: (null)",
+                         "scenario Orrin restore 0 n app.a install failed recoverably"}));
+  }
 }
 
 }  // namespace

@@ -390,7 +390,7 @@ TEST(SyncOutcome, FilesAreWhereTheyBelong) {
   Scenario scenario{.apps = {{.id = "app.a", .inLastSync = true, .hasIcon = true},
                              {.id = "app.b", .path = App::Path::recorded, .isDownload = false}},
                     .layout = {"app.b", "app.a"}};
-  scenario.apps[1].path = App::Path::recorded;
+  scenario.apps[0].path = App::Path::recorded;
   PluginRig rig(optionsOf(scenario));
   rig.write(std::string(icons) + "/leftover.png", "old");
   rig.receivePackage("app.b", "left by an earlier sync");
@@ -408,7 +408,9 @@ TEST(SyncOutcome, FilesAreWhereTheyBelong) {
   EXPECT_EQ((*(*found.array())[0].dictionary())["operation"], Value("install"));
   EXPECT_EQ(rig.readList("/var/mobile/Library/ApplicationSync/AssetSortOrder.plist"), arrayOf({"app.b", "app.a"}));
   // The records of an app whose install has ended are gone, the other's are not.
-  EXPECT_TRUE(rig.readList(restoreStatePath).dictionary()->contains("app.b"));
+  const Value records = rig.readList(restoreStatePath);
+  EXPECT_TRUE(records.dictionary()->contains("app.b"));
+  EXPECT_FALSE(records.dictionary()->contains("app.a"));
   EXPECT_EQ(*rig.read("/var/mobile/tmp/com.vantor.tsd.Apps/app.a.app/Icon.png"),
             *rig.read(std::string(icons) + "/app.a.png"));
   EXPECT_FALSE(rig.exists(std::string(packagesDirectory) + "/app.a.pkg"));

@@ -139,26 +139,33 @@ TEST(Threads, CallbacksFromEightThreadsDuringARestore) {
 TEST(Threads, EditsReconciliationAndClearingExcludeOneAnother) {
   PluginRig rig(threads);
   const auto apps = identifiers(8);
-  stage(rig, apps);
-  ASSERT_TRUE(rig.reconcileSync());
-  std::atomic<bool> mixed{false};
+  const std::vector<std::string> fewer(apps.begin(), apps.begin() + 5);
+  std::atomic<bool> reconciling{true};
+  std::size_t stale = 0;
   onThreads(5, [&](std::size_t thread) {
-    for (int i = 0; i < 30; ++i) {
-      if (thread == 4) {
-        stage(rig, apps);
-        rig.reconcileSync();
-        if (i % 5 == 4) rig.clearSyncData();
-        continue;
+    if (thread != 4) {
+      while (reconciling) {
+        for (std::size_t app = thread; app < apps.size(); app += 4) {
+          rig.installSucceeded(platform::TSAsset::downloadAssetWithIdentifier(apps[app], "Application", std::nullopt));
+        }
       }
-      for (std::size_t app = thread; app < apps.size(); app += 4) {
-        rig.installSucceeded(platform::TSAsset::downloadAssetWithIdentifier(apps[app], "Application", std::nullopt));
-      }
-      // Whatever list is there is a whole one.
-      const Value list = rig.readList(todoListPath);
-      if (rig.exists(todoListPath) && list.array() && list.array()->size() != apps.size()) mixed = true;
+      return;
     }
+    for (int i = 0; i < 1000; ++i) {
+      const auto& staged = i % 2 ? apps : fewer;
+      stage(rig, staged);
+      rig.reconcileSync();
+      // An edit that began on the list before must not land now.
+      for (int look = 0; look < 4; ++look) {
+        const Value list = rig.readList(todoListPath);
+        if (!list.array() || list.array()->size() != staged.size()) ++stale;
+      }
+      if (i % 5 == 4) rig.clearSyncData();
+      if (i % 5 == 4 && rig.exists(todoListPath)) ++stale;
+    }
+    reconciling = false;
   });
-  EXPECT_FALSE(mixed);
+  EXPECT_EQ(stale, 0u);
   stage(rig, apps);
   ASSERT_TRUE(rig.reconcileSync());
   EXPECT_EQ(marks(rig), std::vector<std::string>{"install"});
