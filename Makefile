@@ -36,10 +36,11 @@ check: check-packages ## format, clang-tidy, includes, sizes, documents
 
 asan: packages ## all tests with the address and undefined-behaviour sanitizers
 	@$(call PRESET,asan)
-	@cd build/asan && $(WITH_SEEDS) UBSAN_OPTIONS=print_stacktrace=1 $(CTEST)
+	@cd build/asan && $(WITH_SEEDS) UBSAN_OPTIONS=print_stacktrace=1 \
+	  LSAN_OPTIONS=suppressions=$(CURDIR)/.ci/leaks:print_suppressions=0 $(CTEST)
 
 tsan: packages ## the threaded tests with the thread sanitizer
-	@$(call PRESET,tsan)
+	@$(call PRESET,tsan,tsd ApplicationSync plugin_tests device_service_tests device_foundation_tests)
 	@.ci/threaded-tests build/tsan
 
 clang: check-packages ## a build with clang, whose thread-safety analysis may find nothing
