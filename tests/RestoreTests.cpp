@@ -290,17 +290,23 @@ TEST(Restore, ReportsThatComeTooEarlyOrForNobody) {
 }
 
 TEST(Restore, ASecondRunUsesWhatTheFirstLeft) {
-  // The first run leaves a demoted app's coordinator without its placeholder, and a plain app to the store.
-  RestoreScenario scenario{.apps = {{.id = "app.a"}, {.id = "app.d", .demotedByHand = true}},
-                           .rules = {"setPlaceholderPromise:app.d@1=fail", "cancelForReason:app.d@1=fail"}};
+  // The first run leaves a demoted app without its placeholder, one app to nobody, and one to the store.
+  RestoreScenario scenario{
+      .apps = {{.id = "app.a"}, {.id = "app.d", .demotedByHand = true}, {.id = "app.p"}},
+      .rules = {"setPlaceholderPromise:app.d@1=fail", "RVAppInstallCoordinator.cancelForReason:app.d@1=fail",
+                "setAppAssetPromiseResponsibleClient:app.p@1=fail",
+                "RVAppInstallCoordinator.cancelForReason:app.p@1=fail"}};
   PluginRig rig(optionsOf(scenario));
   run(rig, scenario);
   writeRestoreLists(rig, scenario);
   EXPECT_TRUE(rig.reconcileRestore(2));
   auto messages = rig.messagesIn("reconcileRestoreOfType", 2);
-  EXPECT_TRUE(inOrder(messages,
-                      {"App asset DRI for app.a is set to 1 - nothing more for tsd to do",
-                       "Coordinator for app.d has a valid user data promise", "added placeholder promise for app.d"}));
+  EXPECT_TRUE(inOrder(
+      messages,
+      {"App asset DRI for app.a is set to 1 - nothing more for tsd to do",
+       "Coordinator for app.d has a valid user data promise", "added placeholder promise for app.d",
+       "Coordinator for app.p has a valid user data promise", "Coordinator for app.p has a valid placeholder promise",
+       "set RVClientMercato to satisfy app asset promise for app.p"}));
   EXPECT_FALSE(inOrder(messages, {"processing app restore for app.a finished*"}));
   EXPECT_TRUE(inOrder(rig.traceIn("reconcileRestoreOfType", "app.a", 2), {"step 2/1/1 y *", "step 2/1/2 y *"}));
 }

@@ -331,6 +331,16 @@ TEST(SyncMessages, ACoordinatorInErrorIsLeft) {
   EXPECT_TRUE(inOrder(rig.messages(), {"coordinatorDidInstallPlaceholder for app.a with error Injection 1: *"}));
 }
 
+TEST(SyncMessages, AnUpdateUnderWayIsNoPlaceholder) {
+  PluginRig rig;
+  rig.install("app.a", "1.0");
+  EXPECT_TRUE(rig.device().beginStoreInstall("app.a", {}));
+  EXPECT_TRUE(rig.outstandingAssetTransfers().empty());
+  EXPECT_TRUE(inOrder(rig.messages(), {"[15] prioritized proxies (<OBApplicationProxy app.a>) paused proxies ()",
+                                       "No placeholder for asset identifier app.a",
+                                       "Assets already in progress (not returning these): ()"}));
+}
+
 TEST(SyncMessages, ReconciliationInOrder) {
   PluginRig rig;
   ErrorRef error;
