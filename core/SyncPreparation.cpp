@@ -1,3 +1,5 @@
+#include <unordered_map>
+
 #include "core/AppsClient.h"
 #include "core/Paths.h"
 #include "core/Say.h"
@@ -32,15 +34,20 @@ struct TodoState {
   bool isPending() const { return found && !installed && !failed; }
 };
 
-static TodoState todoStateOf(const Value& todoList, std::string_view identifier) {
-  if (!todoList.array()) return {};
+using TodoStates = std::unordered_map<std::string_view, TodoState>;  // keys borrowed from the todo list
+
+/// What the first entry of each identifier says; the later ones do not count.
+static TodoStates todoStatesOf(const Value& todoList) {
+  TodoStates states;
+  if (!todoList.array()) return states;
   for (const Value& element : *todoList.array()) {
     const Dictionary* entry = element.dictionary();
-    if (!entry || (*entry)["identifier"].string() != identifier) continue;
+    auto identifier = entry ? (*entry)["identifier"].string() : std::nullopt;
+    if (!identifier) continue;
     auto todo = (*entry)["operation"].string();
-    return {true, todo == operation::installed, todo == operation::failed};
+    states.emplace(*identifier, TodoState{true, todo == operation::installed, todo == operation::failed});
   }
-  return {};
+  return states;
 }
 
 /// The apps of the last sync that are not installed any more.
@@ -69,8 +76,10 @@ Value AppsClient::installedAssets() try {
   }
   addMissingApps(_platform, lastSyncList, candidates);
 
+  const TodoStates states = todoStatesOf(todoList);
   for (const auto& candidate : candidates.members()) {
-    TodoState todo = todoStateOf(todoList, candidate);
+    auto known = states.find(candidate);
+    const TodoState todo = known == states.end() ? TodoState() : known->second;
     if (todo.isPending()) {
       say(_platform, "%{public}@ not installed, but is in our todo list. Not marking deleted", candidate);
       continue;
