@@ -139,12 +139,16 @@ std::uint64_t AppsClient::CoordinatedInstall::copyIcon(const std::string& source
   beginStep(_platform.transactionLog, TransactionStep::copyIcon, _bundleIdentifier, "Copying icon");
   std::uint64_t size = 0;
   ErrorRef error;
-  if (_platform.fileSystem.copyItem(source, _iconPath, &error)) {
-    auto attributes = _platform.fileSystem.attributesOfItem(_iconPath, &error);
-    if (attributes && !error) size = attributes->size;
+  const bool copied = _platform.fileSystem.copyItem(source, _iconPath, &error);
+  noted(error);
+  if (copied) {
+    ErrorRef attributesError;
+    auto attributes = _platform.fileSystem.attributesOfItem(_iconPath, &attributesError);
+    noted(attributesError);
+    if (attributes && !attributesError) size = attributes->size;
+    if (attributesError) error = attributesError;  // else what a copy that succeeded reported besides stays told
     say(_platform, "icon for %{public}@ at %{public}@ has a size of %llu", _bundleIdentifier, _iconPath, size);
   }
-  noted(error);
   say(_platform, "Copied icon from %{public}@ to %{public}@ with error %{public}@ for '%{public}@', sizeOnDisk:%llu",
       source, _iconPath, error, _bundleIdentifier, size);
   // The step tells that copying was tried; its outcome is in the message.
