@@ -40,9 +40,8 @@ AppsClient::CoordinatedInstall::CoordinatedInstall(AppsClient& client, const TSA
       _store(readDictionary(_platform, asset.storePlist())),
       _launchProhibited(isLaunchProhibited(_manifest)) {}
 
-const ErrorRef& AppsClient::CoordinatedInstall::noted(const ErrorRef& error) {
+void AppsClient::CoordinatedInstall::note(const ErrorRef& error) {
   if (error) _lastError = error;
-  return error;
 }
 
 bool AppsClient::CoordinatedInstall::run() {
@@ -65,7 +64,7 @@ bool AppsClient::CoordinatedInstall::prepare() {
   ErrorRef error;
   _coordinator = _client._initiatingOrUpdatingAppInstallCoordinatorForBundleIdentifier(_bundleIdentifier, _existingApp,
                                                                                        true, &error);
-  noted(error);
+  note(error);
   if (!_coordinator) return false;
   _coordinator->setObserver(_client.weak_from_this());
   if (!setInstallOptions() || !setInitialZDRAssetPromises() || !addAppAssetPromise()) return false;
@@ -94,7 +93,7 @@ bool AppsClient::CoordinatedInstall::setInstallOptions() {
   }
   ErrorRef error;
   const bool set = _coordinator->setInstallOptions(options, &error);
-  noted(error);
+  note(error);
   if (!set) {
     sayError(_platform, "Error %{public}@ setting install options on coordinator for '%{public}@'", error,
              _bundleIdentifier);
@@ -111,7 +110,7 @@ bool AppsClient::CoordinatedInstall::setInitialZDRAssetPromises() {
   }
   ErrorRef error;
   const bool set = _coordinator->setInitialZDRAssetPromises({}, &error);
-  noted(error);
+  note(error);
   if (!set) {
     sayError(_platform, "Error %{public}@ setting ZDR asset promise for '%{public}@'", error, _bundleIdentifier);
     return false;
@@ -140,11 +139,11 @@ std::uint64_t AppsClient::CoordinatedInstall::copyIcon(const std::string& source
   std::uint64_t size = 0;
   ErrorRef error;
   const bool copied = _platform.fileSystem.copyItem(source, _iconPath, &error);
-  noted(error);
+  note(error);
   if (copied) {
     ErrorRef attributesError;
     auto attributes = _platform.fileSystem.attributesOfItem(_iconPath, &attributesError);
-    noted(attributesError);
+    note(attributesError);
     if (attributes && !attributesError) size = attributes->size;
     if (attributesError) error = attributesError;  // else what a copy that succeeded reported besides stays told
     say(_platform, "icon for %{public}@ at %{public}@ has a size of %llu", _bundleIdentifier, _iconPath, size);
@@ -173,7 +172,7 @@ bool AppsClient::CoordinatedInstall::setAttributes() {
   }
   ErrorRef error;
   const bool set = _placeholder->setPlaceholderAttributes(attributes, &error);
-  noted(error);
+  note(error);
   if (!set) {
     sayError(_platform, "Error %{public}@ setting attributes on placeholder for '%{public}@'", error,
              _bundleIdentifier);
@@ -186,7 +185,7 @@ bool AppsClient::CoordinatedInstall::setAttributes() {
 bool AppsClient::CoordinatedInstall::setMetadata() {
   ErrorRef error;
   const bool set = _placeholder->setMetadata(_storeMetadata, &error);
-  noted(error);
+  note(error);
   if (!set) {
     sayError(_platform, "Error %{public}@ setting store metadata on placeholder for '%{public}@'", error,
              _bundleIdentifier);
@@ -199,7 +198,7 @@ bool AppsClient::CoordinatedInstall::setMetadata() {
 void AppsClient::CoordinatedInstall::closeConfiguration() {
   ErrorRef error;
   const bool closed = _placeholder->setConfigurationComplete(&error);
-  noted(error);
+  note(error);
   if (closed) {
     say(_platform, "set placeholder configuration as complete for %{public}@", _bundleIdentifier);
   } else {
@@ -211,7 +210,7 @@ void AppsClient::CoordinatedInstall::closeConfiguration() {
 bool AppsClient::CoordinatedInstall::attachPlaceholder() {
   ErrorRef error;
   const bool attached = _coordinator->setPlaceholderPromise(_placeholder, &error);
-  noted(error);
+  note(error);
   if (!attached) {
     sayError(_platform, "Error %{public}@ adding placeholder promise to coordinator for '%{public}@'", error,
              _bundleIdentifier);

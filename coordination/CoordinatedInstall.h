@@ -35,7 +35,7 @@ class AppsClient::CoordinatedInstall {
   void cancel();
 
   /// Keeps the error that a call answered, if it did, as the last one of this preparation.
-  const ErrorRef& noted(const ErrorRef& error);
+  void note(const ErrorRef& error);
 
   AppsClient& _client;
   const Platform& _platform;
