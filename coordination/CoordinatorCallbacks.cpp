@@ -21,7 +21,7 @@ void AppsClient::coordinatorDidInstallPlaceholder(const CoordinatorRef& coordina
   const auto bundleIdentifier = coordinator->bundleID();
   say(_platform, "coordinatorDidInstallPlaceholder for %{public}@ with error %{public}@", bundleIdentifier,
       coordinator->error());
-  if (bundleIdentifier) rcDidInstallPlaceHolderForAppBundle(*bundleIdentifier);
+  rcDidInstallPlaceHolderForAppBundle(bundleIdentifier);
 } catch (...) {
   swallowException(_platform, "coordinatorDidInstallPlaceholder");
 }

@@ -243,7 +243,8 @@ class AppsClient final : public platform::TSClient,
 
   void shiftwellSetPlaceHolderPromiseForRestoreAppBundle(std::string_view bundleIdentifier) EXCLUDES(_restoreQueue);
   void shiftwellCancelledCoordinatorForRestoreAppBundle(std::string_view bundleIdentifier) EXCLUDES(_restoreQueue);
-  void rcDidInstallPlaceHolderForAppBundle(std::string_view bundleIdentifier) EXCLUDES(_restoreQueue);
+  /// No identifier: the service does not know the app; such a report is ignored like one of an app nobody awaits.
+  void rcDidInstallPlaceHolderForAppBundle(std::optional<std::string_view> bundleIdentifier) EXCLUDES(_restoreQueue);
   /// Blocks until every awaited placeholder is installed or cancelled, for at most 5 seconds of the clock for each.
   void _waitForPlaceholderInstalls() EXCLUDES(_restoreQueue);
   /// False when the app is not awaited.

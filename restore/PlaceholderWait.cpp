@@ -33,10 +33,10 @@ void AppsClient::shiftwellCancelledCoordinatorForRestoreAppBundle(std::string_vi
       bundleIdentifier, _restoringPlaceholderCount.load());
 }
 
-void AppsClient::rcDidInstallPlaceHolderForAppBundle(std::string_view bundleIdentifier) {
+void AppsClient::rcDidInstallPlaceHolderForAppBundle(std::optional<std::string_view> bundleIdentifier) {
   SerialQueue::Block block(_restoreQueue);
   if (_finishedWaitingForPlaceHolderInstalls) return;
-  if (_stopAwaitingPlaceholder(bundleIdentifier)) {
+  if (bundleIdentifier && _stopAwaitingPlaceholder(*bundleIdentifier)) {
     say(_platform, "RC finished installing placeholder for %{public}@, _restoringPlaceholderCount %lld",
         bundleIdentifier, _restoringPlaceholderCount.load());
   } else {
