@@ -10,10 +10,11 @@ using namespace platform;
 constexpr std::int64_t secondsPerPlaceholder = 5;
 
 bool AppsClient::_stopAwaitingPlaceholder(std::string_view bundleIdentifier) {
-  if (!_placeholdersForRestoringApps.contains(bundleIdentifier)) return false;
+  // Removed first: should that fail for want of memory, the group is not left for an app that is still there to be
+  // left for again.
+  if (!_placeholdersForRestoringApps.erase(bundleIdentifier)) return false;
   _restorePlaceHoldersWaitGroup.leave();
   --_restoringPlaceholderCount;
-  _placeholdersForRestoringApps.erase(bundleIdentifier);
   return true;
 }
 
