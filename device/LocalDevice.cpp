@@ -1,6 +1,7 @@
 #include "device/LocalDevice.h"
 
 #include <filesystem>
+#include <set>
 #include <system_error>
 #include <utility>
 
@@ -129,7 +130,10 @@ class WholeDevice final : public LocalDevice {
     status.coordinators = _engine.openCoordinators();
     status.syncing = _notifications.state(syncNotification);
     Lock lock(_records.mutex);
-    for (const auto& [id, app] : _records.state().apps) status.apps.push_back(*_records.state().status(id));
+    std::set<std::string_view> known;
+    for (const auto& [id, app] : _records.state().apps) known.insert(id);
+    for (const auto& [id, outcome] : _records.state().outcomes) known.insert(id);
+    for (auto id : known) status.apps.push_back(*_records.state().status(id));
     status.home = _records.state().homeOrder();
     return status;
   }
@@ -270,6 +274,8 @@ bool createDevice(const std::string& folder, ErrorRef* error) {
   auto refuse = [&](LocalDeviceError code, const std::string& why) {
     return fail(error, localDeviceError(code, folder + ": " + why));
   };
+  // Its files would come to lie in the system's root.
+  if (folder.empty()) return fail(error, localDeviceError(LocalDeviceError::failed, "a folder without a name"));
   if (fs::exists(folder, failure)) {
     if (!fs::is_directory(folder, failure)) return refuse(LocalDeviceError::notEmpty, "not a folder");
     bool isEmpty = fs::is_empty(folder, failure);

@@ -71,7 +71,7 @@ struct CoordinatorStatus {
 };
 /// The canonical state of a device: the same for two devices that differ only in container names.
 struct DeviceStatus {
-  std::vector<AppStatus> apps;                  // sorted by id
+  std::vector<AppStatus> apps;                  // sorted by id; those that only an outcome is left of, too
   std::vector<CoordinatorStatus> coordinators;  // sorted by app
   std::vector<std::string> home;                // flattened, in order
   std::uint64_t syncing = 0;                    // state of the home screen's sync notification
