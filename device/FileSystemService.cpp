@@ -19,7 +19,11 @@ static bool isQuestion(std::string_view operation) {
 void FileSystemService::tell(const char* operation, std::string_view path, const ErrorRef& error,
                              bool mayBeMissing) const {
   if (!_failed || (mayBeMissing && error && error->domain() == "FileSystem" && error->code() == ENOENT)) return;
-  _failed(operation, path, error ? std::string_view(error->description()) : "no reason given");
+  std::string_view reason = error ? std::string_view(error->description()) : "no reason given";
+  // The path is told already.
+  if (reason.size() > path.size() + 2 && reason.substr(0, path.size()) == path && reason.substr(path.size(), 2) == ": ")
+    reason.remove_prefix(path.size() + 2);
+  _failed(operation, path, reason);
 }
 
 template <class Body>
