@@ -6,7 +6,7 @@ namespace tsd {
 
 ExitCode runInit(const CommandContext& context, const DeviceOnlyOptions& options) {
   platform::ErrorRef error;
-  if (!device::createDevice(options.device, &error)) throw CommandError(options.device + ": " + textOf(error));
+  if (!device::createDevice(options.device, &error)) throw CommandError(textOf(error));
   if (context.options.json) {
     auto document = startDocument(context.options.command);
     document.dictionary()->set("result", "done");

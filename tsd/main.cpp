@@ -1,8 +1,11 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <charconv>
 #include <csignal>
+#include <cstdint>
 #include <exception>
 #include <functional>
+#include <limits>
 #include <map>
 #include <memory>
 #include <new>
@@ -84,8 +87,27 @@ CLI::App* addCommand(CLI::App& program, Invocation& invocation, const char* name
   return command;
 }
 
+/// A whole number in decimal digits. Refused with a usage error: anything else, and what is out of bounds.
+template <class Number>
+void addNumber(CLI::App* command, const char* name, Number& target, const char* description,
+               Number least = std::numeric_limits<Number>::min(), Number most = std::numeric_limits<Number>::max()) {
+  auto take = [name, &target, least, most](const std::string& text) {
+    Number number{};
+    auto [end, problem] = std::from_chars(text.data(), text.data() + text.size(), number);
+    if (problem != std::errc() || end != text.data() + text.size() || number < least || number > most) {
+      throw CommandError(ExitCode::usage, std::string(name) + ": '" + text + "' is not a whole number from " +
+                                              std::to_string(least) + " to " + std::to_string(most));
+    }
+    target = number;
+  };
+  command->add_option_function<std::string>(name, take, wrapped(description))->option_text("N");
+}
+
+/// A folder's name is never empty: what lies in it would be looked for in the system's root.
+std::string checkFolder(const std::string& folder) { return folder.empty() ? "a folder is expected" : ""; }
+
 void addDevice(CLI::App* command, std::string& device) {
-  command->add_option("DEVICE", device, "The device's folder")->required()->option_text(" ");
+  command->add_option("DEVICE", device, "The device's folder")->required()->check(checkFolder)->option_text(" ");
 }
 
 void addApp(CLI::App* command, std::string& app) {
@@ -93,7 +115,7 @@ void addApp(CLI::App* command, std::string& app) {
 }
 
 void addHost(CLI::App* command, std::string& host) {
-  command->add_option("HOST", host, "The host's folder")->required()->option_text(" ");
+  command->add_option("HOST", host, "The host's folder")->required()->check(checkFolder)->option_text(" ");
 }
 
 void addSample(CLI::App& program, Invocation& invocation) {
@@ -101,12 +123,10 @@ void addSample(CLI::App& program, Invocation& invocation) {
   auto* command =
       addCommand(program, invocation, "sample", "Write a host folder to try things with", runSample, options);
   addHost(command, options->host);
-  command->add_option("--apps", options->apps, "Apps in the todo list (8)")
-      ->option_text("N")
-      ->check(CLI::Range(1, 100000).description(""));
-  command->add_option("--package-size", options->packageSize, "Size of each package, about (262144)")
-      ->option_text("BYTES");
-  command->add_option("--seed", options->seed, "The same seed gives the same folder (1)")->option_text("S");
+  addNumber<std::size_t>(command, "--apps", options->apps, "Apps in the todo list (8)", 1, 100000);
+  addNumber<std::uint64_t>(command, "--package-size", options->packageSize, "Bytes of each package, about (262144)", 0,
+                           std::uint64_t{1} << 31);
+  addNumber(command, "--seed", options->seed, "The same seed gives the same folder (1)");
   command->add_flag("--demo", options->demo,
                     wrapped("Make three entries special: a damaged package, a bad identifier and an app to remove. "
                             "Packages/older then holds older versions of the first app and of the one to remove, to "
@@ -145,12 +165,9 @@ void addSync(CLI::App& program, Invocation& invocation) {
       ->check(CLI::IsMember({"success", "failed"}).description(""));
   command->add_flag("--daemon-reports", options->daemonReports,
                     wrapped("Report the installs' outcomes to the plug-in as well"));
-  command->add_option("--repeat", options->repeat, "Syncs in a row, with one plug-in object (1)")
-      ->option_text("N")
-      ->check(CLI::Range(1, 1000000).description(""));
-  command->add_option("--transfers", options->transfers, "Packages in flight (2)")
-      ->option_text("N")
-      ->check(CLI::Range(1, 256).description(""));
+  addNumber<std::size_t>(command, "--repeat", options->repeat, "Syncs in a row, with one plug-in object (1)", 1,
+                         1000000);
+  addNumber<std::size_t>(command, "--transfers", options->transfers, "Packages in flight (2)", 1, 256);
 }
 
 void addRestore(CLI::App& program, Invocation& invocation) {
@@ -159,7 +176,7 @@ void addRestore(CLI::App& program, Invocation& invocation) {
       addCommand(program, invocation, "restore", "Bring back a host's apps as placeholders", runRestore, options);
   addDevice(command, options->device);
   addHost(command, options->host);
-  command->add_option("--type", options->type, "Type of the restore; 2 and 3 bring apps back (2)")->option_text("N");
+  addNumber(command, "--type", options->type, "Type of the restore; 2 and 3 bring apps back (2)");
   command->add_flag("--in-daemon", options->inDaemon,
                     wrapped("Run in the daemon's own process, not the migration component's"));
 }
@@ -207,14 +224,16 @@ void addStore(CLI::App& program, Invocation& invocation) {
       ->option_text("FILE")
       ->needs(finish);
   auto& install = options->install;
-  command->add_option("--type", install.installType, "Install type (1)")->option_text("N");
-  command->add_option("--state", install.installState, "Install state (1)")->option_text("N");
-  command->add_option("--phase", install.installPhase, "Install phase (0)")->option_text("N");
+  addNumber(command, "--type", install.installType, "Install type (1)");
+  addNumber(command, "--state", install.installState, "Install state (1)");
+  addNumber(command, "--phase", install.installPhase, "Install phase (0)");
   command->add_flag("--paused", install.paused, "The install is paused");
-  command->add_flag("!--no-progress", install.hasProgress, "Without install progress");
+  command->add_flag_callback(
+      "--no-progress", [&install] { install.hasProgress = false; }, "Without install progress");
   command->add_option("--app-type", install.applicationType, "Application type (User)")->option_text("T");
   command->add_flag("--system-bundle", install.systemBundle, "Registered as a system bundle");
-  command->add_flag("!--no-coordinator", install.createsCoordinator, "Without a coordinator");
+  command->add_flag_callback(
+      "--no-coordinator", [&install] { install.createsCoordinator = false; }, "Without a coordinator");
 }
 
 void addCommands(CLI::App& program, Invocation& invocation) {
