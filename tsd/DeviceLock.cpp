@@ -20,8 +20,12 @@ void checkIsDevice(const std::string& folder) {
   struct stat facts {};
   if (::stat(folder.c_str(), &facts) != 0) throw CommandError(folder + ": " + std::strerror(errno));
   if (!S_ISDIR(facts.st_mode)) throw CommandError(folder + ": not a folder");
-  if (::lstat((folder + "/device.db").c_str(), &facts) != 0 || !S_ISREG(facts.st_mode) ||
-      ::lstat((folder + "/fs").c_str(), &facts) != 0 || !S_ISDIR(facts.st_mode)) {
+  auto isThere = [&](const char* name, mode_t sort) {
+    if (::lstat((folder + name).c_str(), &facts) == 0) return (facts.st_mode & S_IFMT) == sort;
+    if (errno != ENOENT) throw CommandError(folder + name + ": " + std::strerror(errno));
+    return false;
+  };
+  if (!isThere("/device.db", S_IFREG) || !isThere("/fs", S_IFDIR)) {
     throw CommandError(folder + ": not a device ('tsd init' makes one)");
   }
 }
