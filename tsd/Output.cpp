@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "device/Journal.h"
+#include "tsd/CommandError.h"
 #include "tsd/Console.h"
 
 namespace tsd {
@@ -25,7 +26,11 @@ void writeFailure(const CommonOptions& options, ExitCode code, std::string_view 
   error.dictionary()->set("exitCode", static_cast<int>(code));
   error.dictionary()->set("message", message);
   document.dictionary()->set("error", error);
-  writeDocument(document);
+  try {
+    writeDocument(document);
+  } catch (const CommandError&) {
+    // The failure is told on standard error, and most likely is this very one.
+  }
 }
 
 Value arrayOf(const std::vector<std::string>& texts) {
