@@ -15,15 +15,6 @@ using namespace platform;
 
 constexpr std::uint64_t installTargetType = 1;
 
-static std::optional<std::string> offeredVersion(const TSAsset& asset) {
-  const Dictionary* options = asset.variantOptions().dictionary();
-  return options ? stringOf((*options)["Version"]) : std::nullopt;
-}
-
-static bool isLaunchProhibited(const Value& manifest) {
-  return manifest.dictionary() && (*manifest.dictionary())["OBApplicationLaunchProhibited"].boolValue();
-}
-
 bool AppsClient::prepareAppForInstallUsingCoordination(const TSAssetRef& asset, bool existingApp) {
   return CoordinatedInstall(*this, *asset, existingApp).run();
 }
@@ -34,11 +25,11 @@ AppsClient::CoordinatedInstall::CoordinatedInstall(AppsClient& client, const TSA
       _existingApp(existingApp),
       _bundleIdentifier(asset.identifier()),
       _prettyName(asset.prettyName()),
-      _version(offeredVersion(asset)),
+      _version(stringOf(entryOf(asset.variantOptions(), "Version"))),
       _sourceIcon(asset.icon()),
       _manifest(readDictionary(_platform, asset.infoPlist())),
       _store(readDictionary(_platform, asset.storePlist())),
-      _launchProhibited(isLaunchProhibited(_manifest)) {}
+      _launchProhibited(entryOf(_manifest, "OBApplicationLaunchProhibited").boolValue()) {}
 
 void AppsClient::CoordinatedInstall::note(const ErrorRef& error) {
   if (error) _lastError = error;

@@ -22,6 +22,11 @@ bool writePropertyList(const platform::Platform& platform, const Value& value, p
   return bytes && platform.fileSystem.writeAtomically(path, *bytes);
 }
 
+const Value& entryOf(const Value& value, std::string_view key) {
+  static const Value absent{};
+  return value.dictionary() ? (*value.dictionary())[key] : absent;
+}
+
 std::optional<std::string> stringOf(const Value& value) {
   auto text = value.string();
   return text ? std::optional<std::string>(*text) : std::nullopt;

@@ -19,6 +19,9 @@ platform::Value readDictionary(const platform::Platform& platform, const std::op
 bool writePropertyList(const platform::Platform& platform, const platform::Value& value,
                        platform::PropertyListFormat format, std::string_view path);
 
+/// The entry of a dictionary value; absent when there is none, or the value is of any other kind.
+const platform::Value& entryOf(const platform::Value& value, std::string_view key);
+
 /// An owned copy of a string value; nothing for any other kind.
 std::optional<std::string> stringOf(const platform::Value& value);
 

@@ -43,8 +43,7 @@ static const Value& typed(const Platform& platform, const Value& value, EntryKin
 /// The entry of a dictionary, of the kind or absent; an absent dictionary has no entries.
 static const Value& entryOf(const Platform& platform, const Value& dictionary, std::string_view key, EntryKind kind,
                             std::string_view label) {
-  if (!dictionary.dictionary()) return absentValue;
-  return typed(platform, (*dictionary.dictionary())[key], kind, label);
+  return typed(platform, entryOf(dictionary, key), kind, label);
 }
 
 static const Value& topLevelVantorID(const Platform& platform, const Value& metadata) {
@@ -160,7 +159,7 @@ void AppsClient::prepareForBackup() try {
   forEachApplication(_platform, [&](const OBApplicationProxy& proxy) {
     const auto path = metadataPathOf(proxy);
     Value metadata = readDictionary(_platform, path);
-    if (!metadata.dictionary() || !(*metadata.dictionary())["is-auto-download"].boolValue()) return;
+    if (!entryOf(metadata, "is-auto-download").boolValue()) return;
     metadata.dictionary()->remove("is-auto-download");
     say(_platform, "clearing is-auto-download value for %{public}@", proxy.bundleIdentifier);
     writePropertyList(_platform, metadata, PropertyListFormat::xml, *path);

@@ -35,10 +35,10 @@ static std::vector<std::string> removalsOf(const Platform& platform, const Array
   std::vector<std::string> removals;
   removals.reserve(8);
   for (const Value& element : todoList) {
-    const Dictionary* entry = element.dictionary();
-    if (!entry || !isSafePathComponent((*entry)["identifier"])) continue;
-    if ((*entry)["operation"].string() != operation::remove) continue;
-    removals.emplace_back(*(*entry)["identifier"].string());
+    const Value& identifier = entryOf(element, "identifier");
+    if (!isSafePathComponent(identifier)) continue;
+    if (entryOf(element, "operation").string() != operation::remove) continue;
+    removals.emplace_back(*identifier.string());
     say(platform, "%{public}@ targeted for termination", removals.back());
   }
   return removals;

@@ -2,6 +2,7 @@
 
 #include "core/AppsClient.h"
 #include "core/Paths.h"
+#include "core/PropertyListFile.h"
 #include "core/Say.h"
 #include "platform/Installer.h"
 #include "platform/OBApplicationWorkspace.h"
@@ -41,11 +42,10 @@ static TodoStates todoStatesOf(const Value& todoList) {
   TodoStates states;
   if (!todoList.array()) return states;
   for (const Value& element : *todoList.array()) {
-    const Dictionary* entry = element.dictionary();
-    auto identifier = entry ? (*entry)["identifier"].string() : std::nullopt;
-    if (!identifier) continue;
-    auto todo = (*entry)["operation"].string();
-    states.emplace(*identifier, TodoState{true, todo == operation::installed, todo == operation::failed});
+    auto identifier = entryOf(element, "identifier").string();
+    auto todo = entryOf(element, "operation").string();
+    if (identifier)
+      states.emplace(*identifier, TodoState{true, todo == operation::installed, todo == operation::failed});
   }
   return states;
 }

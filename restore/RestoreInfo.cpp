@@ -3,6 +3,7 @@
 
 #include "core/AppsClient.h"
 #include "core/Paths.h"
+#include "core/PropertyListFile.h"
 #include "core/Say.h"
 #include "platform/FileSystem.h"
 #include "platform/PropertyListSerialization.h"
@@ -33,8 +34,7 @@ class DemotedApps {
 
   static Identifiers identifiersOf(const Value& list, std::string_view key) {
     Identifiers identifiers;
-    const Dictionary* root = list.dictionary();
-    const Array* elements = root ? (*root)[key].array() : nullptr;
+    const Array* elements = entryOf(list, key).array();
     if (!elements) return identifiers;
     for (const Value& element : *elements) {
       if (auto identifier = element.string()) identifiers.insert(*identifier);
@@ -111,13 +111,13 @@ bool AppsClient::_restoreAppsOfList(const Dictionary& list) {
       say(_platform, "no harlune restore info for '%{public}@' - skipping", identifier);
       continue;
     }
-    const auto metadata = (*entry.dictionary())["HarluneMetadata"].data();
+    const auto metadata = entryOf(entry, "HarluneMetadata").data();
     if (!metadata) {
       say(_platform, "no HarluneMetadata for '%{public}@' - ignoring", identifier);
       continue;
     }
-    const RestoreInput input{identifier, *metadata, (*entry.dictionary())["ApplicationSINF"].data(),
-                             (*entry.dictionary())["PlaceholderIcon"].data()};
+    const RestoreInput input{identifier, *metadata, entryOf(entry, "ApplicationSINF").data(),
+                             entryOf(entry, "PlaceholderIcon").data()};
     result = prepareAppForRestoreUsingCoordination(input, status);
   }
   _waitForPlaceholderInstalls();

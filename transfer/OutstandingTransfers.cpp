@@ -156,9 +156,7 @@ bool AppsClient::_isWanted(const Candidate& candidate, bool installationAllowed,
 static std::string displayNameOf(const Platform& platform, const Candidate& candidate) {
   if (candidate.path) {
     const Value info = platform.process.infoDictionaryOfBundleAtPath(*candidate.path);
-    if (info.dictionary()) {
-      if (auto name = stringOf((*info.dictionary())["KBBundleDisplayName"])) return *name;
-    }
+    if (auto name = stringOf(entryOf(info, "KBBundleDisplayName"))) return *name;
   }
   if (candidate.nameFromHarlune) return *candidate.nameFromHarlune;
   return candidate.bundleIdentifier.value_or("");

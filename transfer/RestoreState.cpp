@@ -10,12 +10,6 @@ namespace appsync {
 
 using namespace platform;
 
-/// The entry of a value that may be no dictionary at all.
-static const Value& entryOf(const Value& value, std::string_view key) {
-  static const Value absent{};
-  return value.dictionary() ? (*value.dictionary())[key] : absent;
-}
-
 Value AppsClient::_restoreStatePropertyForKey(std::string_view key, std::string_view identifier,
                                               const std::optional<std::string>& version) {
   const Value root = readDictionary(_platform, std::string(restoreStatePath));

@@ -48,16 +48,12 @@ void AppsClient::assetTransferSucceeded(const TSAssetRef& asset, bool succeeded,
   swallowException(_platform, "assetTransferSucceeded");
 }
 
-static std::optional<std::string> versionOf(const TSAsset& asset) {
-  const Dictionary* options = asset.variantOptions().dictionary();
-  return options ? stringOf((*options)["Version"]) : std::nullopt;
-}
-
 void AppsClient::_transferArrived(const TSAssetRef& asset, bool existingApp) {
   const std::string& identifier = asset->identifier();
   say(_platform, "asset transfer succeeded for %{public}@", identifier);
   if (!asset->path()) {
-    asset->setPath(stringOf(_restoreStatePropertyForKey("path", identifier, versionOf(*asset))));
+    const auto version = stringOf(entryOf(asset->variantOptions(), "Version"));
+    asset->setPath(stringOf(_restoreStatePropertyForKey("path", identifier, version)));
   } else if (!asset->path()->starts_with('/')) {
     asset->setPath(joinedPath(publicStagingDirectory, *asset->path()));
   }
