@@ -35,24 +35,37 @@ std::vector<std::string> namesIn(DIR* directory, const std::string& path) {
   return names;
 }
 
+/// Whether the host has a todo list. Throws when it is none that can be read.
+bool hasTodoList(int directory, const std::string& hostFolder) {
+  std::string path = hostFolder + "/" + std::string(todoListName);
+  struct stat facts {};
+  if (::fstatat(directory, std::string(todoListName).c_str(), &facts, AT_SYMLINK_NOFOLLOW) != 0) {
+    if (errno == ENOENT) return false;
+    throw CommandError(path + ": " + std::strerror(errno));
+  }
+  if (!S_ISREG(facts.st_mode)) throw CommandError(path + ": " + sortOfFile(facts.st_mode) + ", no file");
+  platform::ErrorRef error;
+  if (!HostFile::openAt(directory, std::string(todoListName), &error)) throw CommandError(path + ": " + textOf(error));
+  return true;
+}
+
 }  // namespace
+
+void requireHostFolder(const std::string& folder) {
+  Directory directory(::opendir(folder.c_str()));
+  if (!directory) throw CommandError(folder + ": " + (errno == ENOTDIR ? "not a folder" : std::strerror(errno)));
+}
 
 bool FileConduit::pushStaging(const std::string& hostFolder) {
   Directory directory(::opendir(hostFolder.c_str()));
   if (!directory) throw CommandError(hostFolder + ": " + std::strerror(errno));
+  bool hasList = hasTodoList(::dirfd(directory.get()), hostFolder);
   // What an interrupted session left there is not this session's.
   if (_files.fileExists(stagingDirectory)) {
     platform::ErrorRef error;
     if (!_files.removeItem(stagingDirectory, &error)) throw CommandError("the staging directory: " + textOf(error));
   }
-  struct stat facts {};
-  if (::fstatat(::dirfd(directory.get()), std::string(todoListName).c_str(), &facts, AT_SYMLINK_NOFOLLOW) != 0) {
-    if (errno == ENOENT) return false;
-    throw CommandError(hostFolder + "/" + std::string(todoListName) + ": " + std::strerror(errno));
-  }
-  if (!S_ISREG(facts.st_mode)) {
-    throw CommandError(hostFolder + "/" + std::string(todoListName) + ": " + sortOfFile(facts.st_mode) + ", no file");
-  }
+  if (!hasList) return false;
   _pushedFiles = 0;
   _pushedBytes = 0;
   try {

@@ -15,6 +15,9 @@ constexpr std::string_view stagingDirectory = "/var/mobile/Media/PublicStaging/A
 constexpr std::string_view packagesDirectory = "/var/mobile/Media/PublicStaging/Packages";
 constexpr std::string_view todoListName = "ApplicationsSync.plist";
 
+/// Throws a `CommandError` when a host's folder is not there, is none, or cannot be read.
+void requireHostFolder(const std::string& folder);
+
 /// The way of the host's files onto the device. Takes regular files only, and no more of them than the device has room
 /// for in its books; whatever it refuses it names on the console.
 class FileConduit {
@@ -26,8 +29,9 @@ class FileConduit {
   FileConduit(device::FileTree& files, Console& console) : _files(files), _console(console) {}
 
   /// Replaces the staging directory by the host's folder, without its packages and its restore lists. A folder without
-  /// a todo list leaves no staging directory and answers false. Throws a `CommandError` when the folder cannot be read,
-  /// or does not fit, or the device takes no more; then there is no staging directory either.
+  /// a todo list leaves no staging directory and answers false. Throws a `CommandError` when the folder or the todo
+  /// list cannot be read, or it does not fit, or the device takes no more; then nothing of it is in the staging
+  /// directory.
   bool pushStaging(const std::string& hostFolder);
 
   /// One file to a path of the device, in the place of an older one, durably; directories on the way are made. Throws a

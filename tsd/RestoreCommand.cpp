@@ -53,10 +53,17 @@ RestoredApp readEntry(std::string_view id, const Value& entry) {
   return app;
 }
 
+/// False for what is not there; throws when that cannot be told.
+bool isThere(const std::string& path) {
+  std::error_code problem;
+  auto facts = std::filesystem::symlink_status(path, problem);
+  if (facts.type() == std::filesystem::file_type::none) throw CommandError(path + ": " + problem.message());
+  return std::filesystem::exists(facts);
+}
+
 RestoreList readRestoreList(const std::string& path) {
   RestoreList list;
-  std::error_code problem;
-  list.exists = std::filesystem::exists(std::filesystem::symlink_status(path, problem));
+  list.exists = isThere(path);
   if (!list.exists) return list;
   platform::ErrorRef error;
   auto file = HostFile::open("", path, &error);
@@ -121,6 +128,7 @@ ExitCode Restore::run() {
     DeviceSession session(_context, {_options.device, process, nullptr, watch.listener()});
     FileConduit conduit(session.files(), _context.console);
     pushLists(conduit);
+    if (!restoresApps()) _list.apps.clear();
     for (const auto& app : _list.apps) progress.add(app.id, app.name);
     StopSignal::Subscription told(stop, [this] {
       _context.console.message("stopping once the plug-in has finished; a second signal ends at once");
@@ -147,10 +155,7 @@ void Restore::pushLists(FileConduit& conduit) {
   std::string folder = _options.host + "/Restore";
   if (_list.exists) conduit.pushFile(folder + "/RestoreApplications.plist", listPath);
   std::string demoted = folder + "/com.vantor.Cellarum.DemotedApps.plist";
-  std::error_code problem;
-  if (std::filesystem::exists(std::filesystem::symlink_status(demoted, problem))) {
-    conduit.pushFile(demoted, demotedPath);
-  }
+  if (isThere(demoted)) conduit.pushFile(demoted, demotedPath);
 }
 
 void Restore::reconcile(DeviceSession& session, Progress& progress) {
@@ -255,10 +260,7 @@ std::string Restore::text(ExitCode code) const {
 }  // namespace
 
 ExitCode runRestore(const CommandContext& context, const RestoreOptions& options) {
-  std::error_code problem;
-  if (!std::filesystem::is_directory(options.host, problem)) {
-    throw CommandError(options.host + ": " + (problem ? problem.message() : "not a folder"));
-  }
+  requireHostFolder(options.host);
   return Restore(context, options).run();
 }
 

@@ -1,8 +1,8 @@
 #include <cstdlib>
-#include <filesystem>
 
 #include "tsd/CommandError.h"
 #include "tsd/Commands.h"
+#include "tsd/FileConduit.h"
 #include "tsd/Output.h"
 #include "tsd/SyncRun.h"
 
@@ -36,11 +36,9 @@ void show(const CommandContext& context, const std::vector<SyncReport>& reports)
 }  // namespace
 
 ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
-  std::error_code problem;
-  if (!std::filesystem::is_directory(options.host, problem)) {
-    throw CommandError(options.host + ": " + (problem ? problem.message() : "not a folder"));
-  }
+  requireHostFolder(options.host);
   StopSignal stop;
+  StopSignal::Subscription told(stop, [&] { context.console.message("stopping; a second signal ends at once"); });
   Progress progress(context.console, context.options.progress);
   AppWatch watch(progress);
   TransferQueue queue({options.host + "/Packages", options.reports, options.transfers}, progress, stop);
