@@ -17,6 +17,9 @@ DeviceSession::DeviceSession(const CommandContext& context, const Setup& setup)
 DeviceSession::~DeviceSession() {
   unloadPlugin();
   _device->events().stop();
+  if (_log && _log->failed()) _context.console.message(_context.options.log + ": not every line could be written");
+  if (_calls && _calls->failed())
+    _context.console.message(_context.options.calls + ": not every line could be written");
 }
 
 void DeviceSession::unloadPlugin() {

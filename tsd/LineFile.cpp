@@ -18,8 +18,8 @@ void LineFile::write(std::string line) {
   std::replace(line.begin(), line.end(), '\n', ' ');
   std::replace(line.begin(), line.end(), '\r', ' ');
   line += '\n';
-  std::fwrite(line.data(), 1, line.size(), _file.get());
-  std::fflush(_file.get());
+  bool written = std::fwrite(line.data(), 1, line.size(), _file.get()) == line.size();
+  _failed |= std::fflush(_file.get()) != 0 || !written;
 }
 
 std::string currentTimeText() {
