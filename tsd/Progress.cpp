@@ -82,11 +82,11 @@ void Progress::sending(const std::string& id, double fraction) {
   double bounded = std::isfinite(fraction) ? std::clamp(fraction, 0.0, 1.0) : 0.0;
   int percent = percentPlaceholder + static_cast<int>(bounded * (percentSent - percentPlaceholder));
   enter(*line, Phase::sending, percent);
-  int sent = static_cast<int>(bounded * 100);
-  if (_mode == ProgressMode::plain && sent < line->shownPercent + plainStep && sent < 100) return;
-  if (_mode == ProgressMode::plain && line->shownPercent == 100) return;
-  line->shownPercent = _mode == ProgressMode::plain ? (sent == 100 ? 100 : sent / plainStep * plainStep) : 0;
-  changed(*line, "sent " + std::to_string(line->shownPercent) + " %", false);
+  int step = static_cast<int>(bounded * 100) / plainStep * plainStep;
+  if (_mode == ProgressMode::plain && step <= line->shownStep) return;
+  line->shownStep = step;
+  // A whole package is no whole app yet.
+  changed(*line, step == 100 ? "sent" : "sent " + std::to_string(step) + " %", false);
 }
 
 void Progress::installing(const std::string& id) {
@@ -145,7 +145,11 @@ void Progress::enter(Line& line, Phase phase, int percent) {
 }
 
 void Progress::changed(const Line& line, const std::string& what, bool urgent) {
-  if (_mode == ProgressMode::plain) _console.line(fitted(line.name, 24) + "  " + what);
+  if (_mode == ProgressMode::plain) {
+    // Names may stand out of their column, as nobody could tell apart what was cut.
+    constexpr std::size_t nameColumns = 24;
+    _console.line(fitted(line.name, std::max(nameColumns, columnsOf(printable(line.name)))) + "  " + what);
+  }
   if (_mode != ProgressMode::tty) return;
   auto now = std::chrono::steady_clock::now();
   if (urgent || now - _lastDrawn >= redrawInterval) draw();

@@ -49,7 +49,7 @@ class Progress {
     std::string name;
     Phase phase = Phase::waiting;
     int percent = 0;
-    int shownPercent = 0;  // in plain mode, the last that was printed
+    int shownStep = 0;  // percent of the package, the last that was printed in plain mode
     std::string outcome;
     std::string reason;
   };
