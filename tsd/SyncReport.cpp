@@ -54,7 +54,7 @@ Value appsValue(const std::vector<AppOutcome>& apps) {
     item.set("name", app.name);
     item.set("version", app.version);
     item.set("outcome", app.outcome);
-    if (!app.reason.empty()) item.set("reason", app.reason);
+    item.set("reason", app.reason);
   }
   return array;
 }
@@ -99,7 +99,6 @@ std::string SyncReport::text() const {
   }
   text += listLine("Deleted on the device, told to the host", deleted);
   text += listLine("Removed from the device", removed);
-  text += listLine("Not removed", notRemoved);
   if (text.empty() && code == ExitCode::done) text = "Nothing to do.\n";
   if (placeholderSeconds) {
     text += "The last placeholder was on the home screen after " + secondsText(*placeholderSeconds) + ".\n";

@@ -28,11 +28,10 @@ struct AppOutcome {
 /// What came of one sync.
 struct SyncReport {
   ExitCode code = ExitCode::done;
-  std::string message;                  // of a sync that failed as a whole, or of a deadline that passed
-  std::vector<std::string> deleted;     // reported to the host
-  std::vector<std::string> removed;     // at the host's wish
-  std::vector<std::string> notRemoved;  // asked for, and still there
-  std::vector<std::string> requested;   // in the order asked for
+  std::string message;                 // of a sync that failed as a whole, or of a deadline that passed
+  std::vector<std::string> deleted;    // reported to the host
+  std::vector<std::string> removed;    // at the host's wish
+  std::vector<std::string> requested;  // in the order asked for
   std::vector<AppOutcome> apps;
   std::vector<TodoEntry> todo;
   std::optional<double> placeholderSeconds;  // until the last placeholder was on the home screen

@@ -38,8 +38,6 @@ std::vector<std::string> deletedIn(const Value& installed) {
   return ids;
 }
 
-bool isSafeIdentifier(const std::string& id) { return isFileName(id) && id.find("..") == std::string::npos; }
-
 }  // namespace
 
 SyncReport SyncRun::run() {
@@ -111,8 +109,7 @@ void SyncRun::requestPackages() {
   showOutcomes(true);
   for (const auto& entry : _wanted) {
     if (entry.operation != "install" || _requested.count(entry.identifier)) continue;
-    _parts.progress.ended(entry.identifier, isSafeIdentifier(entry.identifier) ? "not asked for" : "refused", "",
-                          false);
+    _parts.progress.ended(entry.identifier, isFileName(entry.identifier) ? "not asked for" : "refused", "", false);
   }
 }
 
@@ -132,7 +129,7 @@ void SyncRun::recordPackagePaths() {
 }
 
 void SyncRun::transferPackages() {
-  if (_assets.empty()) return;
+  if (_assets.empty() || _parts.stop.requested()) return;
   _parts.progress.headline("Sending " + std::to_string(_assets.size()) +
                            (_assets.size() == 1 ? " package" : " packages"));
   auto& clock = _parts.session.device().events().clock();
@@ -235,7 +232,10 @@ void SyncRun::fillReport() {
   for (const auto& entry : _wanted) {
     if (entry.operation == "install") tell(entry.identifier, entry.name, entry.version);
     if (entry.operation != "remove" || !_before.count(entry.identifier)) continue;
-    (after.count(entry.identifier) ? _report.notRemoved : _report.removed).push_back(entry.identifier);
+    if (!after.count(entry.identifier))
+      _report.removed.push_back(entry.identifier);
+    else if (told.insert(entry.identifier).second)
+      _report.apps.push_back(outcomeOfKept(entry));
   }
   auto ended = std::chrono::steady_clock::now();
   _report.seconds = secondsSince(_began, ended);
@@ -266,7 +266,7 @@ AppOutcome SyncRun::outcomeOf(const std::string& id, const std::string& mark) co
     std::string reason = app ? reasonForPeople(app->lastReason) : "";
     be("FAILED", !requested ? "its install could not be prepared" : !reason.empty() ? reason : "the install failed");
   } else if (!requested) {
-    if (isSafeIdentifier(id))
+    if (isFileName(id))
       be("SKIPPED", reasonForSkipping(id));
     else
       be("REFUSED", "this cannot be an app's identifier");
@@ -288,6 +288,13 @@ AppOutcome SyncRun::outcomeOf(const std::string& id, const std::string& mark) co
     be("PENDING", "its package arrived, and nothing was reported of its install");
   }
   return outcome;
+}
+
+/// Of an app that the host wants removed, and that is still there.
+AppOutcome SyncRun::outcomeOfKept(const TodoEntry& entry) const {
+  bool restricted = _parts.session.device().setting("app-removal") == "forbidden";
+  return {entry.identifier, entry.name, entry.version, restricted ? "SKIPPED" : "FAILED",
+          restricted ? "removing apps is restricted" : "it could not be removed"};
 }
 
 std::string SyncRun::reasonForSkipping(const std::string& id) const {

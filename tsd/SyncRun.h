@@ -53,6 +53,7 @@ class SyncRun {
   /// Reads the todo list again when anything changed since, and tells the display of outcomes that are new.
   void showOutcomes(bool always);
   AppOutcome outcomeOf(const std::string& id, const std::string& mark) const;
+  AppOutcome outcomeOfKept(const TodoEntry& entry) const;
   std::string reasonForSkipping(const std::string& id) const;
   std::set<std::string> appsOnDevice() const;
 
