@@ -1,4 +1,4 @@
-#include "device/Journal.h"
+#include "device/LocalAccountInfo.h"
 #include "platform/Describe.h"
 #include "tsd/Commands.h"
 #include "tsd/Daemon.h"
@@ -19,7 +19,14 @@ Value answerTo(const std::string& question, Daemon& daemon) {
     return types ? arrayOf(types->members()) : Value();
   }
   Value accounts = Value::makeArray();
-  for (const auto& account : daemon.accountsForAssets()) accounts.array()->append(account->describe());
+  for (const auto& account : daemon.accountsForAssets()) {
+    const auto* facts = dynamic_cast<const device::LocalAccountInfo*>(account.get());
+    auto& item = accounts.array()->appendDictionary();
+    if (!facts) continue;
+    if (facts->vantorID()) item.set("vantorID", *facts->vantorID());
+    if (!facts->dsid().isAbsent()) item.set("DSID", facts->dsid());
+    if (facts->altDSID()) item.set("altDSID", *facts->altDSID());
+  }
   return accounts;
 }
 
