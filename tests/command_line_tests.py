@@ -58,6 +58,9 @@ COMMAND_LINES = [
     Row("set dev app-removal=sometimes", USAGE, err=says("sometimes")),
     Row("set dev app-removal=forbidden colour=red", USAGE, err=says("colour")),
     Row("store dev com.example.a --package host/ApplicationsSync.plist", USAGE, err=says("--finish")),
+    Row("store dev com.example.a --type 99999999999999999999", USAGE, err=says("99999999999999999999")),
+    Row("sample new --package-size -5", USAGE, err=says("-5")),
+    Row("init ''", USAGE, err=says("DEVICE")),
     Row("sample new --demo --apps 4", USAGE, err=says("--demo")),
     # Things that are not what they should be; the device stays as it is.
     Row("init dev", FAILED, err=says("dev")),
@@ -95,6 +98,7 @@ DOCUMENTS = [
     Row("sync dev nowhere --json", FAILED, r'"exitCode": 1', r"nowhere"),
     Row("sync dev emptyhost --json --progress none", DONE, r'"result": "done"'),
     Row("restore dev emptyhost --json --progress none", DONE, r'"missing": \[\]'),
+    Row("restore dev host --type 1 --json --progress none", DONE, r'"missing": \[\]'),
     Row("set dev icon-size=120 --json", DONE, r'"icon-size": "120"'),
     Row("query dev vantor-ids --json", DONE, r'"answer": \[\]'),
     Row("status dev --json", DONE, r'"coordinators": \[\]'),
@@ -150,7 +154,7 @@ class CommandLines(Folder):
 
     def check(self, row):
         with self.subTest(row.line):
-            line = row.line.replace("C-LIBRARY", c_library()).split()
+            line = ["" if word == "''" else word for word in row.line.replace("C-LIBRARY", c_library()).split()]
             before = tree_of(".") if row.code != DONE else None
             run = self.tsd(*line, code=row.code)
             self.assertRegex(run.stdout, re.compile(row.out or r"\A\Z", re.MULTILINE))
@@ -308,6 +312,23 @@ class Syncs(Folder):
         report = self.sync("dev", "host")
         self.assertEqual(report["requested"], [])
         self.assertEqual(self.outcomes(report), dict.fromkeys(apps, "SKIPPED"))
+        self.tsd("set", "dev", "app-installation=allowed", "app-removal=forbidden")
+        self.sync("dev", "host")
+        todo = [{"identifier": apps[0], "operation": "remove"}]
+        pathlib.Path("host/ApplicationsSync.plist").write_bytes(plistlib.dumps(todo))
+        self.assertEqual(self.outcomes(self.sync("dev", "host")), {apps[0]: "SKIPPED"})
+        self.tsd("set", "dev", "app-removal=allowed")
+        report = self.sync("dev", "host", "--inject", "uninstallAppWithBundleID=fail", code=SOME_FAILED)
+        self.assertEqual(self.outcomes(report), {apps[0]: "FAILED"})
+        self.assertEqual(self.sync("dev", "host")["removed"], [apps[0]])
+
+    def test_what_people_are_told_of_a_failure(self):
+        apps = self.make(2)
+        pathlib.Path(f"host/Packages/{apps[0]}.pkg").write_bytes(b"no archive")
+        run = self.tsd("sync", "dev", "host", "--progress", "plain", code=SOME_FAILED)
+        self.assertRegex(run.stderr, r"(?m) failed: package .*not a zip archive")
+        self.assertNotIn("100 %", run.stderr)  # a package that was sent is no app yet
+        self.assertRegex(self.tsd("status", "dev").stdout, rf"(?m)^{apps[0]} .* failed$")
 
     def test_a_removed_app_is_told_to_the_host_once(self):
         apps = self.make(2)
