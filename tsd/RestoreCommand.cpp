@@ -153,9 +153,10 @@ ExitCode Restore::run() {
 
 void Restore::pushLists(FileConduit& conduit) {
   std::string folder = _options.host + "/Restore";
-  if (_list.exists) conduit.pushFile(folder + "/RestoreApplications.plist", listPath);
+  // The one that has not been read yet goes first, as the device stays as it is when it cannot be.
   std::string demoted = folder + "/com.vantor.Cellarum.DemotedApps.plist";
   if (isThere(demoted)) conduit.pushFile(demoted, demotedPath);
+  if (_list.exists) conduit.pushFile(folder + "/RestoreApplications.plist", listPath);
 }
 
 void Restore::reconcile(DeviceSession& session, Progress& progress) {
