@@ -17,6 +17,7 @@
 #include "platform/NotificationCenter.h"
 #include "platform/OBApplicationWorkspace.h"
 #include "platform/Process.h"
+#include "tests/SampleContent.h"
 
 namespace tests {
 
@@ -34,12 +35,6 @@ constexpr char notes[] = "com.example.notes";
 
 enum class Medium { disk, memory };
 std::string nameOfMedium(const testing::TestParamInfo<Medium>& info);
-
-Value dictionaryOf(std::initializer_list<std::pair<std::string_view, Value>> entries);
-/// An archive of "Maps.app" with a manifest of that identifier and version, and one more file.
-Bytes packageOf(const std::string& identifier, const std::string& version);
-/// A PNG of one colour.
-Bytes pngOf(int width, int height);
 
 /// Writes down what it is told, one line a callback.
 struct RecordingDelegate final : platform::RVAppInstallObserverDelegate {

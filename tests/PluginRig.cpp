@@ -1,8 +1,5 @@
 #include "tests/PluginRig.h"
 
-#include <archive.h>
-#include <archive_entry.h>
-#include <cairo.h>
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -30,12 +27,6 @@ bool matches(std::string_view pattern, std::string_view text) {
   return false;
 }
 
-Value dictionaryOf(std::initializer_list<std::pair<std::string_view, Value>> entries) {
-  Value value = Value::makeDictionary();
-  for (const auto& [key, entry] : entries) value.dictionary()->set(key, entry);
-  return value;
-}
-
 Value arrayOf(const std::vector<std::string>& elements) {
   Value value = Value::makeArray();
   for (const auto& element : elements) value.array()->append(element);
@@ -44,45 +35,8 @@ Value arrayOf(const std::vector<std::string>& elements) {
 
 Bytes binaryList(const Value& value) { return plist::writeBinary(value).value(); }
 
-Bytes packageOf(const std::string& identifier, const std::string& version, std::size_t contentSize) {
-  Bytes manifest = binaryList(dictionaryOf({{"KBBundleIdentifier", identifier},
-                                            {"KBBundleVersion", version},
-                                            {"KBBundleDisplayName", "Packaged " + identifier}}));
-  Bytes bytes(contentSize + 8192, '\0');
-  std::size_t used = 0;
-  std::unique_ptr<archive, int (*)(archive*)> zip(archive_write_new(), archive_write_free);
-  archive_write_set_format_zip(zip.get());
-  archive_write_set_options(zip.get(), "zip:compression=store");
-  archive_write_open_memory(zip.get(), bytes.data(), bytes.size(), &used);
-  auto add = [&](const std::string& name, const Bytes& content) {
-    std::unique_ptr<archive_entry, void (*)(archive_entry*)> entry(archive_entry_new(), archive_entry_free);
-    archive_entry_set_pathname(entry.get(), name.c_str());
-    archive_entry_set_mode(entry.get(), AE_IFREG | 0644);
-    archive_entry_set_size(entry.get(), static_cast<la_int64_t>(content.size()));
-    archive_write_header(zip.get(), entry.get());
-    archive_write_data(zip.get(), content.data(), content.size());
-  };
-  add("App.app/Info.plist", manifest);
-  add("App.app/content", Bytes(contentSize, 'c'));
-  archive_write_close(zip.get());
-  bytes.resize(used);
-  return bytes;
-}
-
 const Bytes& iconImage() {
-  static const Bytes image = [] {
-    Bytes bytes;
-    cairo_surface_t* surface = cairo_image_surface_create(CAIRO_FORMAT_ARGB32, 8, 8);
-    cairo_surface_write_to_png_stream(
-        surface,
-        [](void* out, const unsigned char* data, unsigned length) {
-          static_cast<Bytes*>(out)->append(reinterpret_cast<const char*>(data), length);
-          return CAIRO_STATUS_SUCCESS;
-        },
-        &bytes);
-    cairo_surface_destroy(surface);
-    return bytes;
-  }();
+  static const Bytes image = pngOf(8, 8);
   return image;
 }
 
@@ -160,6 +114,7 @@ void PluginRig::load() {
   ASSERT_STREQ(table->dataclass, "Application");
   _client = table->create(platform());
   ASSERT_TRUE(_client);
+  _daemon.emplace(*_device, *_client);
 }
 
 void PluginRig::unload() {
@@ -178,47 +133,9 @@ void PluginRig::deliver() {
   while (_transfers.complete());
 }
 
-Value PluginRig::installedAssets() {
-  return enter("installedAssets", [&] { return _client->installedAssets(); });
-}
-bool PluginRig::reconcileSync(ErrorRef* error) {
-  return enter("reconcileSync", [&] {
-    return _client->reconcileSync(
-        1, "anchor", [](double) {}, error);
-  });
-}
-std::vector<TSAssetRef> PluginRig::outstandingAssetTransfers() {
-  return enter("outstandingAssetTransfers", [&] { return _client->outstandingAssetTransfers(); });
-}
 void PluginRig::progress(const TSAssetRef& asset, double fraction) {
   asset->setDownloadProgress(static_cast<float>(fraction));
-  enter(
-      "assetTransferUpdatedProgress", [&] { _client->assetTransferUpdatedProgress(asset, fraction); },
-      asset->identifier());
-}
-void PluginRig::transferEnded(const TSAssetRef& asset, bool succeeded, const ErrorRef& error) {
-  enter(
-      "assetTransferSucceeded", [&] { _client->assetTransferSucceeded(asset, succeeded, error); }, asset->identifier());
-}
-void PluginRig::installSucceeded(const TSAssetRef& asset) {
-  enter(
-      "assetInstallSucceeded", [&] { _client->assetInstallSucceeded(asset); }, asset->identifier());
-}
-void PluginRig::installFailed(const TSAssetRef& asset, const ErrorRef& error) {
-  enter(
-      "assetInstallFailed", [&] { _client->assetInstallFailed(asset, error); }, asset->identifier());
-}
-void PluginRig::phaseEnded(bool success) {
-  enter("assetTransferEndedWithSuccess", [&] { _client->assetTransferEndedWithSuccess(success); });
-}
-void PluginRig::syncEnded(bool success) {
-  enter("syncEndedWithSuccess", [&] { _client->syncEndedWithSuccess(success); });
-}
-void PluginRig::clearSyncData() {
-  enter("clearSyncData", [&] { _client->clearSyncData(); });
-}
-bool PluginRig::reconcileRestore(std::int32_t type, ErrorRef* error) {
-  return enter("reconcileRestoreOfType", [&] { return _client->reconcileRestoreOfType(type, error); });
+  _daemon->assetTransferUpdatedProgress(asset, fraction);
 }
 
 void PluginRig::write(const std::string& path, const Bytes& content) {

@@ -10,6 +10,8 @@
 #include "device/LocalDevice.h"
 #include "platform/TSClient.h"
 #include "platform/TSDeviceService.h"
+#include "tests/SampleContent.h"
+#include "tsd/Daemon.h"
 
 namespace tests {
 
@@ -33,12 +35,8 @@ constexpr char startupNotification[] = "com.vantor.tsd.TSStartupCompleteNotifica
 /// Whether the text is the pattern, in which `*` stands for anything.
 bool matches(std::string_view pattern, std::string_view text);
 
-Value dictionaryOf(std::initializer_list<std::pair<std::string_view, Value>> entries);
 Value arrayOf(const std::vector<std::string>& elements);
 Bytes binaryList(const Value& value);
-/// A zip archive with one app in it; the same bytes for the same arguments.
-Bytes packageOf(const std::string& identifier, const std::string& version, std::size_t contentSize = 64);
-/// A small PNG image.
 const Bytes& iconImage();
 
 /// The daemon's transfer queue as the device's services see it: remembers what it was asked for; what it can do is one
@@ -98,22 +96,13 @@ class PluginRig {
   /// Delivers everything that is due, also what follows from it.
   void deliver();
 
-  // The daemon's calls.
-  Value installedAssets();
-  bool reconcileSync(ErrorRef* error = nullptr);
-  std::vector<TSAssetRef> outstandingAssetTransfers();
+  /// The daemon's calls, and short forms of some of them.
+  tsd::Daemon& daemon() { return *_daemon; }
+  bool reconcileSync(ErrorRef* error = nullptr) { return _daemon->reconcileSync(1, "anchor", error); }
+  bool reconcileRestore(std::int32_t type) { return _daemon->reconcileRestoreOfType(type, nullptr); }
   void progress(const TSAssetRef& asset, double fraction);
-  void transferEnded(const TSAssetRef& asset, bool succeeded, const ErrorRef& error = nullptr);
-  void installSucceeded(const TSAssetRef& asset);
-  void installFailed(const TSAssetRef& asset, const ErrorRef& error);
-  void phaseEnded(bool success);
-  void syncEnded(bool success);
-  void clearSyncData();
-  bool reconcileRestore(std::int32_t type, ErrorRef* error = nullptr);
-  /// Any other call.
-  template <class Body>
-  auto enter(const char* operation, Body&& body, std::string_view app = {}) {
-    return _device->boundary().enter({"AppsClient", operation, app}, {}, body);
+  void transferEnded(const TSAssetRef& asset, bool succeeded, const ErrorRef& error = nullptr) {
+    _daemon->assetTransferSucceeded(asset, succeeded, error);
   }
 
   // The device's files, below the boundary. Missing directories are made.
@@ -145,6 +134,7 @@ class PluginRig {
   device::ManualEventQueue* _manualEvents = nullptr;
   std::unique_ptr<device::LocalDevice> _device;
   std::shared_ptr<platform::TSClient> _client;
+  std::optional<tsd::Daemon> _daemon;
 };
 
 /// A record of the journal as one line. A message: its text without the plug-in's prefix; "E " in front of it at error

@@ -49,10 +49,7 @@ void installAccounts(PluginRig& rig) {
 
 TEST(Queries, Metrics) {
   PluginRig rig;
-  auto metrics = [&] {
-    return platform::describe(
-        rig.enter("installedAssetMetrics", [&] { return rig.client()->installedAssetMetrics(); }));
-  };
+  auto metrics = [&] { return platform::describe(rig.daemon().installedAssetMetrics()); };
   EXPECT_EQ(metrics(), "{_Count = 0; _PhysicalSize = 0; _PurgeableSize = 0}");
   device::StoreInstall system;
   system.applicationType = "System";
@@ -72,7 +69,7 @@ TEST(Queries, Metrics) {
 TEST(Queries, VantorIDs) {
   PluginRig rig;
   installAccounts(rig);
-  auto identifiers = rig.enter("vantorIDsForAssets", [&] { return rig.client()->vantorIDsForAssets(); });
+  auto identifiers = rig.daemon().vantorIDsForAssets();
   EXPECT_EQ(identifiers.members(), (Lines{"one", "top", "below", "f", "h"}));
   EXPECT_TRUE(
       exactly(rig.messagesIn("vantorIDsForAssets"),
@@ -87,7 +84,7 @@ TEST(Queries, VantorIDs) {
 TEST(Queries, Accounts) {
   PluginRig rig;
   installAccounts(rig);
-  auto accounts = rig.enter("accountsForAssets", [&] { return rig.client()->accountsForAssets(); });
+  auto accounts = rig.daemon().accountsForAssets();
   EXPECT_EQ(accounts.size(), 4u);
   Lines calls;
   for (const auto& record : rig.records()) {
@@ -131,7 +128,7 @@ TEST(Queries, BackupRewritesOnlyWhatIsMarked) {
   std::size_t number = 0;
   for (const auto& content : kept) installWith(rig, "app.kept" + std::to_string(number++), content);
   installWith(rig, "app.z", binaryList(dictionaryOf({{"is-auto-download", 1}, {"vantorId", "me"}})));
-  rig.enter("prepareForBackup", [&] { rig.client()->prepareForBackup(); });
+  rig.daemon().prepareForBackup();
   EXPECT_TRUE(exactly(
       rig.messagesIn("prepareForBackup"),
       {"preparing for backup", "clearing is-auto-download value for app.a", "clearing is-auto-download value for app.b",

@@ -69,7 +69,7 @@ RestoreOutcome run(PluginRig& rig, const RestoreScenario& scenario) {
   RestoreOutcome outcome;
   ErrorRef error = platform::makeError("Test", 1, "an error from before the call");
   auto begin = rig.platform().clock.now();
-  EXPECT_TRUE(rig.reconcileRestore(scenario.type, &error));
+  EXPECT_TRUE(rig.daemon().reconcileRestoreOfType(scenario.type, &error));
   outcome.waited = std::chrono::duration_cast<std::chrono::seconds>(rig.platform().clock.now() - begin).count();
   rig.deliver();
   outcome.cancelled = cancellationsIn(rig.records());

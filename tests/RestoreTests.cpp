@@ -4,7 +4,7 @@
 
 #include "platform/InstallCoordination.h"
 #include "plist/PropertyList.h"
-#include "tests/ReferenceModel.h"
+#include "tests/ScenarioTable.h"
 
 namespace tests {
 namespace {
@@ -12,25 +12,6 @@ namespace {
 using Entry = RestoreApp::Entry;
 using Kind = platform::RVCoordinatorKind;
 using Lines = std::vector<std::string>;
-
-struct Row {
-  RestoreScenario given;
-  std::string outcome;
-  Lines says{};
-  Lines neverSays{};
-};
-
-void expectRows(const std::vector<Row>& rows) {
-  for (const auto& row : rows) {
-    SCOPED_TRACE(row.given.name);
-    PluginRig rig(optionsOf(row.given));
-    auto outcome = run(rig, row.given);
-    EXPECT_EQ(outcome.text(), row.outcome);
-    EXPECT_EQ(outcome.text(), predict(row.given).text());
-    EXPECT_TRUE(inOrder(rig.messages(), row.says));
-    for (const auto& pattern : row.neverSays) EXPECT_FALSE(inOrder(rig.messages(), {pattern})) << pattern;
-  }
-}
 
 Bytes list(const Value& value) { return plist::writeXML(value).value(); }
 
@@ -144,7 +125,7 @@ TEST(Restore, EveryAppStepByStep) {
 TEST(Restore, WhatIsAskedAndWhatIsThere) {
   const std::string one = "open [app.a restoring]; app.a is placeholder 2; waited 0; filed away; ";
   const Lines skipped = {"no harlune restore plist found - skipping processing of harlune restored apps"};
-  expectRows({
+  expectRows<RestoreScenario>({
       {.given = {.name = "type 3", .apps = {{.id = "app.a"}}, .type = 3}, .outcome = one},
       {.given = {.name = "another type", .apps = {{.id = "app.a"}}, .type = 1, .settings = {{"backup-error", "yes"}}},
        .outcome = "waited 0; ",
@@ -223,7 +204,7 @@ TEST(Restore, WhatIsAskedAndWhatIsThere) {
 }
 
 TEST(Restore, TheWaitEndsWithTheLastReportOrTheDeadline) {
-  expectRows({
+  expectRows<RestoreScenario>({
       {.given = {.name = "one is never installed",
                  .apps = {{.id = "app.a"}, {.id = "app.b", .neverReported = true}, {.id = "app.c"}}},
        .outcome = "open [app.a restoring]; open [app.b restoring]; open [app.c restoring]; app.a is placeholder 2; "
@@ -356,7 +337,7 @@ TEST(Restore, WhatFailsCancelsWhatWasMade) {
         "E Error " + error + " setting RVClientMercato to satisfy app data promise for 'app.a'", gaveUp[0], gaveUp[1],
         "Shiftwell cancelled coordinator for restoring app bundle app.a _restoringPlaceholderCount 0"}},
   };
-  std::vector<Row> table;
+  std::vector<ScenarioRow<RestoreScenario>> table;
   for (const auto& row : rows) {
     table.push_back(
         {.given = {.name = row.point, .apps = {{.id = "app.a"}}, .failures = {{.point = row.point, .app = "app.a"}}},

@@ -43,14 +43,14 @@ class SyncPlayer {
     _rig.postStartup();
 
     Outcome outcome;
-    outcome.deleted = deletedBy(_rig.installedAssets());
+    outcome.deleted = deletedBy(_rig.daemon().installedAssets());
     if (_scenario.stages) stage();
     outcome.reconciled = _rig.reconcileSync();
     _rig.deliver();
     if (outcome.reconciled) transferAll(outcome);
-    _rig.phaseEnded(outcome.reconciled && _scenario.phaseSucceeded);
+    _rig.daemon().assetTransferEndedWithSuccess(outcome.reconciled && _scenario.phaseSucceeded);
     _rig.deliver();
-    _rig.syncEnded(_scenario.syncSucceeded.value_or(outcome.reconciled));
+    _rig.daemon().syncEndedWithSuccess(_scenario.syncSucceeded.value_or(outcome.reconciled));
     _rig.deliver();
     observe(outcome);
     return outcome;
@@ -140,7 +140,7 @@ class SyncPlayer {
   }
 
   void transferAll(Outcome& outcome) {
-    auto assets = _rig.outstandingAssetTransfers();
+    auto assets = _rig.daemon().outstandingAssetTransfers();
     for (const auto& asset : assets) outcome.requested.push_back(asset->identifier());
     _rig.deliver();
     for (const auto& asset : assets) {
@@ -200,8 +200,9 @@ class SyncPlayer {
   }
 
   void report(const App& app, const TSAssetRef& asset) {
-    if (app.report == App::Report::succeeded) _rig.installSucceeded(asset);
-    if (app.report == App::Report::failed) _rig.installFailed(asset, platform::makeError("Daemon", 9, "no room"));
+    if (app.report == App::Report::succeeded) _rig.daemon().assetInstallSucceeded(asset);
+    if (app.report == App::Report::failed)
+      _rig.daemon().assetInstallFailed(asset, platform::makeError("Daemon", 9, "no room"));
   }
 
   void observe(Outcome& outcome) {

@@ -59,7 +59,7 @@ std::vector<TSAssetRef> request(PluginRig& rig, const Scenario& scenario) {
   rig.write(std::string(stagingDirectory) + "/ApplicationsSync.plist", binaryList(list));
   EXPECT_TRUE(rig.reconcileSync());
   rig.deliver();
-  auto assets = rig.outstandingAssetTransfers();
+  auto assets = rig.daemon().outstandingAssetTransfers();
   rig.deliver();
   return assets;
 }
@@ -161,7 +161,7 @@ TEST(SyncMessages, WhatIsPreparedAlreadyIsLeft) {
   PluginRig rig;
   request(rig, oneApp);
   // The same again: now as a placeholder of the device.
-  EXPECT_EQ(rig.outstandingAssetTransfers().size(), 1u);
+  EXPECT_EQ(rig.daemon().outstandingAssetTransfers().size(), 1u);
   EXPECT_TRUE(exactly(
       preparationIn(rig, 2),
       Lines{"[15] processing app install for bundle 'app.a', title * with install coordination",
@@ -335,7 +335,7 @@ TEST(SyncMessages, AnUpdateUnderWayIsNoPlaceholder) {
   PluginRig rig;
   rig.install("app.a", "1.0");
   EXPECT_TRUE(rig.device().beginStoreInstall("app.a", {}));
-  EXPECT_TRUE(rig.outstandingAssetTransfers().empty());
+  EXPECT_TRUE(rig.daemon().outstandingAssetTransfers().empty());
   EXPECT_TRUE(inOrder(rig.messages(), {"[15] prioritized proxies (<OBApplicationProxy app.a>) paused proxies ()",
                                        "No placeholder for asset identifier app.a",
                                        "Assets already in progress (not returning these): ()"}));
@@ -349,7 +349,7 @@ TEST(SyncMessages, ReconciliationInOrder) {
                       {"starting to reconcile sync with new anchor anchor", "app.a targeted for termination",
                        "performing 1 deletions", "Notifying PN we are starting syncing", "finished reconcile sync"}));
   EXPECT_EQ(rig.device().status().syncing, 1u);
-  rig.phaseEnded(true);
+  rig.daemon().assetTransferEndedWithSuccess(true);
   EXPECT_EQ(rig.device().status().syncing, 0u);
 
   const std::pair<const char*, Lines> rows[] = {
@@ -385,7 +385,7 @@ TEST(SyncMessages, TheLayoutReachesTheHomeScreenUnchanged) {
   EXPECT_TRUE(rig.reconcileSync());
   EXPECT_EQ(rig.device().status().home, (Lines{"app.z", "app.y"}));
   EXPECT_TRUE(inOrder(rig.messages(), {"Notifying PN we are starting syncing", "Sending iconlayout to PN"}));
-  rig.outstandingAssetTransfers();
+  rig.daemon().outstandingAssetTransfers();
   EXPECT_EQ(rig.countOf("deallocateMemory"), 1u);
 }
 
@@ -394,26 +394,26 @@ TEST(SyncMessages, TheEndOfASync) {
   rig.install("app.lost", "1");
   EXPECT_TRUE(rig.device().uninstallByPerson("app.lost"));
   rig.write(lastSyncPath, binaryList(arrayOf({})));
-  const std::string deleted = platform::describe(rig.installedAssets());
+  const std::string deleted = platform::describe(rig.daemon().installedAssets());
   EXPECT_EQ(deleted, "{_Deleted = ({KBBundleIdentifier = app.lost})}");
-  rig.syncEnded(false);
+  rig.daemon().syncEndedWithSuccess(false);
   EXPECT_TRUE(exactly(rig.messagesIn("syncEndedWithSuccess"), {"sync ended with success: n"}));
   EXPECT_TRUE(rig.exists(lastSyncPath));
-  EXPECT_EQ(platform::describe(rig.installedAssets()), deleted);
+  EXPECT_EQ(platform::describe(rig.daemon().installedAssets()), deleted);
 
-  rig.syncEnded(true);  // the installer does not forget
+  rig.daemon().syncEndedWithSuccess(true);  // the installer does not forget
   EXPECT_TRUE(exactly(rig.messagesIn("syncEndedWithSuccess", 2),
                       {"sync ended with success: y", "clearing uninstalled apps: (app.lost)",
                        "E Failed to clear uninstalled apps from Corvane."}));
   EXPECT_FALSE(rig.exists(lastSyncPath));
-  rig.syncEnded(true);  // is asked again
+  rig.daemon().syncEndedWithSuccess(true);  // is asked again
   EXPECT_TRUE(
       exactly(rig.messagesIn("syncEndedWithSuccess", 3),
               {"sync ended with success: y", "E Failed to update utimes of \"/var/mobile/Library/ApplicationSync\": *",
                "clearing uninstalled apps: (app.lost)"}));
-  rig.syncEnded(true);  // and not again
+  rig.daemon().syncEndedWithSuccess(true);  // and not again
   EXPECT_TRUE(exactly(rig.messagesIn("syncEndedWithSuccess", 4), {"sync ended with success: y"}));
-  EXPECT_EQ(platform::describe(rig.installedAssets()), "{_Deleted = ()}");
+  EXPECT_EQ(platform::describe(rig.daemon().installedAssets()), "{_Deleted = ()}");
 }
 
 TEST(SyncMessages, ClearingLeavesNothing) {
@@ -423,15 +423,15 @@ TEST(SyncMessages, ClearingLeavesNothing) {
   for (const char* id : {"app.goes", "app.stays"}) EXPECT_TRUE(rig.device().beginStoreInstall(id, plain));
   rig.install("app.installed", "1");
   rig.write(restoreStatePath, "anything");
-  rig.clearSyncData();
+  rig.daemon().clearSyncData();
   EXPECT_TRUE(exactly(rig.messagesIn("clearSyncData"), {"blasting work area", "Uninstalling all placeholder apps",
                                                         "Uninstall app.goes = y", "Uninstall app.stays = n"}));
   EXPECT_FALSE(rig.exists(pluginDirectory));
   EXPECT_FALSE(rig.device().app("app.goes") && !rig.device().app("app.goes")->state.empty());
   EXPECT_EQ(rig.device().app("app.installed")->state, "installed");
-  rig.clearSyncData();
+  rig.daemon().clearSyncData();
   EXPECT_TRUE(inOrder(rig.messagesIn("clearSyncData", 2), {"E Failed to fetch uninstalled apps list to clear it"}));
-  rig.clearSyncData();
+  rig.daemon().clearSyncData();
   EXPECT_TRUE(inOrder(rig.messagesIn("clearSyncData", 3), {"E Failed to clear uninstalled apps list"}));
 }
 
@@ -481,13 +481,13 @@ TEST(SyncMessages, CancellationsAreRememberedUntilTheTransferEnds) {
   const std::string refuses = "E Cannot cancel app.a as it's already cancelled 1 OR the call is not supported";
   cancel();
   cancel();
-  rig.phaseEnded(true);  // with nothing outstanding it forgets nothing
+  rig.daemon().assetTransferEndedWithSuccess(true);  // with nothing outstanding it forgets nothing
   cancel();
   EXPECT_TRUE(inOrder(rig.messages(), {"Cancelling asset sync for app.a", refuses, "Notifying PN*", refuses}));
   EXPECT_EQ(rig.countOf("cancelAssetTransferForFailedAsset"), 1u);
 
   rig.progress(asset, 0.5);
-  rig.phaseEnded(true);  // now it does
+  rig.daemon().assetTransferEndedWithSuccess(true);  // now it does
   cancel();
   EXPECT_EQ(rig.countOf("cancelAssetTransferForFailedAsset"), 2u);
   rig.progress(asset, 0.5);
@@ -516,14 +516,14 @@ TEST(SyncMessages, TheRestoreStateIsPruned) {
     PluginRig rig;
     auto asset = platform::TSAsset::downloadAssetWithIdentifier("app.a", "Application", std::nullopt);
     rig.write(restoreStatePath, content);
-    rig.installSucceeded(asset);
+    rig.daemon().assetInstallSucceeded(asset);
     EXPECT_EQ(platform::describe(rig.readList(restoreStatePath)), left);
     EXPECT_EQ(rig.exists(restoreStatePath), left != "(null)");
     rig.device().files().removeItem(restoreStatePath);
-    rig.installFailed(asset, nullptr);
+    rig.daemon().assetInstallFailed(asset, nullptr);
     EXPECT_FALSE(rig.exists(restoreStatePath));
     asset->setIsRestore(true);
-    rig.installFailed(asset, nullptr);
+    rig.daemon().assetInstallFailed(asset, nullptr);
     EXPECT_TRUE(inOrder(rig.traceIn("assetInstallFailed", "app.a", 2),
                         {"app.a install failed but was recoverable: (null)",
                          "scenario Orrin restore 0 n app.a install failed recoverably"}));

@@ -1,7 +1,7 @@
 #include <gtest/gtest.h>
 
 #include "plist/PropertyList.h"
-#include "tests/ReferenceModel.h"
+#include "tests/ScenarioTable.h"
 
 namespace tests {
 namespace {
@@ -11,14 +11,6 @@ using Before = App::Before;
 using Lines = std::vector<std::string>;
 
 constexpr char icons[] = "/var/mobile/Library/ApplicationSync/Icons";
-
-struct Row {
-  Scenario given;
-  std::string outcome;
-  Lines says{};       // in this order, other messages between them
-  Lines neverSays{};  // patterns that no message fits
-  bool modelled = true;
-};
 
 device::StoreInstall storeInstall(std::uint64_t type, std::uint64_t state, std::uint64_t phase) {
   device::StoreInstall install;
@@ -38,22 +30,8 @@ device::StoreInstall placeholderOf(std::uint64_t type, const std::string& applic
   return install;
 }
 
-void expectRows(const std::vector<Row>& rows) {
-  for (const auto& row : rows) {
-    SCOPED_TRACE(row.given.name);
-    PluginRig rig(optionsOf(row.given));
-    auto outcome = run(rig, row.given);
-    EXPECT_EQ(outcome.text(), row.outcome);
-    if (row.modelled) {
-      EXPECT_EQ(outcome.text(), predict(row.given).text());
-    }
-    EXPECT_TRUE(inOrder(rig.messages(), row.says));
-    for (const auto& pattern : row.neverSays) EXPECT_FALSE(inOrder(rig.messages(), {pattern})) << pattern;
-  }
-}
-
 TEST(SyncOutcome, WhatIsOnTheDeviceDecidesHowAnAppIsPrepared) {
-  expectRows({
+  expectRows<Scenario>({
       {.given = {.name = "fresh", .apps = {{.id = "app.a"}}},
        .outcome = "requested app.a; marks app.a=INSTALLED; present app.a=installed; ",
        .says = {"Changing app.a from install to DOWNLOADED", "Changing app.a from DOWNLOADED to INSTALLED"}},
@@ -119,7 +97,7 @@ TEST(SyncOutcome, InstallsUnderWayAreLeftAlone) {
   auto paused = storeInstall(4, 1, 1);
   paused.paused = true;
   auto idle = App::plainPlaceholder();
-  expectRows({
+  expectRows<Scenario>({
       {.given = {.name = "every rule of the snapshot",
                  .apps = {under("app.a", storeInstall(4, 1, 1)), under("app.b", storeInstall(4, 1, 0)),
                           under("app.c", storeInstall(1, 1, 0)), under("app.d", storeInstall(2, 1, 0)),
@@ -174,7 +152,7 @@ TEST(SyncOutcome, ListsAndIdentifiersOfEveryShape) {
   auto entry = [](Value identifier, Value operation) {
     return dictionaryOf({{"identifier", identifier}, {"operation", operation}});
   };
-  expectRows({
+  expectRows<Scenario>({
       {.given = {.name = "no staging directory", .apps = {{.id = "app.a", .previousMark = "install"}}, .stages = false},
        .outcome = "",
        .says = {"Nothing to do", "finished reconcile sync"},
@@ -231,7 +209,7 @@ TEST(SyncOutcome, ListsAndIdentifiersOfEveryShape) {
 }
 
 TEST(SyncOutcome, DeletionsAreReportedUntilASyncSucceeds) {
-  expectRows({
+  expectRows<Scenario>({
       {.given = {.name = "lost apps and what the list says of them",
                  .apps = {{.id = "app.a", .lost = true, .previousMark = "install", .operation = ""},
                           {.id = "app.b", .lost = true, .previousMark = "FAILED", .operation = ""},
@@ -264,7 +242,7 @@ TEST(SyncOutcome, TransfersEndInEveryWay) {
   using Package = App::Package;
   using Path = App::Path;
   const std::string fresh = "open [app.a initiating]; present app.a=placeholder; ";
-  expectRows({
+  expectRows<Scenario>({
       {.given = {.name = "damaged", .apps = {{.id = "app.a", .package = Package::damaged}, {.id = "app.b"}}},
        .outcome = "requested app.a app.b; marks app.a=FAILED app.b=INSTALLED; present app.b=installed; ",
        .says = {"coordinatorDidCompleteSuccessfully for app.a with error InstallCoordination *",
@@ -343,7 +321,7 @@ TEST(SyncOutcome, TransfersEndInEveryWay) {
 TEST(SyncOutcome, ThePersonInterferes) {
   using Person = App::Person;
   using Transfer = App::Transfer;
-  expectRows({
+  expectRows<Scenario>({
       {.given = {.name = "cancels a new app", .apps = {{.id = "app.a", .person = Person::cancels}, {.id = "app.b"}}},
        .outcome = "requested app.a app.b; marks app.a=install app.b=INSTALLED; present app.b=installed; ",
        .says = {"Cancelling asset sync for app.a", "transfer for asset * ended with success n *"},

@@ -70,7 +70,7 @@ TEST(Threads, SixteenPackagesInFlightLoseNoMark) {
   rig.postStartup();
   stage(rig, identifiers(16));
   ASSERT_TRUE(rig.reconcileSync());
-  auto assets = rig.outstandingAssetTransfers();
+  auto assets = rig.daemon().outstandingAssetTransfers();
   ASSERT_EQ(assets.size(), 16u);
   for (const auto& asset : assets) {
     asset->setPath(rig.receivePackage(asset->identifier(), packageOf(asset->identifier(), "2.0")));
@@ -81,8 +81,8 @@ TEST(Threads, SixteenPackagesInFlightLoseNoMark) {
   });
   rig.deliver();
   EXPECT_EQ(marks(rig), std::vector<std::string>{"INSTALLED"});
-  rig.phaseEnded(true);
-  rig.syncEnded(true);
+  rig.daemon().assetTransferEndedWithSuccess(true);
+  rig.daemon().syncEndedWithSuccess(true);
   for (const auto& asset : assets) EXPECT_EQ(rig.device().app(asset->identifier())->version, "2.0");
 }
 
@@ -146,12 +146,13 @@ TEST(Threads, EditsReconciliationAndClearingExcludeOneAnother) {
     if (thread != 4) {
       while (reconciling) {
         for (std::size_t app = thread; app < apps.size(); app += 4) {
-          rig.installSucceeded(platform::TSAsset::downloadAssetWithIdentifier(apps[app], "Application", std::nullopt));
+          rig.daemon().assetInstallSucceeded(
+              platform::TSAsset::downloadAssetWithIdentifier(apps[app], "Application", std::nullopt));
         }
       }
       return;
     }
-    for (int i = 0; i < 1000; ++i) {
+    for (int i = 0; i < 500; ++i) {
       const auto& staged = i % 2 ? apps : fewer;
       stage(rig, staged);
       rig.reconcileSync();
@@ -160,7 +161,7 @@ TEST(Threads, EditsReconciliationAndClearingExcludeOneAnother) {
         const Value list = rig.readList(todoListPath);
         if (!list.array() || list.array()->size() != staged.size()) ++stale;
       }
-      if (i % 5 == 4) rig.clearSyncData();
+      if (i % 5 == 4) rig.daemon().clearSyncData();
       if (i % 5 == 4 && rig.exists(todoListPath)) ++stale;
     }
     reconciling = false;
@@ -170,7 +171,8 @@ TEST(Threads, EditsReconciliationAndClearingExcludeOneAnother) {
   ASSERT_TRUE(rig.reconcileSync());
   EXPECT_EQ(marks(rig), std::vector<std::string>{"install"});
   onThreads(8, [&](std::size_t i) {
-    rig.installSucceeded(platform::TSAsset::downloadAssetWithIdentifier(apps[i], "Application", std::nullopt));
+    rig.daemon().assetInstallSucceeded(
+        platform::TSAsset::downloadAssetWithIdentifier(apps[i], "Application", std::nullopt));
   });
   EXPECT_EQ(marks(rig), std::vector<std::string>{"INSTALLED"});
 }
@@ -182,7 +184,7 @@ TEST(Threads, TheObjectGoesWhileServicesCallBack) {
     stage(rig, apps);
     rig.postStartup();
     ASSERT_TRUE(rig.reconcileSync());
-    rig.outstandingAssetTransfers();
+    rig.daemon().outstandingAssetTransfers();
     onThreads(3, [&](std::size_t thread) {
       for (std::size_t i = 0; i < apps.size(); ++i) {
         if (thread == 0) rig.device().cancelByPerson(apps[i]);
