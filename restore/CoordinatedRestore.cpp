@@ -4,6 +4,7 @@
 #include "coordination/TransactionStep.h"
 #include "core/Say.h"
 #include "platform/PropertyListSerialization.h"
+#include "restore/DemotionStatus.h"
 
 namespace appsync {
 
@@ -13,8 +14,8 @@ constexpr std::string_view demotedDescription = "Restore demoted app";
 constexpr std::string_view plainDescription = "Restore app";
 
 bool AppsClient::prepareAppForRestoreUsingCoordination(const RestoreInput& input, std::uint64_t demotionStatus) {
-  return demotionStatus != 0 ? _prepareDemotedAppForRestoreWithBundleId(input, demotionStatus)
-                             : _prepareNonDemotedAppForRestoreWithBundleId(input);
+  return demotionStatus != notDemoted ? _prepareDemotedAppForRestoreWithBundleId(input, demotionStatus)
+                                      : _prepareNonDemotedAppForRestoreWithBundleId(input);
 }
 
 bool AppsClient::_prepareDemotedAppForRestoreWithBundleId(const RestoreInput& input, std::uint64_t demotionStatus) {
@@ -22,7 +23,7 @@ bool AppsClient::_prepareDemotedAppForRestoreWithBundleId(const RestoreInput& in
 }
 
 bool AppsClient::_prepareNonDemotedAppForRestoreWithBundleId(const RestoreInput& input) {
-  return CoordinatedRestore(*this, input, 0).restoreApp();
+  return CoordinatedRestore(*this, input, notDemoted).restoreApp();
 }
 
 AppsClient::CoordinatedRestore::CoordinatedRestore(AppsClient& client, const RestoreInput& input,

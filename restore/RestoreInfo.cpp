@@ -7,15 +7,13 @@
 #include "core/Say.h"
 #include "platform/FileSystem.h"
 #include "platform/PropertyListSerialization.h"
+#include "restore/DemotionStatus.h"
 
 namespace appsync {
 
 using namespace platform;
 
 namespace {
-
-/// How an app had been demoted before the backup.
-enum DemotionStatus : std::uint64_t { notDemoted = 0, demotedByHand = 1, demotedAutomatically = 2 };
 
 /// The demoted apps of the backup service's list; an absent or odd list has none.
 class DemotedApps {

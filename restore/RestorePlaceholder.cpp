@@ -5,6 +5,7 @@
 #include "core/PropertyListFile.h"
 #include "core/Say.h"
 #include "platform/Installer.h"
+#include "restore/DemotionStatus.h"
 
 namespace appsync {
 
@@ -26,9 +27,9 @@ bool isLaunchProhibited(const Dictionary& metadata) {
 
 std::uint64_t installTypeFor(std::uint64_t demotionStatus) {
   switch (demotionStatus) {
-    case 1:
+    case demotedByHand:
       return installType::intentionalDowngrade;
-    case 2:
+    case demotedAutomatically:
       return installType::downgrade;
     default:
       return installType::restore;
