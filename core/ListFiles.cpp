@@ -1,4 +1,5 @@
 #include <cstddef>
+#include <memory>
 #include <utility>
 
 #include "core/AppsClient.h"
@@ -58,12 +59,12 @@ static Value readIconOrder(const Platform& platform) {
     say(platform, "got no icon sort order from PN");
     return {};
   }
+  auto giveBack = [&](void* held) { platform.process.deallocateMemory(held, length); };
+  const std::unique_ptr<void, decltype(giveBack)> held(buffer, giveBack);
   Bytes data(static_cast<const char*>(buffer), length);
   say(platform, "saved icon sort order");
   platform.fileSystem.writeAtomically(sortOrderPath, data);
-  Value order = platform.propertyLists.propertyListWithData(std::move(data));
-  platform.process.deallocateMemory(buffer, length);
-  return order;
+  return platform.propertyLists.propertyListWithData(std::move(data));
 }
 
 std::vector<CandidateRef> AppsClient::_orderTheItems(const Platform& platform, Candidates& items) {
