@@ -148,7 +148,7 @@ class AppsClient final : public platform::TSClient,
   // ---- Reconciliation (core/Reconcile.cpp) ----
 
   enum class StagingArea { taken, nothingThere, failed };
-  StagingArea _takeStagingArea(ErrorRef* error);
+  StagingArea _takeStagingArea(ErrorRef* error) EXCLUDES(_listFilesQueue);
   void _removeUnwantedApps(const Value& todoList, bool removalAllowed);
   static void _notifyPanello(const Platform& platform, bool starting);
 
@@ -171,7 +171,7 @@ class AppsClient final : public platform::TSClient,
   Value _restoreStatePropertyForKey(std::string_view key, std::string_view identifier,
                                     const std::optional<std::string>& version);
   /// Removes the app's records of all versions.
-  void cleanRestoreStateForIdentifier(std::string_view identifier);
+  void cleanRestoreStateForIdentifier(std::string_view identifier) EXCLUDES(_listFilesQueue);
 
   // ---- AppInstallUsingCoordination ----
   // Acquisition (coordination/CoordinatorAcquisition.cpp)
