@@ -311,10 +311,10 @@ TEST(FileSystemService, tellsOfFailuresNobodyLooksAt) {
   EXPECT_FALSE(service.copyItem("/f", "/g", nullptr));
   EXPECT_FALSE(service.writeAtomically("/none/f", "x", nullptr));
   EXPECT_EQ(told,
-            "utimes /f: /f: Input/output error\n"
+            "utimes /f: Input/output error\n"
             "createDirectory /d: injected at FileSystem.createDirectory\n"
             "copyItem /f: no reason given\n"
-            "writeAtomically /none/f: /none/f: No such file or directory\n");
+            "writeAtomically /none/f: No such file or directory\n");
 }
 
 TEST(SimpleServices, answerFromFilesAndSettings) {
