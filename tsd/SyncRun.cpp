@@ -173,6 +173,7 @@ void SyncRun::sendInstallReports() {
       _parts.daemon.assetInstallSucceeded(asset);
     } else {
       std::string reason = app && !app->lastReason.empty() ? app->lastReason : "not installed";
+      _reportedReasons[asset->identifier()] = reason;
       _parts.daemon.assetInstallFailed(asset, platform::makeError("Install", 1, reason));
     }
   }
@@ -263,7 +264,11 @@ AppOutcome SyncRun::outcomeOf(const std::string& id, const std::string& mark) co
   if (mark == "INSTALLED") {
     be("INSTALLED", "");
   } else if (mark == "FAILED") {
-    std::string reason = app ? reasonForPeople(app->lastReason) : "";
+    // The device forgets an app that the report of its failure removes.
+    auto reported = _reportedReasons.find(id);
+    std::string reason = reasonForPeople(reported != _reportedReasons.end() ? reported->second
+                                         : app                              ? app->lastReason
+                                                                            : "");
     be("FAILED", !requested ? "its install could not be prepared" : !reason.empty() ? reason : "the install failed");
   } else if (!requested) {
     if (isFileName(id))

@@ -65,6 +65,7 @@ class SyncRun {
   std::vector<platform::TSAssetRef> _assets;
   std::set<std::string> _requested;
   std::map<std::string, platform::RVClientIdentifier> _openInstalls;  // at the end, and whose they are
+  std::map<std::string, std::string> _reportedReasons;                // of installs that the daemon reported as failed
   std::vector<TodoEntry> _todo;                                       // as it was read last
   std::uint64_t _changesRead = 0;                                     // of the watch, when the list was read last
   bool _deadlinePassed = false;
