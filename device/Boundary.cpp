@@ -54,7 +54,8 @@ struct Boundary::State {
   std::string nameOf(const char* kind, const void* address, std::optional<std::weak_ptr<const void>> ownership) {
     std::lock_guard lock(objectsMutex);
     auto [entry, added] = objects.try_emplace({address, kind});
-    if (added || entry->second.gone()) entry->second.number = ++lastNumbers[kind];
+    // An address alone may be an object's that is just going; only what owns an object can tell that it is a new one.
+    if (added || (ownership && entry->second.gone())) entry->second.number = ++lastNumbers[kind];
     if (ownership) entry->second.ownership = std::move(ownership);
     std::string name = std::string(kind) + '#' + std::to_string(entry->second.number);
     if (added) sweep();

@@ -59,12 +59,12 @@ platform::Value journalValueOfContent(Names& names, const std::optional<T>& valu
 template <class Names, HasObjectKind T>
 platform::Value journalValueOfContent(Names& names, const std::shared_ptr<T>& object, bool) {
   if (!object) return {};
-  return platform::Value(names.nameOfObject(kindOfObject(object.get()), object.get(), object));
+  return platform::Value(names.nameOfObject(kindOfObject(object.get()), wholeObject(object.get()), object));
 }
 template <class Names, HasObjectKind T>
 platform::Value journalValueOfContent(Names& names, const std::unique_ptr<T>& object, bool) {
   if (!object) return {};
-  return platform::Value(names.nameOfObject(kindOfObject(object.get()), object.get()));
+  return platform::Value(names.nameOfObject(kindOfObject(object.get()), wholeObject(object.get())));
 }
 template <class Names, class T>
 platform::Value journalValueOfContent(Names& names, const std::vector<T>& values, bool textIsBytes) {

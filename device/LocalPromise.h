@@ -44,7 +44,7 @@ class LocalPromise : public Interface {
 
  protected:
   Crossing crossing(const char* operation) const { return {_className, operation, appOfPromise(record->name)}; }
-  CallArgument self() const { return CallArgument::object("self", "promise", static_cast<const Interface*>(this)); }
+  CallArgument self() const { return CallArgument::object("self", "promise", wholeObject(this)); }
 
   InstallEngine& _engine;
   Boundary& _boundary;

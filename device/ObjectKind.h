@@ -1,5 +1,7 @@
 #pragma once
 
+#include <type_traits>
+
 namespace platform {
 class CLManager;
 class CVInstallOptions;
@@ -48,6 +50,16 @@ constexpr const char* kindOfObject(const platform::TSMutableAccountInfo*) { retu
 constexpr const char* kindOfObject(const platform::OBApplicationWorkspaceObserverProtocol*) { return "observer"; }
 constexpr const char* kindOfObject(const platform::OBApplicationProxy*) { return "proxy"; }
 constexpr const char* kindOfObject(const platform::OBBundleProxy*) { return "proxy"; }
+
+/// Where the object begins, whichever of its base classes it is seen as: the journal knows objects by this address.
+template <class T>
+const void* wholeObject(const T* object) {
+  if constexpr (std::is_polymorphic_v<T>) {
+    return dynamic_cast<const void*>(object);
+  } else {
+    return object;
+  }
+}
 
 template <class T>
 concept HasObjectKind = requires(const T* object) {

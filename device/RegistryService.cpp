@@ -21,7 +21,8 @@ void RegistryService::addObserver(std::weak_ptr<platform::OBApplicationWorkspace
 }
 
 void RegistryService::removeObserver(const platform::OBApplicationWorkspaceObserverProtocol* observer) {
-  _boundary.call({className, "removeObserver"}, nullptr, {CallArgument::object("observer", "observer", observer)},
+  _boundary.call({className, "removeObserver"}, nullptr,
+                 {CallArgument::object("observer", "observer", wholeObject(observer))},
                  [&] { _reports.removeObserver(observer); });
 }
 
