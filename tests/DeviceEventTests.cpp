@@ -22,46 +22,6 @@ void postInCall(Boundary& boundary, EventQueue& queue, Lane lane, EventQueue::Ev
   boundary.call({"RVPromise", "setComplete"}, nullptr, {}, [&] { queue.post(lane, std::move(event)); });
 }
 
-TEST(ManualEventQueue, deliversInTheOrderAskedFor) {
-  auto queue = makeManualEventQueue();
-  std::string order;
-  auto post = [&](Lane lane, const char* text) {
-    queue->post(lane, [&order, lane, text] {
-      order += text;
-      EXPECT_STREQ(currentThreadName(), nameOfLane(lane));
-    });
-  };
-  auto postAll = [&] {
-    post(Lane::registry, "r1");
-    post(Lane::coordination, "c1");
-    post(Lane::registry, "r2");
-    post(Lane::notification, "n1");
-  };
-  postAll();
-  EXPECT_EQ(queue->pending(), 4u);
-  EXPECT_TRUE(queue->deliverNext(Lane::coordination));
-  EXPECT_FALSE(queue->deliverNext(Lane::coordination));
-  EXPECT_EQ(queue->deliverAll(), 3u);
-  EXPECT_EQ(order, "c1r1r2n1");
-  order.clear();
-  std::vector<std::size_t> counts;
-  queue->setChooser([&](std::size_t count) {
-    counts.push_back(count);
-    return count - 1;
-  });
-  postAll();
-  queue->post(Lane::notification, [&] { post(Lane::coordination, "c2"); });
-  queue->drain();
-  EXPECT_EQ(order, "n1r1r2c1c2");
-  EXPECT_EQ(counts, (std::vector<std::size_t>{3, 3, 2, 2, 1, 1}));
-  EXPECT_STREQ(currentThreadName(), "daemon");
-  postAll();
-  queue->stop();
-  EXPECT_FALSE(queue->deliverNext());
-  post(Lane::registry, "late");
-  EXPECT_EQ(queue->pending(), 0u);
-}
-
 TEST(ManualEventQueue, letsTimePassOnlyWhenNothingElseHappens) {
   auto queue = makeManualEventQueue();
   auto& clock = queue->clock();
@@ -96,31 +56,6 @@ TEST(ManualEventQueue, letsTimePassOnlyWhenNothingElseHappens) {
   queue->deliverAll();
   EXPECT_EQ(order, "cwr");
   EXPECT_EQ(clock.now(), start + 5min + 1s);
-}
-
-TEST(ManualEventQueue, servesSeveralThreads) {
-  auto queue = makeManualEventQueue();
-  std::atomic<int> ran{0};
-  std::atomic<bool> inRegistry{false};
-  std::vector<std::thread> threads;
-  for (int i = 0; i < 4; ++i) {
-    threads.emplace_back([&, i] {
-      std::mutex mutex;
-      std::condition_variable changed;
-      for (int n = 0; n < 100; ++n) {
-        queue->post(Lane::registry, [&] {
-          EXPECT_FALSE(inRegistry.exchange(true)) << "two events of one lane at once";
-          ++ran;
-          inRegistry = false;
-        });
-        std::unique_lock lock(mutex);
-        if (i % 2) queue->clock().waitUntil(lock, changed, queue->clock().now() + 1s, [&] { return n % 3 == 0; });
-      }
-      queue->drain();
-    });
-  }
-  for (auto& thread : threads) thread.join();
-  EXPECT_EQ(ran, 400);
 }
 
 TEST(HeldEvents, areLetGoByTheNextCallButNotByAMessage) {

@@ -379,13 +379,6 @@ TEST(DiskFileTree, removesAnyDepthWithFewFilesOpen) {
   EXPECT_EQ(picture(*files), "");
 }
 
-TEST(DiskFileTree, needsItsFolder) {
-  Folder folder;
-  ErrorRef error;
-  EXPECT_EQ(openDiskFileTree(folder / "none", &error), nullptr);
-  EXPECT_EQ(error->code(), ENOENT);
-}
-
 class Stores : public testing::TestWithParam<Medium> {
  protected:
   std::unique_ptr<Store> open() {

@@ -1,18 +1,12 @@
 #include <gtest/gtest.h>
 
 #include <csignal>
-#include <cstdlib>
 #include <limits>
-#include <map>
 #include <thread>
 
-#include "device/BackupServiceLocal.h"
 #include "device/Boundary.h"
 #include "device/FileSystemService.h"
 #include "device/Journal.h"
-#include "device/LocalProcess.h"
-#include "device/PropertyListService.h"
-#include "device/RestrictionsService.h"
 #include "device/SystemLogService.h"
 #include "device/TSSupportService.h"
 #include "device/TransactionLogService.h"
@@ -315,60 +309,6 @@ TEST(FileSystemService, tellsOfFailuresNobodyLooksAt) {
             "createDirectory /d: injected at FileSystem.createDirectory\n"
             "copyItem /f: no reason given\n"
             "writeAtomically /none/f: No such file or directory\n");
-}
-
-TEST(SimpleServices, answerFromFilesAndSettings) {
-  auto files = makeMemoryFileTree();
-  Boundary boundary;
-  LocalProcess process(boundary, *files, "com.vantor.tsd");
-  EXPECT_EQ(process.mainBundleIdentifier(), "com.vantor.tsd");
-  bool isDirectory = false;
-  EXPECT_TRUE(files->fileExists(process.temporaryDirectory(), &isDirectory) && isDirectory);
-  EXPECT_EQ(process.textOfErrorNumber(ENOENT), "No such file or directory");
-  process.deallocateMemory(std::malloc(8), 8);
-
-  PropertyListService lists(boundary);
-  auto info = Value::makeDictionary();
-  info.dictionary()->set("KBBundleIdentifier", "a");
-  files->createDirectory("/A.app", false, {});
-  files->writeAtomically("/A.app/Info.plist",
-                         *lists.dataWithPropertyList(info, platform::PropertyListFormat::binary, nullptr));
-  EXPECT_EQ(process.infoDictionaryOfBundleAtPath("/A.app"), info);
-  files->writeAtomically("/A.app/Info.plist",
-                         *lists.dataWithPropertyList(Value::makeArray(), platform::PropertyListFormat::xml, nullptr));
-  EXPECT_TRUE(process.infoDictionaryOfBundleAtPath("/A.app").isAbsent());
-  EXPECT_TRUE(process.infoDictionaryOfBundleAtPath("/B.app").isAbsent());
-  ErrorRef error;
-  EXPECT_TRUE(lists.propertyListWithData("junk", &error).isAbsent());
-  EXPECT_NE(error, nullptr);
-
-  std::map<std::string, std::string, std::less<>> settings;
-  auto setting = [&](std::string_view key) { return settings[std::string(key)]; };
-  RestrictionsService restrictions(boundary, setting);
-  BackupServiceLocal backup(boundary, setting);
-  struct Row {
-    const char *value, *error;
-    int restriction;
-    bool wanted;
-    const char* reason;
-  };
-  for (Row row : {Row{"", "", 0, true, ""},
-                  {"allowed", "7:no disk", 1, false, "BackupService 7: no disk"},
-                  {"forbidden", "-8", 2, false, "BackupService -8"},
-                  {"odd", "broken", 0, false, "BackupService 1: broken"}}) {
-    settings["app-removal"] = row.value;
-    settings["backup-error"] = row.error;
-    EXPECT_EQ(restrictions.effectiveBoolValueForSetting(platform::DPFeatureAppRemovalAllowed), row.restriction);
-    EXPECT_EQ(restrictions.effectiveBoolValueForSetting(platform::DPFeatureAppInstallationAllowed), 0);
-    auto manager = backup.makeBackupManager();
-    EXPECT_EQ(manager->tessaroShouldCreateAppPlaceholders(&error), row.wanted);
-    EXPECT_EQ(error ? error->describe() : "", row.reason);
-  }
-  settings["backup-placeholders"] = "wanted";
-  EXPECT_TRUE(backup.makeBackupManager()->tessaroShouldCreateAppPlaceholders(&error));
-  EXPECT_NE(error, nullptr);
-  settings["backup-placeholders"] = "declined";
-  EXPECT_FALSE(backup.makeBackupManager()->tessaroShouldCreateAppPlaceholders(nullptr));
 }
 
 TEST(Logs, areWrittenAsLines) {
