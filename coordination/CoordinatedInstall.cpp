@@ -188,7 +188,7 @@ bool AppsClient::CoordinatedInstall::setMetadata() {
 
 void AppsClient::CoordinatedInstall::closeConfiguration() {
   ErrorRef error;
-  const bool closed = _placeholder->setConfigurationComplete(&error);
+  const bool closed = _placeholder->setConfigurationCompleteWithError(&error);
   note(error);
   if (closed) {
     say(_platform, "set placeholder configuration as complete for %{public}@", _bundleIdentifier);

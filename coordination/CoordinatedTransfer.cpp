@@ -10,7 +10,7 @@ bool AppsClient::updateTransferProgressForApp(const TSAssetRef& asset, bool exis
   const std::string& identifier = asset->identifier();
   auto coordinator = _initiatingOrUpdatingAppInstallCoordinatorForBundleIdentifier(identifier, existingApp, false);
   if (!coordinator || coordinator->error()) return false;
-  TransferPromiseRef promise = coordinator->appAssetPromise();
+  TransferPromiseRef promise = coordinator->appAssetPromiseWithError();
   if (promise && promise->isComplete()) {
     say(_platform, "Asset promise is already satisfied for %{public}@", identifier);
     return false;
@@ -33,7 +33,7 @@ void AppsClient::transferCompleteForApp(const TSAssetRef& asset, const ErrorRef&
                                  RVClientSync);
     return;
   }
-  TransferPromiseRef promise = coordinator->appAssetPromise();
+  TransferPromiseRef promise = coordinator->appAssetPromiseWithError();
   if (promise && promise->isComplete()) {
     say(_platform, "Asset promise is already satisfied for %{public}@", identifier);
     return;

@@ -19,8 +19,8 @@ class BackupServiceLocal::Manager final : public platform::CLManager {
  public:
   explicit Manager(BackupServiceLocal& service) : _service(service) {}
 
-  bool tessaroShouldCreateAppPlaceholders(ErrorRef* error) override {
-    return _service._boundary.call({"CLManager", "tessaroShouldCreateAppPlaceholders"}, error, {}, [&] {
+  bool tessaroShouldCreateAppPlaceholdersWithError(ErrorRef* error) override {
+    return _service._boundary.call({"CLManager", "tessaroShouldCreateAppPlaceholdersWithError"}, error, {}, [&] {
       ErrorRef reason = errorOfSetting(_service._setting("backup-error"));
       auto answer = _service._setting("backup-placeholders");
       bool wanted = answer.empty() ? reason == nullptr : answer == "wanted";

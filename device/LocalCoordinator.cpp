@@ -99,9 +99,10 @@ bool LocalCoordinator::hasUserDataPromise() {
   return holds("hasUserDataPromise", [](const auto& record) { return record.userData != nullptr; });
 }
 
-std::shared_ptr<platform::RVPromisedTransferToPath> LocalCoordinator::appAssetPromise(ErrorRef* error) {
+std::shared_ptr<platform::RVPromisedTransferToPath> LocalCoordinator::appAssetPromiseWithError(ErrorRef* error) {
   return _boundary.call(
-      {className, "appAssetPromise", app}, error, {}, [&]() -> std::shared_ptr<platform::RVPromisedTransferToPath> {
+      {className, "appAssetPromiseWithError", app}, error, {},
+      [&]() -> std::shared_ptr<platform::RVPromisedTransferToPath> {
         Lock lock(_engine.records().mutex);
         platform::setError(
             error,
@@ -176,8 +177,8 @@ bool LocalCoordinator::setInstallOptions(const std::shared_ptr<platform::CVInsta
   });
 }
 
-platform::RVClientIdentifier LocalCoordinator::appAssetPromiseResponsibleClient(ErrorRef* error) {
-  return _boundary.call({className, "appAssetPromiseResponsibleClient", app}, error, {}, [&] {
+platform::RVClientIdentifier LocalCoordinator::appAssetPromiseResponsibleClientWithError(ErrorRef* error) {
+  return _boundary.call({className, "appAssetPromiseResponsibleClientWithError", app}, error, {}, [&] {
     platform::setError(error, nullptr);
     Lock lock(_engine.records().mutex);
     return state.record.responsibleClient;

@@ -50,7 +50,7 @@ class LocalCoordinator final : public platform::RVAppInstallCoordinator,
   bool hasPlaceholderPromise() override;
   bool hasUserDataPromise() override;
 
-  std::shared_ptr<platform::RVPromisedTransferToPath> appAssetPromise(platform::ErrorRef* error) override;
+  std::shared_ptr<platform::RVPromisedTransferToPath> appAssetPromiseWithError(platform::ErrorRef* error) override;
   bool setAppAssetPromise(const std::shared_ptr<platform::RVPromisedTransferToPath>& promise,
                           platform::ErrorRef* error) override;
   bool setPlaceholderPromise(const std::shared_ptr<platform::RVPlaceholder>& placeholder,
@@ -62,7 +62,7 @@ class LocalCoordinator final : public platform::RVAppInstallCoordinator,
   bool setInstallOptions(const std::shared_ptr<platform::CVInstallOptions>& options,
                          platform::ErrorRef* error) override;
 
-  platform::RVClientIdentifier appAssetPromiseResponsibleClient(platform::ErrorRef* error) override;
+  platform::RVClientIdentifier appAssetPromiseResponsibleClientWithError(platform::ErrorRef* error) override;
   bool setAppAssetPromiseResponsibleClient(platform::RVClientIdentifier client, platform::ErrorRef* error) override;
 
   bool cancelForReason(const platform::ErrorRef& reason, platform::RVClientIdentifier client,

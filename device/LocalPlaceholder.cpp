@@ -98,8 +98,8 @@ bool LocalPlaceholder::setSinfData(platform::BytesView data, ErrorRef* error) {
       [&] { return change(error, [&](PlaceholderRecord& record, auto&) { record.rights = platform::Bytes(data); }); });
 }
 
-bool LocalPlaceholder::setConfigurationComplete(ErrorRef* error) {
-  return _boundary.call({className, "setConfigurationComplete", _app}, error, {}, [&] {
+bool LocalPlaceholder::setConfigurationCompleteWithError(ErrorRef* error) {
+  return _boundary.call({className, "setConfigurationCompleteWithError", _app}, error, {}, [&] {
     return change(error, [](PlaceholderRecord& record, auto&) { record.configured = true; });
   });
 }

@@ -26,7 +26,7 @@ class LocalPlaceholder final : public platform::RVPlaceholder {
   bool setPlaceholderAttributes(const std::shared_ptr<platform::RVPlaceholderAttributes>& attributes,
                                 platform::ErrorRef* error) override;
   bool setSinfData(platform::BytesView data, platform::ErrorRef* error) override;
-  bool setConfigurationComplete(platform::ErrorRef* error) override;
+  bool setConfigurationCompleteWithError(platform::ErrorRef* error) override;
   bool cancelForReason(const platform::ErrorRef& reason, platform::RVClientIdentifier client,
                        platform::ErrorRef* error) override;
   std::string describe() const override;

@@ -11,7 +11,7 @@ class CLManager {
  public:
   virtual ~CLManager() = default;
   /// Whether apps of a restored backup need placeholders. False may come with an error or without.
-  virtual bool tessaroShouldCreateAppPlaceholders(ErrorRef* error = nullptr) = 0;
+  virtual bool tessaroShouldCreateAppPlaceholdersWithError(ErrorRef* error = nullptr) = 0;
 };
 
 /// The backup service. Callable from any thread.

@@ -39,7 +39,7 @@ class RVAppInstallCoordinator {
   virtual bool hasUserDataPromise() = 0;
 
   /// Null when there is none; then an error says so.
-  virtual std::shared_ptr<RVPromisedTransferToPath> appAssetPromise(ErrorRef* error = nullptr) = 0;
+  virtual std::shared_ptr<RVPromisedTransferToPath> appAssetPromiseWithError(ErrorRef* error = nullptr) = 0;
   virtual bool setAppAssetPromise(const std::shared_ptr<RVPromisedTransferToPath>& promise,
                                   ErrorRef* error = nullptr) = 0;
   /// From here on the app shows on the home screen. Null is refused with an error.
@@ -51,7 +51,7 @@ class RVAppInstallCoordinator {
   virtual bool setInstallOptions(const std::shared_ptr<CVInstallOptions>& options, ErrorRef* error = nullptr) = 0;
 
   /// Who delivers the package; 0 when nobody was named.
-  virtual RVClientIdentifier appAssetPromiseResponsibleClient(ErrorRef* error = nullptr) = 0;
+  virtual RVClientIdentifier appAssetPromiseResponsibleClientWithError(ErrorRef* error = nullptr) = 0;
   virtual bool setAppAssetPromiseResponsibleClient(RVClientIdentifier client, ErrorRef* error = nullptr) = 0;
 
   /// Ends the coordinator; the service reports the cancellation to observers later.

@@ -39,7 +39,7 @@ class RVPlaceholder {
   /// The store's rights data of the app, opaque bytes.
   virtual bool setSinfData(BytesView data, ErrorRef* error = nullptr) = 0;
   /// Nothing can be changed afterwards.
-  virtual bool setConfigurationComplete(ErrorRef* error = nullptr) = 0;
+  virtual bool setConfigurationCompleteWithError(ErrorRef* error = nullptr) = 0;
   virtual bool cancelForReason(const ErrorRef& reason, RVClientIdentifier client, ErrorRef* error = nullptr) = 0;
 
   virtual std::string describe() const = 0;

@@ -88,7 +88,7 @@ bool AppsClient::CoordinatedRestore::acquire(RVCoordinatorKind kind) {
 
 /// An earlier run of this restore handed the app over already.
 bool AppsClient::CoordinatedRestore::storeDeliversPackage() {
-  const RVClientIdentifier client = _coordinator->appAssetPromiseResponsibleClient();
+  const RVClientIdentifier client = _coordinator->appAssetPromiseResponsibleClientWithError();
   if (client != RVClientMercato) return false;
   say(_platform, "App asset DRI for %{public}@ is set to %lu - nothing more for tsd to do", _bundleIdentifier, client);
   return true;

@@ -62,7 +62,7 @@ bool AppsClient::reconcileRestoreOfType(std::int32_t type, ErrorRef* error) try 
   _platform.fileSystem.createDirectory(pluginDirectory, true, {});
   ErrorRef backupError;
   if (createsPlaceholders(type)) {
-    if (_backupManager && _backupManager->tessaroShouldCreateAppPlaceholders(&backupError)) {
+    if (_backupManager && _backupManager->tessaroShouldCreateAppPlaceholdersWithError(&backupError)) {
       _processHarluneRestoreInfo();
     } else {
       say(_platform, "Will not reconcile restore of type %d - error %{public}@", type, backupError);

@@ -77,7 +77,7 @@ bool setSinfData(const Platform& platform, RVPlaceholder& placeholder, std::opti
 
 bool closeConfiguration(const Platform& platform, RVPlaceholder& placeholder, std::string_view bundleIdentifier) {
   ErrorRef error;
-  if (!placeholder.setConfigurationComplete(&error)) {
+  if (!placeholder.setConfigurationCompleteWithError(&error)) {
     sayError(platform, "Error %{public}@ setting placeholder configuration as complete for '%{public}@'", error,
              bundleIdentifier);
     return false;

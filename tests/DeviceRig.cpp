@@ -156,7 +156,7 @@ std::shared_ptr<platform::RVPlaceholder> DeviceRig::placeholder(const std::strin
   EXPECT_TRUE(result->setPlaceholderAttributes(attributes));
   EXPECT_TRUE(result->setMetadata(platform().installer.makeStoreMetadata(dictionaryOf({{"vantorId", "placeholder"}}))));
   if (configured) {
-    EXPECT_TRUE(result->setConfigurationComplete());
+    EXPECT_TRUE(result->setConfigurationCompleteWithError());
   }
   return result;
 }

@@ -65,7 +65,7 @@ TEST_P(DeviceServices, WhatACoordinatorRefuses) {
   auto coordinator = this->coordinator(Kind::RVInitiatingAppInstallCoordinator);
   auto refused = [](bool result, const ErrorRef& error) { return !result && error; };
   ErrorRef error;
-  EXPECT_FALSE(coordinator->appAssetPromise(&error));
+  EXPECT_FALSE(coordinator->appAssetPromiseWithError(&error));
   EXPECT_TRUE(error);
   EXPECT_TRUE(refused(coordinator->setPlaceholderPromise(nullptr, &error), error));
   EXPECT_TRUE(refused(coordinator->setPlaceholderPromise(placeholder(notes), &error), error));
@@ -84,7 +84,7 @@ TEST_P(DeviceServices, WhatACoordinatorRefuses) {
   EXPECT_TRUE(coordinator->setInitialZDRAssetPromises({}));
   EXPECT_TRUE(coordinator->hasInitialZDRAssetPromises());
   auto promise = this->promise(coordinator);
-  EXPECT_EQ(coordinator->appAssetPromise(), promise);
+  EXPECT_EQ(coordinator->appAssetPromiseWithError(), promise);
   EXPECT_TRUE(refused(coordinator->setAppAssetPromise(promise, &error), error));
   // An install does not outlive its package's promise, and a promise kept afterwards comes to nothing.
   EXPECT_TRUE(promise->cancelForReason(platform::makeError("TSError", 30), 3));

@@ -283,7 +283,7 @@ class SyncModel {
 
   /// The promise of the package; another one cannot be attached.
   bool hasPromise(const std::string& id) {
-    if (!fails("appAssetPromise", id)) return true;
+    if (!fails("appAssetPromiseWithError", id)) return true;
     _outcome.cancelled.push_back("promise " + id + " TSError 30");
     return false;
   }
@@ -394,11 +394,11 @@ class RestoreModel {
     bool unmanaged = _plan.next("makeBackupManager", "");
     _plan.enter("reconcileRestoreOfType");
     bool asked = _scenario.type == 2 || _scenario.type == 3;
-    bool unasked = asked && fails("tessaroShouldCreateAppPlaceholders");
+    bool unasked = asked && fails("tessaroShouldCreateAppPlaceholdersWithError");
     bool errs = hasSetting("backup-error", "yes");
     bool declines = unmanaged || unasked || errs || hasSetting("backup-placeholders", "no");
-    bool agreesWithError =
-        std::count(_scenario.rules.begin(), _scenario.rules.end(), "tessaroShouldCreateAppPlaceholders=error") != 0;
+    bool agreesWithError = std::count(_scenario.rules.begin(), _scenario.rules.end(),
+                                      "tessaroShouldCreateAppPlaceholdersWithError=error") != 0;
     if (asked && errs) _outcome.error = "BackupService";
     if (unasked || agreesWithError) _outcome.error = "Injection";
     if (asked && !declines && _scenario.hasList && !_plan.next("fileExists", "", restoreListPath)) {
@@ -478,7 +478,7 @@ class RestoreModel {
     }
     if (fails("makePlaceholderAttributes") || fails("setPlaceholderAttributes", app.id) ||
         fails("setMetadata", app.id) || (app.hasRights && fails("setSinfData", app.id)) ||
-        fails("setConfigurationComplete", app.id)) {
+        fails("setConfigurationCompleteWithError", app.id)) {
       return cancel("placeholder", app), false;
     }
     return true;

@@ -26,7 +26,7 @@ Lines preparation(const std::string& app, int status, const std::string& name, c
                      app + "' with install coordination",
                  "step 2/1/1 y " + app + step,
                  "coordinatorForAppWithBundleID(" + kind + ", " + app + ", 3, 1) = coordinator#*"};
-  if (status == 0) lines.push_back("appAssetPromiseResponsibleClient() = 0");
+  if (status == 0) lines.push_back("appAssetPromiseResponsibleClientWithError() = 0");
   Lines rest = {"setObserver(observer#*)",
                 "hasUserDataPromise() = 0",
                 "makePromisedOutOfBandTransfer(" + app + "-UserData, 3, 0) = promise#*",
@@ -56,7 +56,7 @@ Lines preparation(const std::string& app, int status, const std::string& name, c
                 "set store metadata on placeholder for " + app,
                 "setSinfData(6) = 1",
                 "set SINF data on placeholder for " + app,
-                "setConfigurationComplete() = 1",
+                "setConfigurationCompleteWithError() = 1",
                 "set placeholder configuration complete for " + app,
                 "setPlaceholderPromise(placeholder#*) = 1",
                 "Shiftwell will wait for RC to install placeholder for " + app + ", _restoringPlaceholderCount *",
@@ -145,7 +145,7 @@ TEST(Restore, WhatIsAskedAndWhatIsThere) {
        .says = {"Will not reconcile restore of type 3 - error BackupService *"}},
       {.given = {.name = "agrees with an error",
                  .apps = {{.id = "app.a"}},
-                 .rules = {"tessaroShouldCreateAppPlaceholders=error"}},
+                 .rules = {"tessaroShouldCreateAppPlaceholdersWithError=error"}},
        .outcome = one + "error Injection; "},
       {.given = {.name = "no list", .apps = {{.id = "app.a"}}, .hasList = false},
        .outcome = "waited 0; ",
@@ -324,7 +324,7 @@ TEST(Restore, WhatFailsCancelsWhatWasMade) {
        {"E Error " + error + " setting placeholder attributes for 'app.a'", gaveUp[0]}},
       {"RVPlaceholder.setMetadata", both, {"E Error " + error + " setting store metadata for 'app.a'", gaveUp[0]}},
       {"RVPlaceholder.setSinfData", both, {"E Error " + error + " setting SINF data for 'app.a'", gaveUp[0]}},
-      {"RVPlaceholder.setConfigurationComplete",
+      {"RVPlaceholder.setConfigurationCompleteWithError",
        both,
        {"E Error " + error + " setting placeholder configuration as complete for 'app.a'", gaveUp[0]}},
       {"RVAppInstallCoordinator.setPlaceholderPromise",

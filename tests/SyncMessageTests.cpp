@@ -111,7 +111,7 @@ Lines preparation(const std::string& opening, const char* kind, int existing) {
                "set <*> attributes on placeholder for app.a",
                "setMetadata(metadata#1) = 1",
                "set store metadata on placeholder for app.a",
-               "setConfigurationComplete() = 1",
+               "setConfigurationCompleteWithError() = 1",
                "set placeholder configuration as complete for app.a",
                "setPlaceholderPromise(placeholder#1) = 1",
                "added placeholder promise to coordinator for app.a",
@@ -219,8 +219,8 @@ TEST(SyncMessages, WhatFailsInAPreparationIsTold) {
        {"setMetadata*"}},
       {"setMetadata",
        Lines{"E Error " + error + " setting store metadata on placeholder for 'app.a'"} + attachedAnyway,
-       {"setConfigurationComplete*"}},
-      {"setConfigurationComplete",
+       {"setConfigurationCompleteWithError*"}},
+      {"setConfigurationCompleteWithError",
        Lines{"E Error " + error + " setting placeholder configuration as complete for 'app.a'"} + attachedAnyway},
       {"setPlaceholderPromise",
        {"E Error " + error + " adding placeholder promise to coordinator for 'app.a'", ends,
@@ -281,7 +281,7 @@ TEST(SyncMessages, ProgressAndPackageReachThePromise) {
   auto asset = request(rig, oneUpdate)[0];
   asset->setInstallProgress(0.125f);
   rig.progress(asset, 0.5);
-  const Lines promise = {"error()", "appAssetPromise() = promise#1", "isComplete() = 0"};
+  const Lines promise = {"error()", "appAssetPromiseWithError() = promise#1", "isComplete() = 0"};
   EXPECT_TRUE(exactly(rig.traceIn("assetTransferUpdatedProgress", "app.a"),
                       Lines{"finished transferring 0.500000 for app.a"} + lookUp("updating", 1, 0) + promise +
                           Lines{"Updating download progress: 0.500000 install progress:0.125000 for app.a",
@@ -327,7 +327,7 @@ TEST(SyncMessages, ACoordinatorInErrorIsLeft) {
   auto asset = request(rig, oneApp)[0];
   rig.progress(asset, 0.5);
   rig.transferEnded(asset, true);
-  EXPECT_EQ(rig.countOf("appAssetPromise"), 0u);
+  EXPECT_EQ(rig.countOf("appAssetPromiseWithError"), 0u);
   EXPECT_TRUE(inOrder(rig.messages(), {"coordinatorDidInstallPlaceholder for app.a with error Injection 1: *"}));
 }
 
