@@ -230,6 +230,9 @@ TEST(SyncMessages, WhatFailsInAPreparationIsTold) {
       {"copyItem",
        Lines{"Copied icon from * to * with error " + error + " for 'app.a', sizeOnDisk:0"} + noIcon,
        {"icon for app.a*", "setIconPromise*"}},
+      {"copyItem=error",
+       {"Copied icon from * to * with error " + error + " for 'app.a', sizeOnDisk:*", "setIconPromise(*",
+        "processing app install for bundle app.a finished with status 1 error " + error}},
       {"attributesOfItem",
        Lines{"icon for app.a at * has a size of 0",
              "Copied icon from * to * with error " + error + " for 'app.a', sizeOnDisk:0"} +
