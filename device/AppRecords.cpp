@@ -120,7 +120,7 @@ void ChangeSet::put(const CoordinatorRecord& coordinator) {
 }
 void ChangeSet::removeCoordinator(std::string_view app) { add({"coordinator", std::string(app), {}}, nullptr); }
 
-void ChangeSet::setOutcome(std::string_view app, OutcomeRecord outcome) {
+void ChangeSet::setOutcome(std::string_view app, const OutcomeRecord& outcome) {
   add({"outcome", std::string(app), valueOfOutcome(outcome)},
       [app = std::string(app), outcome](DeviceState& state) { state.outcomes.insert_or_assign(app, outcome); });
 }
@@ -204,8 +204,8 @@ bool AppRecords::take(const StoreRecord& record, Loaded& loaded) {
   return true;
 }
 
-bool AppRecords::commit(ChangeSet changes, platform::ErrorRef* error) { return keep(&Store::commit, changes, error); }
-bool AppRecords::write(ChangeSet changes, platform::ErrorRef* error) { return keep(&Store::write, changes, error); }
+bool AppRecords::commit(ChangeSet&& changes, platform::ErrorRef* error) { return keep(&Store::commit, changes, error); }
+bool AppRecords::write(ChangeSet&& changes, platform::ErrorRef* error) { return keep(&Store::write, changes, error); }
 
 bool AppRecords::keep(Keep keep, const ChangeSet& changes, platform::ErrorRef* error) {
   auto records = _later;
@@ -219,7 +219,7 @@ bool AppRecords::keep(Keep keep, const ChangeSet& changes, platform::ErrorRef* e
   return true;
 }
 
-void AppRecords::commitLater(ChangeSet changes) {
+void AppRecords::commitLater(ChangeSet&& changes) {
   for (const auto& step : changes._steps) {
     step.encode(_state, _later);
     if (step.apply) step.apply(_state);

@@ -90,7 +90,7 @@ class ChangeSet {
   void removeApp(std::string_view id);
   void put(const CoordinatorRecord& coordinator);
   void removeCoordinator(std::string_view app);
-  void setOutcome(std::string_view app, OutcomeRecord outcome);
+  void setOutcome(std::string_view app, const OutcomeRecord& outcome);
   void removeOutcome(std::string_view app);
   void addUninstalled(std::string_view app, const platform::Value& facts);
   void removeUninstalled(std::string_view app);
@@ -133,12 +133,12 @@ class AppRecords {
   std::optional<Loaded> load(platform::ErrorRef* error = nullptr) EXCLUDES(mutex);
 
   /// All of it or, with an error, nothing of it; durable on true.
-  bool commit(ChangeSet changes, platform::ErrorRef* error = nullptr) REQUIRES(mutex);
+  bool commit(ChangeSet&& changes, platform::ErrorRef* error = nullptr) REQUIRES(mutex);
   /// The same for what a loss of power may take back, though not the death of the process: nothing that was on disk is
   /// removed because of it.
-  bool write(ChangeSet changes, platform::ErrorRef* error = nullptr) REQUIRES(mutex);
+  bool write(ChangeSet&& changes, platform::ErrorRef* error = nullptr) REQUIRES(mutex);
   /// In memory at once, in the store with the next commit: what may be lost with the process.
-  void commitLater(ChangeSet changes) REQUIRES(mutex);
+  void commitLater(ChangeSet&& changes) REQUIRES(mutex);
   /// Writes what `commitLater` kept back.
   void flush() EXCLUDES(mutex);
   /// How far a transfer has come. In memory only; goes to the store with the app's next change.

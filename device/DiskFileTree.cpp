@@ -269,8 +269,9 @@ std::optional<std::vector<FileTree::Entry>> DiskFileTree::list(std::string_view 
   for (auto& name : names) {
     struct stat status;
     if (::fstatat(directory.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) continue;  // gone again
-    if (S_ISDIR(status.st_mode)) entries.push_back({std::move(name), true, 0});
-    if (S_ISREG(status.st_mode))
+    if (S_ISDIR(status.st_mode))
+      entries.push_back({std::move(name), true, 0});
+    else if (S_ISREG(status.st_mode))
       entries.push_back({std::move(name), false, static_cast<std::uint64_t>(status.st_size)});
   }
   return entries;

@@ -228,7 +228,7 @@ bool InstallEngine::putPlaceholder(const CoordinatorRef& coordinator, const Plac
   if (isInstalled == written.has_value())
     return fail(error, coordinationError(CoordinationError::invalid,
                                          coordinator->app + " was installed or removed by somebody else meanwhile"));
-  auto app = written ? std::move(*written) : *existing;
+  auto app = written ? *written : *existing;
   std::string superfluous;
   if (existing && existing->isPlaceholder) {
     superfluous = existing->container;

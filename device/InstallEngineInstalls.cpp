@@ -228,7 +228,7 @@ bool InstallEngine::beginStoreInstall(std::string_view id, const StoreInstall& i
   const auto* existing = _records.state().app(app);
   if (!existing && !written)
     return fail(error, localDeviceError(LocalDeviceError::noSuchApp, app + " was removed meanwhile"));
-  auto record = existing ? *existing : std::move(*written);
+  auto record = existing ? *existing : *written;
   record.installType = install.installType;
   record.applicationType = install.applicationType;
   record.systemBundle = install.systemBundle;

@@ -14,7 +14,7 @@ std::vector<std::string> identifiers(const Proxies& proxies) {
 
 }  // namespace
 
-void RegistryReports::addObserver(std::weak_ptr<Observer> observer) {
+void RegistryReports::addObserver(const std::weak_ptr<Observer>& observer) {
   auto alive = observer.lock();
   if (!alive) return;
   _observers.add(observer);

@@ -25,7 +25,7 @@ class RegistryReports {
   RegistryReports(AppRecords& records, Boundary& boundary, EventQueue& events, Changed changed)
       : _records(records), _boundary(boundary), _events(events), _changed(std::move(changed)) {}
 
-  void addObserver(std::weak_ptr<Observer> observer);
+  void addObserver(const std::weak_ptr<Observer>& observer);
   void removeObserver(const Observer* observer) { _observers.remove(observer); }
 
   /// An install began, ended, was paused or came into another phase: observers get what runs and what is paused as it

@@ -12,7 +12,8 @@ constexpr std::uint8_t space = 64, padding = 65, invalid = 66;
 constexpr std::array<std::uint8_t, 256> meanings = [] {
   std::array<std::uint8_t, 256> table{};
   table.fill(invalid);
-  for (std::uint8_t bits = 0; bits < alphabet.size(); ++bits) table[static_cast<unsigned char>(alphabet[bits])] = bits;
+  for (std::size_t bits = 0; bits < alphabet.size(); ++bits)
+    table[static_cast<unsigned char>(alphabet[bits])] = static_cast<std::uint8_t>(bits);
   for (unsigned char blank : {' ', '\t', '\r', '\n'}) table[blank] = space;
   table['='] = padding;
   return table;
