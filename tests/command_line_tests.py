@@ -37,6 +37,8 @@ COMMAND_LINES = [
     Row("--help", DONE, r"Subcommands:(.|\n)*sample(.|\n)*Exit codes:"),
     Row("--version", DONE, r"^tsd \d+\.\d+\.\d+$"),
     Row("sync --help", DONE, r"--asset(.|\n)*--end-phase(.|\n)*--inject"),
+    Row("completion tcsh", USAGE, err=says("tcsh")),
+    Row("manual file", FAILED, err=says("file: ")),
     # Command lines that make no sense.
     Row("", USAGE, err=says("subcommand")),
     Row("frobnicate dev", USAGE, err=says("there is no subcommand 'frobnicate'")),
@@ -337,6 +339,59 @@ class Syncs(Folder):
         os.remove("host/ApplicationsSync.plist")
         reports = self.sync("dev", "host", "--repeat", "2")["runs"]
         self.assertEqual([report["deleted"] for report in reports], [[apps[0]], []])
+
+
+class Shells(Folder):
+    """What is made of the options besides the help: completions and manual pages."""
+
+    def test_completion_in_bash(self):
+        # Words as bash splits them at "=", the last one up to the cursor; what it offers.
+        table = [
+            ("sy", "sync"),
+            ("sync --pr", "--progress"),
+            ("sync --progress ", "auto,plain,tty,none"),
+            ("sync --progress = t", "tty"),
+            ("set d app-removal =", "allowed,forbidden"),
+            ("set d app-removal = forbidden icon", "icon-size="),
+            ("query a", "a folder"),
+            ("query d --json m", "metrics"),
+            ("query d metrics m", ""),
+            ("sync d a", "a folder"),
+            ("sync d --log a", "a folder,a file"),
+            ("sync --transfers ", ""),
+            ("nothing a", ""),
+        ]
+        os.mkdir("a folder")
+        pathlib.Path("a file").touch()
+        pathlib.Path("completion").write_text(self.tsd("completion", "bash").stdout)
+        ask = """source completion; COMP_WORDS=(tsd "$@"); COMP_CWORD=$#; _tsd; IFS=,; echo "${COMPREPLY[*]}" """
+        for line, offered in table:
+            with self.subTest(line):
+                run = subprocess.run(["bash", "-uc", ask, "bash", *line.split(" ")], capture_output=True, text=True)
+                self.assertEqual(run.stderr, "")
+                self.assertEqual(set(run.stdout.strip().split(",")), set(offered.split(",")))
+
+    def test_completions_of_other_shells_can_be_read(self):
+        for shell in filter(shutil.which, ["bash", "zsh", "fish"]):
+            pathlib.Path(shell).write_text(self.tsd("completion", shell).stdout)
+            run = subprocess.run([shell, "-n", shell], capture_output=True, text=True)
+            self.assertEqual((run.returncode, run.stderr), (0, ""))
+
+    def test_manual_pages(self):
+        self.tsd("manual", "pages")
+        help_text = self.tsd("--help").stdout.split("Subcommands:")[1].split("Exit codes")[0]
+        names = re.findall(r"^  (\w+)", help_text, re.MULTILINE)
+        self.assertEqual(sorted(os.listdir("pages")), sorted(["tsd.1", *[f"tsd-{name}.1" for name in names]]))
+        for page in sorted(os.listdir("pages")):
+            with self.subTest(page):
+                run = subprocess.run(["groff", "-ww", "-man", "-Tascii", "-P-cbou", f"pages/{page}"], capture_output=True,
+                                     text=True)
+                self.assertEqual((run.returncode, run.stderr), (0, ""))
+                shown = re.findall(r"^ +(?:-\w, ?)?(--[-\w]+)", run.stdout, re.MULTILINE)
+                command = page[4:-2]
+                if command:
+                    known = re.findall(r"^  (?:-\w,)?(--[-\w]+)", self.tsd(command, "--help").stdout, re.MULTILINE)
+                    self.assertEqual(sorted(shown), sorted(known))
 
 
 class Restores(Folder):

@@ -11,6 +11,7 @@
 #include "tsd/CommonOptions.h"
 #include "tsd/Console.h"
 #include "tsd/ExitCode.h"
+#include "tsd/OptionTable.h"
 
 namespace tsd {
 
@@ -83,5 +84,15 @@ struct StoreOptions {
   device::StoreInstall install;
 };
 ExitCode runStore(const CommandContext& context, const StoreOptions& options);
+
+struct CompletionOptions {
+  std::string shell;  // "bash", "zsh" or "fish"
+};
+ExitCode runCompletion(const CommandContext& context, const OptionTable& table, const CompletionOptions& options);
+
+struct ManualOptions {
+  std::string folder;
+};
+ExitCode runManual(const CommandContext& context, const OptionTable& table, const ManualOptions& options);
 
 }  // namespace tsd

@@ -14,6 +14,7 @@
 
 #include "tsd/CommandError.h"
 #include "tsd/Commands.h"
+#include "tsd/OptionTable.h"
 #include "tsd/Output.h"
 
 namespace tsd {
@@ -24,6 +25,8 @@ struct Invocation {
   CommonOptions common;
   std::vector<std::string> rules;
   std::function<ExitCode(const CommandContext&)> run;
+  /// The values of the options that take a few only; the parser does not tell them.
+  std::map<const CLI::Option*, std::vector<std::string>> words;
 };
 
 const std::map<std::string, ProgressMode> progressModes{{"auto", ProgressMode::automatic},
@@ -31,9 +34,21 @@ const std::map<std::string, ProgressMode> progressModes{{"auto", ProgressMode::a
                                                         {"tty", ProgressMode::tty},
                                                         {"none", ProgressMode::none}};
 
-/// For the right column of a help text on a terminal of 80 columns.
-std::string wrapped(const std::string& text) {
-  constexpr std::size_t width = 50;
+constexpr const char* commonGroup = "Common";
+constexpr const char* version = "1.0.0";
+
+const std::vector<ExitCodeEntry> exitCodes{
+    {ExitCode::done, "done"},
+    {ExitCode::failed, "failed"},
+    {ExitCode::usage, "usage"},
+    {ExitCode::someFailed, "some apps failed"},
+    {ExitCode::cancelled, "cancelled by a signal"},
+    {ExitCode::deadline, "a deadline passed"},
+    {ExitCode::busy, "the device is in use"},
+};
+
+/// In lines for the right column of a help text on a terminal of 80 columns, or of another width.
+std::string wrapped(const std::string& text, std::size_t width = 50) {
   std::string result;
   std::size_t lineLength = 0;
   for (std::size_t start = 0; start < text.size();) {
@@ -53,33 +68,42 @@ std::string wrapped(const std::string& text) {
   return result;
 }
 
+/// Lets the option take these values only.
+CLI::Option* takeOneOf(Invocation& invocation, CLI::Option* option, const std::vector<std::string>& words) {
+  invocation.words[option] = words;
+  return option->check(CLI::IsMember(words).description(""));
+}
+
+void addCommonOptions(CLI::App* command, Invocation& invocation) {
+  CommonOptions& common = invocation.common;
+  command->add_flag("--json", common.json, wrapped("One JSON document on standard output, errors included"))
+      ->group(commonGroup);
+  auto* progress = command->add_option_function<std::string>(
+      "--progress", [&common](const std::string& mode) { common.progress = progressModes.at(mode); },
+      "How progress is shown: auto, plain, tty or none");
+  takeOneOf(invocation, progress, {"auto", "plain", "tty", "none"})->option_text("MODE")->group(commonGroup);
+  command->add_option("--log", common.log, "Write the system log to this file")
+      ->option_text("FILE")
+      ->group(commonGroup);
+  command->add_option("--calls", common.calls, "Write the journal of all calls to this file")
+      ->option_text("FILE")
+      ->group(commonGroup);
+  command->add_option("--inject", invocation.rules, "Inject a fault: POINT[:APP][@N]=ACTION (repeatable)")
+      ->option_text("RULE")
+      ->expected(1)
+      ->take_all()
+      ->group(commonGroup);
+  command->add_option("--plugin", common.plugin, wrapped("The plug-in's file; by default the one beside this program"))
+      ->option_text("FILE")
+      ->group(commonGroup);
+}
+
 /// Adds a subcommand with the common options; `run` gets `options` as they were parsed.
 template <class Options>
 CLI::App* addCommand(CLI::App& program, Invocation& invocation, const char* name, const char* description,
                      ExitCode (*run)(const CommandContext&, const Options&), const std::shared_ptr<Options>& options) {
   CLI::App* command = program.add_subcommand(name, description);
-  CommonOptions& common = invocation.common;
-  command->add_flag("--json", common.json, wrapped("One JSON document on standard output, errors included"))
-      ->group("Common");
-  command
-      ->add_option_function<std::string>(
-          "--progress", [&common](const std::string& mode) { common.progress = progressModes.at(mode); },
-          "How progress is shown: auto, plain, tty or none")
-      ->check(CLI::IsMember({"auto", "plain", "tty", "none"}).description(""))
-      ->option_text("MODE")
-      ->group("Common");
-  command->add_option("--log", common.log, "Write the system log to this file")->option_text("FILE")->group("Common");
-  command->add_option("--calls", common.calls, "Write the journal of all calls to this file")
-      ->option_text("FILE")
-      ->group("Common");
-  command->add_option("--inject", invocation.rules, "Inject a fault: POINT[:APP][@N]=ACTION (repeatable)")
-      ->option_text("RULE")
-      ->expected(1)
-      ->take_all()
-      ->group("Common");
-  command->add_option("--plugin", common.plugin, wrapped("The plug-in's file; by default the one beside this program"))
-      ->option_text("FILE")
-      ->group("Common");
+  addCommonOptions(command, invocation);
   command->callback([&invocation, name, run, options] {
     invocation.common.command = name;
     invocation.run = [run, options](const CommandContext& context) { return run(context, *options); };
@@ -157,12 +181,10 @@ void addSync(CLI::App& program, Invocation& invocation) {
       ->option_text("TEXT")
       ->expected(1)
       ->take_all();
-  command
-      ->add_option_function<std::string>(
-          "--end-phase", [options](const std::string& text) { options->endPhase = text == "success"; },
-          wrapped("What the transfer phase is said to have ended with, whatever happened"))
-      ->option_text("success|failed")
-      ->check(CLI::IsMember({"success", "failed"}).description(""));
+  auto* endPhase = command->add_option_function<std::string>(
+      "--end-phase", [options](const std::string& text) { options->endPhase = text == "success"; },
+      wrapped("What the transfer phase is said to have ended with, whatever happened"));
+  takeOneOf(invocation, endPhase, {"success", "failed"})->option_text("success|failed");
   command->add_flag("--daemon-reports", options->daemonReports,
                     wrapped("Report the installs' outcomes to the plug-in as well"));
   addNumber<std::size_t>(command, "--repeat", options->repeat, "Syncs in a row, with one plug-in object (1)", 1,
@@ -185,23 +207,38 @@ void addQuery(CLI::App& program, Invocation& invocation) {
   auto options = std::make_shared<QueryOptions>();
   auto* command = addCommand(program, invocation, "query", "Ask the plug-in a question", runQuery, options);
   addDevice(command, options->device);
-  command->add_option("QUESTION", options->question, "metrics, accounts, vantor-ids or disabled-asset-types")
+  auto* question =
+      command->add_option("QUESTION", options->question, "metrics, accounts, vantor-ids or disabled-asset-types");
+  takeOneOf(invocation, question, {"metrics", "accounts", "vantor-ids", "disabled-asset-types"})
       ->required()
-      ->option_text(" ")
-      ->check(CLI::IsMember({"metrics", "accounts", "vantor-ids", "disabled-asset-types"}).description(""));
+      ->option_text(" ");
 }
 
 void addSet(CLI::App& program, Invocation& invocation) {
   auto options = std::make_shared<SetOptions>();
   auto* command = addCommand(program, invocation, "set", "Change settings of a device", runSet, options);
   addDevice(command, options->device);
-  command
-      ->add_option("KEY=VALUE", options->settings,
-                   wrapped("app-installation, app-removal = allowed or forbidden; icon-size = 16 to 1024; "
-                           "backup-placeholders, device-service-prioritize, device-service-cancel = yes or no; "
-                           "backup-error = no or yes"))
-      ->required()
-      ->option_text("...");
+  auto* settings =
+      command
+          ->add_option("KEY=VALUE", options->settings,
+                       wrapped("app-installation, app-removal = allowed or forbidden; icon-size = 16 to 1024; "
+                               "backup-placeholders, device-service-prioritize, device-service-cancel = yes or no; "
+                               "backup-error = no or yes"))
+          ->required()
+          ->option_text("...");
+  invocation.words[settings] = {"app-installation=allowed",
+                                "app-installation=forbidden",
+                                "app-removal=allowed",
+                                "app-removal=forbidden",
+                                "icon-size=",
+                                "backup-placeholders=yes",
+                                "backup-placeholders=no",
+                                "backup-error=yes",
+                                "backup-error=no",
+                                "device-service-prioritize=yes",
+                                "device-service-prioritize=no",
+                                "device-service-cancel=yes",
+                                "device-service-cancel=no"};
 }
 
 void addUninstall(CLI::App& program, Invocation& invocation) {
@@ -236,12 +273,84 @@ void addStore(CLI::App& program, Invocation& invocation) {
       "--no-coordinator", [&install] { install.createsCoordinator = false; }, "Without a coordinator");
 }
 
+/// On one line again.
+std::string unwrapped(std::string text) {
+  std::replace(text.begin(), text.end(), '\n', ' ');
+  return text;
+}
+
+OptionEntry entryOf(const CLI::Option& option, const Invocation& invocation) {
+  OptionEntry entry;
+  entry.isArgument = option.get_positional();
+  if (entry.isArgument) {
+    entry.names = {option.get_name(true)};
+    entry.value = entry.names.front();
+  } else {
+    for (const auto& name : option.get_snames()) entry.names.push_back("-" + name);
+    for (const auto& name : option.get_lnames()) entry.names.push_back("--" + name);
+    if (option.get_items_expected_max() > 0) entry.value = option.get_option_text();
+  }
+  entry.description = unwrapped(option.get_description());
+  auto words = invocation.words.find(&option);
+  if (words != invocation.words.end()) entry.words = words->second;
+  entry.isRequired = option.get_required();
+  entry.isRepeatable =
+      option.get_expected_max() > 1 || option.get_multi_option_policy() == CLI::MultiOptionPolicy::TakeAll;
+  entry.isCommon = option.get_group() == commonGroup;
+  return entry;
+}
+
+OptionTable tableOf(const CLI::App& program, const Invocation& invocation) {
+  OptionTable table{program.get_name(), version, program.get_description(), exitCodes, {}};
+  for (const auto* command : program.get_subcommands({})) {
+    CommandEntry entry{command->get_name(), command->get_description(), {}};
+    for (const auto* option : command->get_options()) entry.options.push_back(entryOf(*option, invocation));
+    table.commands.push_back(std::move(entry));
+  }
+  return table;
+}
+
+/// Adds a subcommand about the program itself, which needs no device: `run` gets what all subcommands take.
+template <class Options>
+CLI::App* addTableCommand(CLI::App& program, Invocation& invocation, const char* name, const char* description,
+                          ExitCode (*run)(const CommandContext&, const OptionTable&, const Options&),
+                          const std::shared_ptr<Options>& options) {
+  CLI::App* command = program.add_subcommand(name, description);
+  command->callback([&program, &invocation, name, run, options] {
+    invocation.common.command = name;
+    invocation.run = [&program, &invocation, run, options](const CommandContext& context) {
+      return run(context, tableOf(program, invocation), *options);
+    };
+  });
+  return command;
+}
+
+void addCompletion(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<CompletionOptions>();
+  auto* command =
+      addTableCommand(program, invocation, "completion", "Write the completion for a shell", runCompletion, options);
+  auto* shell = command->add_option("SHELL", options->shell, "bash, zsh or fish");
+  takeOneOf(invocation, shell, {"bash", "zsh", "fish"})->required()->option_text(" ");
+}
+
+void addManual(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<ManualOptions>();
+  auto* command =
+      addTableCommand(program, invocation, "manual", "Write a manual page for each subcommand", runManual, options);
+  command->add_option("FOLDER", options->folder, "The folder for the pages; made if it is not there")
+      ->required()
+      ->check(checkFolder)
+      ->option_text(" ");
+}
+
 void addCommands(CLI::App& program, Invocation& invocation) {
   program.require_subcommand(1);
-  program.footer(
-      "Exit codes: 0 done, 1 failed, 2 usage, 3 some apps failed, 4 cancelled by a\n"
-      "signal, 5 a deadline passed, 6 the device is in use.");
-  program.set_version_flag("--version", "tsd 1.0.0");
+  std::string codes;
+  for (const auto& each : exitCodes) {
+    codes += (codes.empty() ? "Exit codes: " : ", ") + std::to_string(static_cast<int>(each.code)) + ' ' + each.meaning;
+  }
+  program.footer(wrapped(codes + '.', 78));
+  program.set_version_flag("--version", std::string("tsd ") + version);
   addSample(program, invocation);
   addDeviceCommand(program, invocation, "init", "Make an empty device", runInit);
   addSync(program, invocation);
@@ -253,6 +362,8 @@ void addCommands(CLI::App& program, Invocation& invocation) {
   addSet(program, invocation);
   addUninstall(program, invocation);
   addStore(program, invocation);
+  addCompletion(program, invocation);
+  addManual(program, invocation);
 }
 
 std::vector<device::InjectionRule> parseRules(const std::vector<std::string>& texts) {

@@ -1,0 +1,46 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "tsd/ExitCode.h"
+
+namespace tsd {
+
+/// An option or an argument of a subcommand, as its help shows it.
+struct OptionEntry {
+  std::vector<std::string> names;  // "-o", "--output"; of an argument its name alone: "DEVICE"
+  std::string value;               // what stands for the value: "FILE"; of an argument its name; empty for a flag
+  std::string description;         // one line
+  std::vector<std::string> words;  // the values it takes, where they can be listed
+  bool isArgument = false;
+  bool isRequired = false;
+  bool isRepeatable = false;
+  bool isCommon = false;  // one that the subcommands share
+
+  /// Whether the value names something in the file system; which, its name tells.
+  bool takesFile() const { return value == "FILE"; }
+  bool takesFolder() const { return value == "DEVICE" || value == "HOST" || value == "FOLDER"; }
+};
+
+struct CommandEntry {
+  std::string name;
+  std::string description;
+  std::vector<OptionEntry> options;  // and arguments, in the order of the help
+};
+
+struct ExitCodeEntry {
+  ExitCode code;
+  std::string meaning;
+};
+
+/// Everything that the help texts say, for what is made of it besides: manual pages and completions.
+struct OptionTable {
+  std::string program;
+  std::string version;
+  std::string description;
+  std::vector<ExitCodeEntry> exitCodes;
+  std::vector<CommandEntry> commands;
+};
+
+}  // namespace tsd
