@@ -2,7 +2,7 @@
 # presets of CMakePresets.json, each in build/<preset>.
 
 .DEFAULT_GOAL := help
-.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate format clean packages check-packages
+.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate fuzz format clean packages check-packages fuzz-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
 SEEDS ?=
@@ -55,6 +55,10 @@ sweep: build-all ## every call of every scenario failed once, all of them
 simulate: build-all ## random scenarios against the model: make simulate SEEDS=10000
 	@cd build/release && $(WITH_SEEDS) bin/plugin_tests --gtest_filter='*Simulation*' --gtest_brief=1
 
+fuzz: fuzz-packages ## looks for inputs that break something: make fuzz RUNS=1000000 TARGETS=xml_list
+	@$(call PRESET,fuzz,$(addprefix fuzz_,$(or $(TARGETS),$(notdir $(wildcard fuzz/seeds/*)))))
+	@.ci/fuzz build/fuzz $(or $(RUNS),20000) $(TARGETS)
+
 format: check-packages ## puts every source file into the common format
 	@git ls-files -z '*.h' '*.cpp' | xargs -0 clang-format -i
 
@@ -66,3 +70,6 @@ packages:
 
 check-packages:
 	@.ci/packages check
+
+fuzz-packages:
+	@.ci/packages fuzz
