@@ -2,7 +2,8 @@
 # presets of CMakePresets.json, each in build/<preset>.
 
 .DEFAULT_GOAL := help
-.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate fuzz format clean packages check-packages fuzz-packages
+.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate fuzz bench format clean packages \
+        check-packages fuzz-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
 SEEDS ?=
@@ -58,6 +59,9 @@ simulate: build-all ## random scenarios against the model: make simulate SEEDS=1
 fuzz: fuzz-packages ## looks for inputs that break something: make fuzz RUNS=1000000 TARGETS=xml_list
 	@$(call PRESET,fuzz,$(addprefix fuzz_,$(or $(TARGETS),$(notdir $(wildcard fuzz/seeds/*)))))
 	@.ci/fuzz build/fuzz $(or $(RUNS),20000) $(TARGETS)
+
+bench: build-all ## the speed of everything against its goals, as a table
+	@bench/table.py build/release/bin
 
 format: check-packages ## puts every source file into the common format
 	@git ls-files -z '*.h' '*.cpp' | xargs -0 clang-format -i
