@@ -16,4 +16,17 @@ class PropertyListBenchmarks {
   TemporaryFolder _folder;
 };
 
+/// Uses what the one above measured.
+class PluginBenchmarks {
+ public:
+  void add();
+  void printRows(const Measurements& taken) const;
+};
+
+class IconBenchmarks {
+ public:
+  void add();
+  void printRows(const Measurements& taken) const;
+};
+
 }  // namespace bench
