@@ -70,7 +70,7 @@ struct Boundary::State {
       const InjectionRule& rule = candidate->rule;
       if (!rule.matches(service, operation, app)) continue;
       std::uint64_t match = candidate->matches.fetch_add(1) + 1;
-      if (rule.match == 0 || rule.match == match) each(rule);
+      if (rule.isDue(match)) each(rule);
     }
   }
 

@@ -6,7 +6,9 @@
 #include <string_view>
 #include <utility>
 
+#include "device/DevicePath.h"
 #include "device/RecordList.h"
+#include "device/StepWatch.h"
 #include "device/Store.h"
 #include "plist/PropertyList.h"
 
@@ -70,7 +72,8 @@ class Transaction {
 
 class DatabaseStore final : public Store {
  public:
-  explicit DatabaseStore(std::string path) : _path(std::move(path)) {}
+  DatabaseStore(std::string path, std::shared_ptr<StepWatch> watch)
+      : _path(std::move(path)), _watch(std::move(watch)) {}
 
   bool open(ErrorRef* error) {
     sqlite3* opened = nullptr;
@@ -107,6 +110,19 @@ class DatabaseStore final : public Store {
       values.push_back(std::move(*bytes));
     }
     std::lock_guard lock(_mutex);
+    Step step{flushes ? Step::Kind::storeCommit : Step::Kind::storeWrite, {}};
+    if (int forbidden = _watch ? _watch->before(step) : 0) {
+      platform::setError(error, platform::makeError("Store", forbidden, _path + ": " + textOfErrorNumber(forbidden)));
+      return false;
+    }
+    if (!applyLocked(changes, values, flushes, error)) return false;
+    if (_watch) _watch->after(step);
+    platform::setError(error, nullptr);
+    return true;
+  }
+
+  bool applyLocked(const std::vector<StoreRecord>& changes, const std::vector<Bytes>& values, bool flushes,
+                   ErrorRef* error) {
     // A flush writes out the whole log, and with it what was written before without one.
     if (flushes != _flushes && !execute(flushes ? "PRAGMA synchronous=FULL" : "PRAGMA synchronous=NORMAL", error))
       return false;
@@ -118,7 +134,6 @@ class DatabaseStore final : public Store {
     }
     if (!transaction.commit()) return fail(error);
     for (const auto& change : changes) _records.apply(change);
-    platform::setError(error, nullptr);
     return true;
   }
 
@@ -196,6 +211,7 @@ class DatabaseStore final : public Store {
   }
 
   const std::string _path;
+  const std::shared_ptr<StepWatch> _watch;
   std::mutex _mutex;
   // Guarded by _mutex once the store is open. The statements go before the database.
   Database _database;
@@ -207,9 +223,9 @@ class DatabaseStore final : public Store {
 
 }  // namespace
 
-std::unique_ptr<Store> openDatabaseStore(const std::string& path, ErrorRef* error) {
+std::unique_ptr<Store> openDatabaseStore(const std::string& path, ErrorRef* error, std::shared_ptr<StepWatch> watch) {
   platform::setError(error, nullptr);
-  auto store = std::make_unique<DatabaseStore>(path);
+  auto store = std::make_unique<DatabaseStore>(path, std::move(watch));
   if (!store->open(error)) return nullptr;
   return store;
 }

@@ -84,20 +84,24 @@ int readWhole(int file, Bytes& contents) {
 
 class DiskFileWriter final : public FileWriter {
  public:
-  DiskFileWriter(FileDescriptor file, std::string_view path) : _file(std::move(file)), _path(path) {}
+  DiskFileWriter(FileDescriptor file, std::string_view path, std::shared_ptr<StepWatch> watch)
+      : _file(std::move(file)), _path(path), _watch(std::move(watch)) {}
 
   bool write(BytesView bytes, ErrorRef* error) override {
-    return answerFileOperation(writeWhole(_file.get(), bytes), _path, error);
+    return answerFileOperation(writeWhole(writing(), bytes), _path, error);
   }
   bool close(bool durable, ErrorRef* error) override {
-    int failure = durable && ::fsync(_file.get()) != 0 ? errno : 0;
+    int failure = durable ? syncFile(writing()) : 0;
     _file = FileDescriptor();
     return answerFileOperation(failure, _path, error);
   }
 
  private:
+  FileInWriting writing() const { return {_file.get(), _path, _watch.get()}; }
+
   FileDescriptor _file;
   const std::string _path;
+  const std::shared_ptr<StepWatch> _watch;
 };
 
 class DiskFileReader final : public FileReader {
@@ -119,25 +123,16 @@ class DiskFileReader final : public FileReader {
   const std::string _path;
 };
 
-/// Fails when something is there; the second way, for file systems that cannot, is not atomic towards other processes.
-int renameToNothing(const DiskPlace& from, const DiskPlace& to) {
-  if (::renameat2(from.directory(), from.name(), to.directory(), to.name(), RENAME_NOREPLACE) == 0) return 0;
-  if (errno != EINVAL && errno != ENOSYS) return errno;
-  struct stat status;
-  if (::fstatat(to.directory(), to.name(), &status, AT_SYMLINK_NOFOLLOW) == 0) return EEXIST;
-  return ::renameat(from.directory(), from.name(), to.directory(), to.name()) == 0 ? 0 : errno;
-}
-
 int moveBetween(const DiskPlace& from, const DiskPlace& to) {
-  if (int failure = renameToNothing(from, to)) return failure;
+  if (int failure = from.moveTo(to)) return failure;
   if (int failure = to.syncDirectory()) return failure;
   return from.syncDirectory();
 }
 
-int copyContents(int from, int to) {
+int copyContents(int from, const FileInWriting& to) {
   struct stat status;
   if (::fstat(from, &status) != 0) return errno;
-  if ((status.st_mode & S_IXUSR) && ::fchmod(to, 0755) != 0) return errno;
+  if ((status.st_mode & S_IXUSR) && ::fchmod(to.descriptor, 0755) != 0) return errno;
   Bytes chunk;
   do {
     if (int failure = readChunk(from, chunkSize, chunk)) return failure;
@@ -157,15 +152,13 @@ bool DiskFileTree::removeItem(std::string_view path, ErrorRef* error) {
 
 int DiskFileTree::makeDirectory(std::string_view path, bool intermediates, const Value& attributes) const {
   DiskPlace place;
-  if (int failure = DiskPlace::find(_root, path, intermediates, place)) return failure;
+  if (int failure = find(path, intermediates, place)) return failure;
   if (place.isRoot()) return intermediates ? 0 : EEXIST;
-  if (::mkdirat(place.directory(), place.name(), 0777) == 0) {
-    applyAttributes(place, attributes);
-    return 0;
-  }
-  if (errno != EEXIST || !intermediates) return errno;
+  int failure = place.makeDirectory();
+  if (failure == 0) applyAttributes(place, attributes);
+  if (failure != EEXIST || !intermediates) return failure;
   struct stat status;
-  if (int failure = place.status(status)) return failure;
+  if (int unknown = place.status(status)) return unknown;
   return S_ISDIR(status.st_mode) ? 0 : EEXIST;
 }
 
@@ -190,7 +183,8 @@ bool DiskFileTree::copyItem(std::string_view from, std::string_view to, ErrorRef
   if (int failure = openFile(from, source)) return answerFileOperation(failure, from, error);
   DiskPlace destination;
   int failure = find(to, destination);
-  if (failure == 0) failure = destination.replaceFile([&](int file) { return copyContents(source.get(), file); });
+  if (failure == 0)
+    failure = destination.replaceFile([&](const FileInWriting& file) { return copyContents(source.get(), file); });
   return answerFileOperation(failure, to, error);
 }
 
@@ -213,7 +207,7 @@ std::optional<FileAttributes> DiskFileTree::attributesOfItem(std::string_view pa
 bool DiskFileTree::createFile(std::string_view path, BytesView contents, const Value& attributes) {
   DiskPlace place;
   if (find(path, place) != 0) return false;
-  if (place.replaceFile([&](int file) { return writeWhole(file, contents); }) != 0) return false;
+  if (place.replaceFile([&](const FileInWriting& file) { return writeWhole(file, contents); }) != 0) return false;
   applyAttributes(place, attributes);
   return true;
 }
@@ -240,7 +234,7 @@ std::optional<Bytes> DiskFileTree::readFile(std::string_view path, ErrorRef* err
 bool DiskFileTree::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error) {
   DiskPlace place;
   int failure = find(path, place);
-  if (failure == 0) failure = place.replaceFile([&](int file) { return writeWhole(file, contents); });
+  if (failure == 0) failure = place.replaceFile([&](const FileInWriting& file) { return writeWhole(file, contents); });
   if (failure == 0) failure = place.syncDirectory();
   return answerFileOperation(failure, path, error);
 }
@@ -250,7 +244,7 @@ int DiskFileTree::utimes(std::string_view path, int& errorNumber) {
   struct stat status;
   int failure = find(path, place);
   if (failure == 0) failure = place.status(status);
-  if (failure == 0 && ::utimensat(place.directory(), place.name(), nullptr, AT_SYMLINK_NOFOLLOW) != 0) failure = errno;
+  if (failure == 0) failure = place.touch();
   if (failure == 0) return 0;
   errorNumber = failure;
   return -1;
@@ -281,13 +275,9 @@ std::unique_ptr<FileWriter> DiskFileTree::createNew(std::string_view path, bool 
   DiskPlace place;
   FileDescriptor file;
   int failure = find(path, place);
-  if (failure == 0) {
-    file = FileDescriptor(::openat(place.directory(), place.name(),
-                                   O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, executable ? 0777 : 0666));
-    if (!file.isOpen()) failure = errno;
-  }
+  if (failure == 0) failure = place.createFile(executable, file);
   if (!answerFileOperation(failure, path, error)) return nullptr;
-  return std::make_unique<DiskFileWriter>(std::move(file), path);
+  return std::make_unique<DiskFileWriter>(std::move(file), path, _watch);
 }
 
 std::unique_ptr<FileReader> DiskFileTree::openForReading(std::string_view path, ErrorRef* error) {
@@ -301,15 +291,15 @@ bool DiskFileTree::syncDirectory(std::string_view path, ErrorRef* error) {
   FileDescriptor directory;
   int failure = find(path, place);
   if (failure == 0) failure = place.openDirectory(directory);
-  if (failure == 0 && ::fsync(directory.get()) != 0 && errno != EINVAL) failure = errno;
+  if (failure == 0) failure = device::syncDirectory(directory.get(), path, _watch.get());
   return answerFileOperation(failure, path, error);
 }
 
-std::unique_ptr<FileTree> openDiskFileTree(const std::string& root, ErrorRef* error) {
+std::unique_ptr<FileTree> openDiskFileTree(const std::string& root, ErrorRef* error, std::shared_ptr<StepWatch> watch) {
   // The folder itself is the owner's choice and may be reached through links.
   FileDescriptor opened(::open(root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
   if (!answerFileOperation(opened.isOpen() ? 0 : errno, root, error)) return nullptr;
-  return std::make_unique<DiskFileTree>(std::move(opened));
+  return std::make_unique<DiskFileTree>(std::move(opened), std::move(watch));
 }
 
 }  // namespace device

@@ -1,7 +1,10 @@
 #pragma once
 
+#include <memory>
+
 #include "device/DiskPlace.h"
 #include "device/FileTree.h"
+#include "device/StepWatch.h"
 
 namespace device {
 
@@ -9,7 +12,9 @@ namespace device {
 /// attributes is applied where the process may change owners and the host knows the name.
 class DiskFileTree final : public FileTree {
  public:
-  explicit DiskFileTree(FileDescriptor root) : _root(std::move(root)) {}
+  /// `watch`, which may be null, is told of every step.
+  DiskFileTree(FileDescriptor root, std::shared_ptr<StepWatch> watch)
+      : _root(std::move(root)), _watch(std::move(watch)) {}
 
   bool removeItem(std::string_view path, platform::ErrorRef* error) override;
   bool createDirectory(std::string_view path, bool withIntermediateDirectories, const platform::Value& attributes,
@@ -29,11 +34,15 @@ class DiskFileTree final : public FileTree {
   bool syncDirectory(std::string_view path, platform::ErrorRef* error) override;
 
  private:
-  int find(std::string_view path, DiskPlace& place) const { return DiskPlace::find(_root, path, false, place); }
+  int find(std::string_view path, DiskPlace& place) const { return find(path, false, place); }
+  int find(std::string_view path, bool makeDirectories, DiskPlace& place) const {
+    return DiskPlace::find(_root, path, makeDirectories, _watch.get(), place);
+  }
   int makeDirectory(std::string_view path, bool intermediates, const platform::Value& attributes) const;
   int openFile(std::string_view path, FileDescriptor& file) const;
 
   const FileDescriptor _root;
+  const std::shared_ptr<StepWatch> _watch;
 };
 
 }  // namespace device

@@ -43,31 +43,50 @@ std::string freshTemporaryName() {
   return std::string(temporaryFilePrefix) + name;
 }
 
+std::string joined(std::string_view directory, std::string_view name) {
+  return std::string(directory == "/" ? "" : directory) + '/' + std::string(name);
+}
+
+/// What is not there counts as removed.
+int removeAt(int directory, const char* name, int flags, const std::string& path, StepWatch* watch) {
+  return takeStep(watch, {Step::Kind::remove, path},
+                  [&](Step&) { return ::unlinkat(directory, name, flags) == 0 || errno == ENOENT ? 0 : errno; });
+}
+
 /// Moves what is two levels below `top` up into it, so that no depth of directories needs more than two of them open.
-int flattenInto(int top, const char* name) {
+int flattenInto(int top, const char* name, const std::string& topPath, StepWatch* watch) {
   FileDescriptor directory;
   if (int failure = openDirectoryAt(top, name, O_RDONLY, directory)) return failure;
   std::vector<std::string> names;
   if (int failure = namesInDirectory(directory.get(), names)) return failure;
   for (const auto& each : names) {
-    if (::unlinkat(directory.get(), each.c_str(), 0) == 0 || errno == ENOENT) continue;
-    if (errno != EISDIR) return errno;
-    if (::unlinkat(directory.get(), each.c_str(), AT_REMOVEDIR) == 0) continue;
-    if (::renameat(directory.get(), each.c_str(), top, freshTemporaryName().c_str()) != 0) return errno;
+    std::string path = joined(joined(topPath, name), each);
+    int failure = removeAt(directory.get(), each.c_str(), 0, path, watch);
+    if (failure == EISDIR) failure = removeAt(directory.get(), each.c_str(), AT_REMOVEDIR, path, watch);
+    if (failure == ENOTEMPTY || failure == EEXIST) {
+      std::string fresh = freshTemporaryName();
+      failure = takeStep(watch, {Step::Kind::move, path, joined(topPath, fresh)}, [&](Step&) {
+        return ::renameat(directory.get(), each.c_str(), top, fresh.c_str()) == 0 ? 0 : errno;
+      });
+    }
+    if (failure) return failure;
   }
   return 0;
 }
 
-int emptyDirectory(int top) {
+int emptyDirectory(int top, const std::string& topPath, StepWatch* watch) {
   std::vector<std::string> names;
   do {
     names.clear();
     if (int failure = namesInDirectory(top, names)) return failure;
     for (const auto& each : names) {
-      if (::unlinkat(top, each.c_str(), 0) == 0 || errno == ENOENT) continue;
-      if (errno != EISDIR) return errno;
-      if (int failure = flattenInto(top, each.c_str())) return failure;
-      if (::unlinkat(top, each.c_str(), AT_REMOVEDIR) != 0 && errno != ENOENT) return errno;
+      std::string path = joined(topPath, each);
+      int failure = removeAt(top, each.c_str(), 0, path, watch);
+      if (failure == EISDIR) {
+        failure = flattenInto(top, each.c_str(), topPath, watch);
+        if (failure == 0) failure = removeAt(top, each.c_str(), AT_REMOVEDIR, path, watch);
+      }
+      if (failure) return failure;
     }
   } while (!names.empty());
   return 0;
@@ -94,20 +113,44 @@ int namesInDirectory(int directory, std::vector<std::string>& names) {
   }
 }
 
-int writeWhole(int file, std::string_view bytes) {
+int writeWhole(const FileInWriting& file, std::string_view bytes) {
   while (!bytes.empty()) {
-    ssize_t written = ::write(file, bytes.data(), bytes.size());
-    if (written < 0 && errno == EINTR) continue;
-    if (written <= 0) return written < 0 ? errno : EIO;
-    bytes.remove_prefix(static_cast<std::size_t>(written));
+    std::size_t taken = 0;
+    int failure = takeStep(file.watch, {Step::Kind::write, file.path, {}, bytes}, [&](Step& step) {
+      ssize_t written;
+      do {
+        written = ::write(file.descriptor, step.bytes.data(), step.bytes.size());
+      } while (written < 0 && errno == EINTR);
+      if (written <= 0) return written < 0 ? errno : EIO;
+      taken = static_cast<std::size_t>(written);
+      step.bytes = step.bytes.substr(0, taken);
+      return 0;
+    });
+    if (failure) return failure;
+    bytes.remove_prefix(taken);
   }
   return 0;
 }
 
-int DiskPlace::find(const FileDescriptor& root, std::string_view path, bool makeDirectories, DiskPlace& place) {
+int syncFile(const FileInWriting& file) {
+  return takeStep(file.watch, {Step::Kind::syncFile, file.path},
+                  [&](Step&) { return ::fsync(file.descriptor) == 0 ? 0 : errno; });
+}
+
+int syncDirectory(int directory, std::string_view path, StepWatch* watch) {
+  return takeStep(watch, {Step::Kind::syncDirectory, path}, [&](Step&) {
+    // EINVAL: a file system that has nothing to flush for a directory.
+    return ::fsync(directory) == 0 || errno == EINVAL ? 0 : errno;
+  });
+}
+
+int DiskPlace::find(const FileDescriptor& root, std::string_view path, bool makeDirectories, StepWatch* watch,
+                    DiskPlace& place) {
   std::vector<std::string_view> names;
   if (int failure = splitDevicePath(path, names)) return failure;
   if (int failure = openDirectoryAt(root.get(), ".", O_PATH, place._directory)) return failure;
+  place._path = path;
+  place._watch = watch;
   place._isRoot = names.empty();
   place._name = names.empty() ? "." : names.back();
   for (std::size_t i = 0; i + 1 < names.size(); ++i) {
@@ -115,13 +158,22 @@ int DiskPlace::find(const FileDescriptor& root, std::string_view path, bool make
     FileDescriptor next;
     int failure = openDirectoryAt(place.directory(), name.c_str(), O_PATH, next);
     if (failure == ENOENT && makeDirectories) {
-      if (::mkdirat(place.directory(), name.c_str(), 0777) != 0 && errno != EEXIST) return errno;
+      auto upTo = path.substr(0, static_cast<std::size_t>(names[i].data() + names[i].size() - path.data()));
+      failure = takeStep(watch, {Step::Kind::createDirectory, upTo}, [&](Step&) {
+        return ::mkdirat(place.directory(), name.c_str(), 0777) == 0 || errno == EEXIST ? 0 : errno;
+      });
+      if (failure) return failure;
       failure = openDirectoryAt(place.directory(), name.c_str(), O_PATH, next);
     }
     if (failure) return failure;
     place._directory = std::move(next);
   }
   return 0;
+}
+
+std::string_view DiskPlace::directoryPath() const {
+  auto slash = _path.rfind('/');
+  return _isRoot || slash == 0 ? "/" : _path.substr(0, slash);
 }
 
 int DiskPlace::status(struct stat& status) const {
@@ -155,38 +207,81 @@ int DiskPlace::openDirectory(FileDescriptor& directory) const {
 int DiskPlace::syncDirectory() const {
   FileDescriptor opened;
   if (int failure = openDirectoryAt(directory(), ".", O_RDONLY, opened)) return failure;
-  // EINVAL: a file system that has nothing to flush for a directory.
-  return ::fsync(opened.get()) == 0 || errno == EINVAL ? 0 : errno;
+  return device::syncDirectory(opened.get(), directoryPath(), _watch);
 }
 
-int DiskPlace::replaceFile(const std::function<int(int file)>& fill) const {
+int DiskPlace::makeDirectory() const {
+  return takeStep(_watch, {Step::Kind::createDirectory, _path},
+                  [&](Step&) { return ::mkdirat(directory(), name(), 0777) == 0 ? 0 : errno; });
+}
+
+int DiskPlace::createFile(bool executable, FileDescriptor& file) const {
+  return takeStep(_watch, {Step::Kind::createFile, _path}, [&](Step&) {
+    file = FileDescriptor(
+        ::openat(directory(), name(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, executable ? 0777 : 0666));
+    return file.isOpen() ? 0 : errno;
+  });
+}
+
+int DiskPlace::moveTo(const DiskPlace& target) const {
+  return takeStep(_watch, {Step::Kind::move, _path, target._path}, [&](Step&) {
+    if (::renameat2(directory(), name(), target.directory(), target.name(), RENAME_NOREPLACE) == 0) return 0;
+    if (errno != EINVAL && errno != ENOSYS) return errno;
+    // On a file system that cannot; not atomic towards other processes.
+    struct stat status;
+    if (::fstatat(target.directory(), target.name(), &status, AT_SYMLINK_NOFOLLOW) == 0) return EEXIST;
+    return ::renameat(directory(), name(), target.directory(), target.name()) == 0 ? 0 : errno;
+  });
+}
+
+int DiskPlace::touch() const {
+  return takeStep(_watch, {Step::Kind::touch, _path}, [&](Step&) {
+    return ::utimensat(directory(), name(), nullptr, AT_SYMLINK_NOFOLLOW) == 0 ? 0 : errno;
+  });
+}
+
+int DiskPlace::replaceFile(const std::function<int(const FileInWriting& file)>& fill) const {
   if (int failure = mayHoldFile()) return failure;
   FileDescriptor file;
   std::string temporary;
+  std::string path;
+  int failure;
   do {
     temporary = freshTemporaryName();
-    file = FileDescriptor(
-        ::openat(directory(), temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0666));
-  } while (!file.isOpen() && errno == EEXIST);
-  if (!file.isOpen()) return errno;
-  int failure = fill(file.get());
-  if (failure == 0 && ::fsync(file.get()) != 0) failure = errno;
-  if (failure == 0 && ::renameat(directory(), temporary.c_str(), directory(), name()) != 0) failure = errno;
-  if (failure != 0) ::unlinkat(directory(), temporary.c_str(), 0);
+    path = joined(directoryPath(), temporary);
+    failure = takeStep(_watch, {Step::Kind::createFile, path}, [&](Step&) {
+      file = FileDescriptor(
+          ::openat(directory(), temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0666));
+      return file.isOpen() ? 0 : errno;
+    });
+  } while (failure == EEXIST);
+  if (!file.isOpen()) return failure;
+  FileInWriting writing{file.get(), path, _watch};
+  if (failure == 0) failure = fill(writing);
+  if (failure == 0) failure = syncFile(writing);
+  if (failure == 0) {
+    failure = takeStep(_watch, {Step::Kind::move, path, _path}, [&](Step&) {
+      return ::renameat(directory(), temporary.c_str(), directory(), name()) == 0 ? 0 : errno;
+    });
+  }
+  if (failure != 0) removeAt(directory(), temporary.c_str(), 0, path, _watch);
   return failure;
 }
 
 int DiskPlace::remove() const {
   constexpr int attempts = 16;  // against somebody who goes on putting things in
   if (_isRoot) return EBUSY;
-  if (::unlinkat(directory(), name(), 0) == 0) return 0;
-  if (errno != EISDIR) return errno;
+  auto removeItself = [&](int flags) {
+    return takeStep(_watch, {Step::Kind::remove, _path},
+                    [&](Step&) { return ::unlinkat(directory(), name(), flags) == 0 ? 0 : errno; });
+  };
+  if (int failure = removeItself(0); failure != EISDIR) return failure;
   FileDescriptor opened;
   if (int failure = openDirectory(opened)) return failure;
   for (int i = 0; i < attempts; ++i) {
-    if (int failure = emptyDirectory(opened.get())) return failure;
-    if (::unlinkat(directory(), name(), AT_REMOVEDIR) == 0) return 0;
-    if (errno != ENOTEMPTY && errno != EEXIST) return errno;
+    if (int failure = emptyDirectory(opened.get(), std::string(_path), _watch)) return failure;
+    int failure = removeItself(AT_REMOVEDIR);
+    if (failure != ENOTEMPTY && failure != EEXIST) return failure;
   }
   return ENOTEMPTY;
 }

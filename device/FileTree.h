@@ -14,6 +14,8 @@
 
 namespace device {
 
+class StepWatch;
+
 /// A file that is being written. It appears under its path at once; `close` makes it durable.
 class FileWriter {
  public:
@@ -61,8 +63,10 @@ class FileTree : public platform::FileSystem {
 /// opened.
 constexpr std::string_view temporaryFilePrefix = ".applicationsync-";
 
-/// Below `root`, an existing folder of the host. Null with an error when it cannot be opened.
-std::unique_ptr<FileTree> openDiskFileTree(const std::string& root, platform::ErrorRef* error = nullptr);
+/// Below `root`, an existing folder of the host. Null with an error when it cannot be opened. `watch`, if there is one,
+/// is told of every step.
+std::unique_ptr<FileTree> openDiskFileTree(const std::string& root, platform::ErrorRef* error = nullptr,
+                                           std::shared_ptr<StepWatch> watch = nullptr);
 std::unique_ptr<FileTree> makeMemoryFileTree();
 
 }  // namespace device

@@ -144,6 +144,7 @@ constexpr Point points[] = {
     {"setTransferPath", "RVPromise"},
     {"setUserDataPromise", "RVAppInstallCoordinator"},
     {"setVantorID", "TSMutableAccountInfo"},
+    {"step", ""},
     {"supportedDataclasses", "AppsClient"},
     {"syncEndedWithSuccess", "AppsClient"},
     {"temporaryDirectory", "Process"},
@@ -197,10 +198,23 @@ bool parseNumber(std::string_view text, Number& number) {
 
 std::string quoted(std::string_view text) { return '"' + std::string(text) + '"'; }
 
+/// A step is no app's. It is taken under guards that whoever acts for somebody else would wait for.
+std::string checkStep(const InjectionRule& rule) {
+  if (!isAboutSteps(rule)) return {};
+  if (!rule.app.empty()) return "a step is no app's";
+  if (!rule.target.empty()) return "nobody acts at a step";
+  bool isErrorNumber = rule.number > 0 && rule.number < 4096;
+  if (rule.action == InjectionRule::Action::value && !isErrorNumber)
+    return "the value of a step is the number of an error";
+  return {};
+}
+
 /// Empty when all is well, else what is wrong.
 std::string parsePlace(std::string_view place, InjectionRule& rule) {
   if (auto at = place.rfind('@'); at != place.npos) {
     auto match = place.substr(at + 1);
+    rule.onwards = match.size() > 1 && match.back() == '+';
+    if (rule.onwards) match.remove_suffix(1);
     if (!parseNumber(match, rule.match) || rule.match == 0)
       return quoted(match) + " after @ is not a number from 1 upwards";
     place = place.substr(0, at);
@@ -247,6 +261,8 @@ bool isInjectionPoint(std::string_view point) {
   return !service.empty() && std::binary_search(first, std::end(points), Point{operation, service});
 }
 
+bool isAboutSteps(const InjectionRule& rule) { return rule.point == "step"; }
+
 bool InjectionRule::matches(std::string_view service, std::string_view operation, std::string_view ofApp) const {
   if (!app.empty() && app != ofApp) return false;
   std::string_view rest = point;
@@ -266,9 +282,10 @@ std::optional<InjectionRule> InjectionRule::parse(std::string_view text, ErrorRe
   std::string problem;
   auto equals = text.find('=');
   if (equals == text.npos)
-    problem = "expected POINT[:APP][@N]=ACTION";
+    problem = "expected POINT[:APP][@N[+]]=ACTION";
   else if (problem = parsePlace(text.substr(0, equals), rule); problem.empty())
     problem = parseAction(text.substr(equals + 1), rule);
+  if (problem.empty()) problem = checkStep(rule);
   if (problem.empty()) return rule;
   platform::setError(error, platform::makeError("Injection", 2, "injection rule " + quoted(text) + ": " + problem));
   return std::nullopt;

@@ -9,11 +9,13 @@
 
 namespace device {
 
-/// One rule of fault injection: `POINT[:APP][@N]=ACTION`.
+/// One rule of fault injection: `POINT[:APP][@N[+]]=ACTION`.
 ///
 /// POINT is an operation's C++ name, with its class in front and a dot where one name serves several
-/// ("RVPlaceholder.cancelForReason", "writeAtomically"), or "transfer" (each chunk of a package).
-/// Without APP every app matches; without N every match, otherwise the N-th only (counted from 1).
+/// ("RVPlaceholder.cancelForReason", "writeAtomically"), or "transfer" (each chunk of a package), or "step" (each
+/// single change of a device in a folder, see InjectedSteps.h).
+/// Without APP every app matches; without N every match, otherwise the N-th only (counted from 1), with a plus sign the
+/// N-th and all after it.
 struct InjectionRule {
   enum class Action : std::uint8_t {
     fail,        // does nothing, answers false or absent, with an error
@@ -34,9 +36,13 @@ struct InjectionRule {
   Action action = Action::fail;
   std::int64_t number = 0;  // of `value`
   std::string target{};     // of cancel, prioritize, uninstall, store
+  bool onwards = false;     // every match from the N-th on
 
   /// Whether the rule is about calls of this operation for this app (empty: for none).
   bool matches(std::string_view service, std::string_view operation, std::string_view app) const;
+
+  /// Whether the rule takes effect at its match of that number, counted from 1.
+  bool isDue(std::uint64_t number) const { return match == 0 || number == match || (onwards && number > match); }
 
   /// Nothing, with an error that names the place, when the text is no rule or names an unknown point or action.
   static std::optional<InjectionRule> parse(std::string_view text, platform::ErrorRef* error = nullptr);
@@ -44,5 +50,7 @@ struct InjectionRule {
 
 /// Whether a point of that name exists ("transfer", "writeAtomically", "RVPlaceholder.cancelForReason").
 bool isInjectionPoint(std::string_view point);
+/// Whether the rule is about the point "step".
+bool isAboutSteps(const InjectionRule& rule);
 
 }  // namespace device

@@ -13,6 +13,7 @@
 #include "device/FileSystemService.h"
 #include "device/HomeScreenService.h"
 #include "device/IconService.h"
+#include "device/InjectedSteps.h"
 #include "device/InstallCoordinationService.h"
 #include "device/InstallEngine.h"
 #include "device/InstallerService.h"
@@ -300,8 +301,9 @@ std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_p
                               folder + (fs::exists(folder, failure) ? ": not a device" : ": there is no such folder")));
     return nullptr;
   }
-  auto files = openDiskFileTree(folder + treeName, error);
-  auto store = files ? openDatabaseStore(folder + databaseName, error) : nullptr;
+  auto steps = InjectedSteps::of(options.rules);
+  auto files = openDiskFileTree(folder + treeName, error, steps);
+  auto store = files ? openDatabaseStore(folder + databaseName, error, steps) : nullptr;
   if (!store) return nullptr;
   return LocalDevice::open(std::move(files), std::move(store), std::move(events), std::move(options), error);
 }

@@ -9,6 +9,8 @@
 
 namespace device {
 
+class StepWatch;
+
 /// One record of what the device's services remember. An absent value removes the record.
 struct StoreRecord {
   std::string kind;  // "app", "coordinator", "uninstalled", "setting", …
@@ -32,8 +34,10 @@ class Store {
 };
 
 /// One SQLite file, made when it is not there. Null with an error when it is none of ours or cannot be read. One
-/// process at a time: while it is open, nobody else can open it.
-std::unique_ptr<Store> openDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr);
+/// process at a time: while it is open, nobody else can open it. `watch`, if there is one, is told of every commit and
+/// write; each is one step, whole or not at all, so that what the watch answers after it does not count.
+std::unique_ptr<Store> openDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr,
+                                         std::shared_ptr<StepWatch> watch = nullptr);
 /// Forgets everything when it goes.
 std::unique_ptr<Store> makeMemoryStore();
 

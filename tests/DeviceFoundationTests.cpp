@@ -50,8 +50,9 @@ TEST(InjectionRule, isParsedOrRefusedWithTheReason) {
       {"RVPromisedTransferToPath.setComplete=store=b",
        nullptr,
        {"RVPromisedTransferToPath.setComplete", "", 0, Action::store, 0, "b"}},
-      {"", "expected POINT[:APP][@N]=ACTION"},
-      {"writeAtomically", "expected POINT[:APP][@N]=ACTION"},
+      {"step@3+=value=28", nullptr, {"step", "", 3, Action::value, 28, "", true}},
+      {"", "expected POINT[:APP][@N[+]]=ACTION"},
+      {"writeAtomically", "expected POINT[:APP][@N[+]]=ACTION"},
       {"=fail", "no point"},
       {"nonsense=fail", "there is no point \"nonsense\""},
       {"FileSystem.cancelForReason=fail", "there is no point \"FileSystem.cancelForReason\""},
@@ -60,6 +61,10 @@ TEST(InjectionRule, isParsedOrRefusedWithTheReason) {
       {"transfer@0=fail", "\"0\" after @"},
       {"transfer@1x=fail", "\"1x\" after @"},
       {"transfer@=fail", "\"\" after @"},
+      {"transfer@+=fail", "\"+\" after @"},
+      {"step:a=fail", "no app's"},
+      {"step=cancel=a", "nobody acts"},
+      {"step=value=0", "number of an error"},
       {"transfer=", "there is no action \"\""},
       {"transfer=explode", "there is no action \"explode\""},
       {"transfer=fail=1", "takes nothing"},
@@ -84,6 +89,7 @@ TEST(InjectionRule, isParsedOrRefusedWithTheReason) {
     EXPECT_EQ(parsed->action, row.rule.action);
     EXPECT_EQ(parsed->number, row.rule.number);
     EXPECT_EQ(parsed->target, row.rule.target);
+    EXPECT_EQ(parsed->isDue(parsed->match + 1), row.rule.match == 0 || row.rule.onwards);
   }
 }
 
