@@ -136,6 +136,7 @@ class WholeDevice final : public LocalDevice {
     for (const auto& [id, outcome] : _records.state().outcomes) known.insert(id);
     for (auto id : known) status.apps.push_back(*_records.state().status(id));
     status.home = _records.state().homeOrder();
+    status.pages = _records.state().layout.pages;
     return status;
   }
 

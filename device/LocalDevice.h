@@ -74,6 +74,9 @@ struct DeviceStatus {
   std::vector<AppStatus> apps;                  // sorted by id; those that only an outcome is left of, too
   std::vector<CoordinatorStatus> coordinators;  // sorted by app
   std::vector<std::string> home;                // flattened, in order
+  /// The home screen's pages as the host set them, one for a layout without pages. Apps that it does not name stand
+  /// in `home` alone.
+  std::vector<std::vector<std::string>> pages;
   std::uint64_t syncing = 0;                    // state of the home screen's sync notification
 };
 

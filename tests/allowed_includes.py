@@ -28,6 +28,7 @@ LIBRARIES = {
     r"sqlite3\.h": ["device"],
     r"archive(_entry)?\.h": ["device", "tsd"],
     r"cairo\.h": ["device", "tsd"],
+    r"pango/.*": ["tsd"],
     r"nlohmann/.*": ["device", "tsd"],
     r"CLI/.*": ["tsd"],
 }

@@ -55,6 +55,7 @@ COMMAND_LINES = [
     Row("sync dev host --inject nowhere=fail", USAGE, err=says("nowhere")),
     Row("sync dev host --inject writeAtomically=explode", USAGE, err=says("explode")),
     Row("sync dev host --inject writeAtomically", USAGE, err=says("writeAtomically")),
+    Row("home dev", USAGE, err=says("--output is required")),
     Row("query dev weather", USAGE, err=says("weather")),
     Row("set dev app-removal", USAGE, err=says("KEY=VALUE is expected")),
     Row("set dev app-removal=sometimes", USAGE, err=says("sometimes")),
@@ -79,11 +80,15 @@ COMMAND_LINES = [
     Row("uninstall dev com.example.nobody", FAILED, err=says("com.example.nobody")),
     Row("store dev com.example.a --finish --package nowhere", FAILED, err=says("nowhere: No such file")),
     Row("status dev --log nowhere/log", FAILED, err=says("nowhere/log: No such file")),
+    Row("home dev -o nowhere/home.png", FAILED, err=says("nowhere/home.png: No such file")),
+    Row("home dev -o host", FAILED, err=says("host: a folder")),
+    Row("home dev -o /dev/null", FAILED, err=says("/dev/null: a ")),
     Row("query dev metrics --plugin nowhere.so", FAILED, err=says("nowhere.so: the plug-in is not there")),
     Row("query dev metrics --plugin file", FAILED, err=says("file: cannot be loaded as a plug-in")),
     Row("query dev metrics --plugin C-LIBRARY", FAILED, err=says("no entry point 'TSPluginTable'")),
     # What goes well says nothing on standard error.
     Row("status dev", DONE, r"^No apps\.$"),
+    Row("home dev -o home.png", DONE, r"^home\.png: no apps\.$"),
     Row("query dev metrics", DONE, r"^_Count 0$"),
     Row("query dev disabled-asset-types", DONE, r"^none$"),
     Row("sync dev emptyhost --progress none", DONE, r"^Nothing to do\.$"),
@@ -102,6 +107,7 @@ DOCUMENTS = [
     Row("restore dev emptyhost --json --progress none", DONE, r'"missing": \[\]'),
     Row("restore dev host --type 1 --json --progress none", DONE, r'"missing": \[\]'),
     Row("set dev icon-size=120 --json", DONE, r'"icon-size": "120"'),
+    Row("home dev -o home.png --json", DONE, r'"pages": \[\]'),
     Row("query dev vantor-ids --json", DONE, r'"answer": \[\]'),
     Row("status dev --json", DONE, r'"coordinators": \[\]'),
 ]
@@ -415,6 +421,26 @@ class Restores(Folder):
         status = self.document("status", "dev")
         self.assertEqual({app["state"] for app in status["apps"]}, {"installed"})
         self.assertEqual(status["coordinators"], [])
+
+    def test_the_home_screen_in_a_picture(self):
+        apps = self.make(6)
+        self.document("restore", "dev", "host")
+        self.tsd("store", "dev", apps[0], "--finish")
+        pathlib.Path(f"host/Packages/{apps[0]}.pkg").write_bytes(b"no archive")
+        pathlib.Path(f"host/Packages/{apps[5]}.pkg").write_bytes(b"no archive")
+        self.sync("dev", "host", "--end-phase", "success", "--inject", f"transfer:{apps[3]}@5=none",
+                  "--inject", f"transfer:{apps[2]}@1=fail", code=SOME_FAILED)
+        home = self.document("home", "dev", "-o", "home.png")
+        icons = {icon["id"]: icon for page in home["pages"] for icon in page}
+        self.assertEqual([[icon["id"] for icon in page] for page in home["pages"]],
+                         [[app for app in page if app in icons] for page in
+                          plistlib.loads(pathlib.Path("host/PanelloIconState.plist").read_bytes())])
+        self.assertEqual([(icons[app]["look"], icons[app]["failed"]) for app in apps[:5]],
+                         [("installed", True), ("restoring", False), ("waiting", False), ("waiting", False),
+                          ("installed", False)])
+        self.assertEqual([0 < icons[app]["progress"] < 1 for app in apps[2:4]], [False, True])
+        self.assertEqual([app["id"] for app in home["failed"]], [apps[5]])
+        self.assertEqual(pathlib.Path("home.png").read_bytes()[:8], b"\x89PNG\r\n\x1a\n")
 
     def test_lists_that_are_none(self):
         self.make(2)

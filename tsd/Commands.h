@@ -58,6 +58,12 @@ struct RestoreOptions {
 };
 ExitCode runRestore(const CommandContext& context, const RestoreOptions& options);
 
+struct HomeOptions {
+  std::string device;
+  std::string file;  // of the picture
+};
+ExitCode runHome(const CommandContext& context, const HomeOptions& options);
+
 struct QueryOptions {
   std::string device;
   std::string question;  // "metrics", "accounts", "vantor-ids" or "disabled-asset-types"

@@ -1,11 +1,8 @@
 #include "tsd/SampleIcon.h"
 
-#include <cairo.h>
-
-#include <cmath>
 #include <memory>
 
-#include "tsd/CommandError.h"
+#include "tsd/Canvas.h"
 #include "tsd/SampleApp.h"
 
 namespace tsd {
@@ -14,28 +11,6 @@ namespace {
 constexpr double side = 180;
 constexpr double pi = 3.14159265358979323846;
 
-struct Colour {
-  double red, green, blue;
-};
-
-/// Hue in turns; saturation and value from 0 to 1.
-Colour colourOf(double hue, double saturation, double value) {
-  auto part = [&](double shift) {
-    double k = std::fmod(shift + hue * 6, 6);
-    return value - value * saturation * std::fmax(0, std::fmin(std::fmin(k, 4 - k), 1));
-  };
-  return {part(5), part(3), part(1)};
-}
-
-void roundedSquare(cairo_t* pen, double radius) {
-  cairo_new_sub_path(pen);
-  cairo_arc(pen, side - radius, radius, radius, -pi / 2, 0);
-  cairo_arc(pen, side - radius, side - radius, radius, 0, pi / 2);
-  cairo_arc(pen, radius, side - radius, radius, pi / 2, pi);
-  cairo_arc(pen, radius, radius, radius, pi, 3 * pi / 2);
-  cairo_close_path(pen);
-}
-
 void drawGround(cairo_t* pen, double hue) {
   Colour top = colourOf(hue, 0.55, 0.95);
   Colour bottom = colourOf(hue + 0.04, 0.75, 0.70);
@@ -43,7 +18,7 @@ void drawGround(cairo_t* pen, double hue) {
                                                                      cairo_pattern_destroy);
   cairo_pattern_add_color_stop_rgb(shade.get(), 0, top.red, top.green, top.blue);
   cairo_pattern_add_color_stop_rgb(shade.get(), 1, bottom.red, bottom.green, bottom.blue);
-  roundedSquare(pen, 40);
+  traceRounded(pen, {0, 0, side, side}, 40);
   cairo_set_source(pen, shade.get());
   cairo_fill_preserve(pen);
   cairo_clip(pen);
@@ -83,27 +58,14 @@ void drawLetters(cairo_t* pen, const std::string& letters) {
   cairo_show_text(pen, letters.c_str());
 }
 
-cairo_status_t append(void* target, const unsigned char* bytes, unsigned length) {
-  static_cast<platform::Bytes*>(target)->append(reinterpret_cast<const char*>(bytes), length);
-  return CAIRO_STATUS_SUCCESS;
-}
-
 }  // namespace
 
 platform::Bytes drawSampleIcon(const std::string& name, SampleNumbers& numbers) {
-  std::unique_ptr<cairo_surface_t, void (*)(cairo_surface_t*)> surface(
-      cairo_image_surface_create(CAIRO_FORMAT_ARGB32, static_cast<int>(side), static_cast<int>(side)),
-      cairo_surface_destroy);
-  std::unique_ptr<cairo_t, void (*)(cairo_t*)> pen(cairo_create(surface.get()), cairo_destroy);
-  drawGround(pen.get(), static_cast<double>(numbers.below(360)) / 360);
-  drawMark(pen.get(), numbers.below(4));
-  drawLetters(pen.get(), name.substr(0, 2));
-  platform::Bytes image;
-  if (cairo_status(pen.get()) != CAIRO_STATUS_SUCCESS ||
-      cairo_surface_write_to_png_stream(surface.get(), append, &image) != CAIRO_STATUS_SUCCESS) {
-    throw CommandError("cannot draw an icon");
-  }
-  return image;
+  Canvas canvas(side, side);
+  drawGround(canvas.pen(), static_cast<double>(numbers.below(360)) / 360);
+  drawMark(canvas.pen(), numbers.below(4));
+  drawLetters(canvas.pen(), name.substr(0, 2));
+  return canvas.png();
 }
 
 }  // namespace tsd

@@ -130,6 +130,8 @@ void addNumber(CLI::App* command, const char* name, Number& target, const char* 
 /// A folder's name is never empty: what lies in it would be looked for in the system's root.
 std::string checkFolder(const std::string& folder) { return folder.empty() ? "a folder is expected" : ""; }
 
+std::string checkFile(const std::string& file) { return file.empty() ? "a file is expected" : ""; }
+
 void addDevice(CLI::App* command, std::string& device) {
   command->add_option("DEVICE", device, "The device's folder")->required()->check(checkFolder)->option_text(" ");
 }
@@ -201,6 +203,16 @@ void addRestore(CLI::App& program, Invocation& invocation) {
   addNumber(command, "--type", options->type, "Type of the restore; 2 and 3 bring apps back (2)");
   command->add_flag("--in-daemon", options->inDaemon,
                     wrapped("Run in the daemon's own process, not the migration component's"));
+}
+
+void addHome(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<HomeOptions>();
+  auto* command = addCommand(program, invocation, "home", "Draw what a person would see", runHome, options);
+  addDevice(command, options->device);
+  command->add_option("-o,--output", options->file, "The picture, a PNG file")
+      ->required()
+      ->check(checkFile)
+      ->option_text("FILE");
 }
 
 void addQuery(CLI::App& program, Invocation& invocation) {
@@ -356,6 +368,7 @@ void addCommands(CLI::App& program, Invocation& invocation) {
   addSync(program, invocation);
   addRestore(program, invocation);
   addDeviceCommand(program, invocation, "status", "Show the apps of a device and the installs under way", runStatus);
+  addHome(program, invocation);
   addQuery(program, invocation);
   addDeviceCommand(program, invocation, "backup", "Make the apps' store metadata ready for a backup", runBackup);
   addDeviceCommand(program, invocation, "clear", "Forget all sync data and placeholders", runClear);

@@ -1,0 +1,81 @@
+#include <algorithm>
+#include <filesystem>
+
+#include "tsd/Commands.h"
+#include "tsd/DeviceSession.h"
+#include "tsd/HomeDrawing.h"
+#include "tsd/Output.h"
+#include "tsd/WholeFile.h"
+
+namespace tsd {
+
+using platform::Value;
+
+namespace {
+
+Value documentOfIcon(const HomeIcon& icon) {
+  Value item = Value::makeDictionary();
+  auto& entries = *item.dictionary();
+  entries.set("id", icon.id);
+  entries.set("name", icon.name);
+  entries.set("look", nameOfLook(icon.look));
+  entries.set("progress", icon.progress);
+  entries.set("failed", icon.failed);
+  return item;
+}
+
+Value document(const CommandContext& context, const std::string& file, const HomePages& home) {
+  Value document = startDocument(context.options.command);
+  auto& entries = *document.dictionary();
+  entries.set("result", "done");
+  entries.set("file", file);
+  Value pages = Value::makeArray();
+  for (const auto& page : home.pages) {
+    Value icons = Value::makeArray();
+    for (const auto& icon : page) icons.array()->append(documentOfIcon(icon));
+    pages.array()->append(icons);
+  }
+  entries.set("pages", pages);
+  entries.set("pagesDrawn", std::min(home.pages.size(), homePagesDrawn));
+  Value failed = Value::makeArray();
+  for (const auto& app : home.failed) {
+    auto& item = failed.array()->appendDictionary();
+    item.set("id", app.id);
+    item.set("reason", app.reason);
+  }
+  entries.set("failed", failed);
+  entries.set("syncing", home.syncing);
+  return document;
+}
+
+/// "3 apps on 1 page: 2 installed, 1 waiting"
+std::string summaryOf(const HomePages& home) {
+  std::string text = std::to_string(home.icons()) + (home.icons() == 1 ? " app on " : " apps on ") +
+                     std::to_string(home.pages.size()) + (home.pages.size() == 1 ? " page" : " pages");
+  const char* between = ": ";
+  for (std::size_t i = 0; i < homeLooks; ++i) {
+    auto look = static_cast<HomeLook>(i);
+    std::size_t count = home.countOf(look);
+    if (count == 0) continue;
+    text += between + std::to_string(count) + " " + nameOfLook(look);
+    between = ", ";
+  }
+  return text;
+}
+
+}  // namespace
+
+ExitCode runHome(const CommandContext& context, const HomeOptions& options) {
+  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
+  auto home = readHomePages(session.device(), homePageSize, homePagesDrawn);
+  std::error_code problem;
+  auto name = std::filesystem::weakly_canonical(options.device, problem).filename().string();
+  writeWholeFile(options.file, drawHome(home, name.empty() ? options.device : name));
+  if (context.options.json)
+    writeDocument(document(context, options.file, home));
+  else
+    writeOutput(printable(options.file) + ": " + (home.pages.empty() ? "no apps" : summaryOf(home)) + ".\n");
+  return ExitCode::done;
+}
+
+}  // namespace tsd
