@@ -140,9 +140,16 @@ class Unpacking {
       if (!found->second.isDirectory) return refuse(name, "a file and a folder of that name");
       return true;
     }
+    if (!hasRoom()) return false;
     if (!_files.createDirectory(_directory + '/' + name, false, {}, &_reason)) return false;
     _directories.push_back(name);
     return true;
+  }
+
+  /// Folders count even if the archive does not list them: one long name brings many of them.
+  bool hasRoom() {
+    return _seen.size() <= _limits.entries ||
+           device::fail(&_reason, packageError("more than " + std::to_string(_limits.entries) + " files and folders"));
   }
 
   bool writeFile(struct archive_entry* entry, const std::string& name) {
@@ -152,6 +159,7 @@ class Unpacking {
         return refuse(name, "differs from " + shown(found->second.name) + " in case only");
       return refuse(name, "there twice");
     }
+    if (!hasRoom()) return false;
     if (name == _result.bundle) return refuse(name, "a file where the folder should be");
     bool executable = (archive_entry_mode(entry) & 0100) != 0;
     auto writer = _files.createNew(_directory + '/' + name, executable, &_reason);

@@ -14,7 +14,7 @@ namespace device {
 
 /// What a package may be at most. Everything is counted while it is written, whatever the archive says about itself.
 struct PackageLimits {
-  std::size_t entries = 100'000;
+  std::size_t entries = 100'000;  // of the archive; also files and folders, listed or not
   std::uint64_t totalBytes = std::uint64_t{8} << 30;
   std::size_t nameLength = 1024;  // bytes of a whole name
   std::size_t componentLength = 255;

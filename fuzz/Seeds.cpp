@@ -3,18 +3,23 @@
 #include <filesystem>
 #include <fstream>
 #include <iostream>
+#include <iterator>
 #include <limits>
 #include <string>
 #include <utility>
 #include <vector>
 
+#include "fuzz/SampleApp.h"
 #include "plist/PropertyList.h"
+#include "tests/SampleContent.h"
+#include "tests/ZipArchive.h"
 
 namespace {
 
 using platform::Bytes;
 using platform::Date;
 using platform::Value;
+using tests::dictionaryOf;
 
 struct Seed {
   std::string target;
@@ -26,12 +31,6 @@ using Seeds = std::vector<Seed>;
 Value arrayOf(const std::vector<Value>& items) {
   Value value = Value::makeArray();
   for (const auto& item : items) value.array()->append(item);
-  return value;
-}
-
-Value dictionaryOf(const std::vector<std::pair<std::string, Value>>& entries) {
-  Value value = Value::makeDictionary();
-  for (const auto& [key, entry] : entries) value.dictionary()->set(key, entry);
   return value;
 }
 
@@ -84,6 +83,59 @@ void addLists(Seeds& seeds) {
   xml("entities", "<!DOCTYPE plist [<!ENTITY a 'aa'>]><plist><string>&a;</string></plist>");
 }
 
+void addTodoLists(Seeds& seeds) {
+  auto entry = [](const char* identifier, const char* operation) {
+    return dictionaryOf({{"identifier", identifier}, {"operation", operation}, {"version", "2.1"}, {"name", "Maps"}});
+  };
+  const Value lists[] = {
+      arrayOf({entry("com.example.maps", "install"), entry("com.example.notes", "install")}),
+      arrayOf({entry("com.example.maps", "remove"), entry("com.example.maps", "install")}),
+      arrayOf({entry("com.example.maps", "install"), entry("com.example.maps", "install"), "text", 5}),
+      arrayOf({entry("../../x", "install"), entry("a/b", "install"), entry("..", "remove"), entry("", "install")}),
+  };
+  const char* names[] = {"two", "remove-and-install", "twice", "ways-out"};
+  for (std::size_t at = 0; at < std::size(lists); ++at) {
+    seeds.push_back({"todo_list", names[at], at % 2 ? *plist::writeXML(lists[at]) : *plist::writeBinary(lists[at])});
+  }
+}
+
+void addRestoreLists(Seeds& seeds) {
+  const fuzz::SampleApp app;
+  const Value entry = dictionaryOf({{"HarluneMetadata", Value::makeData(app.metadata)},
+                                    {"ApplicationSINF", Value::makeData("rights")},
+                                    {"PlaceholderIcon", Value::makeData(app.icon)}});
+  const Value bare = dictionaryOf({{"HarluneMetadata", Value::makeData(*plist::writeBinary(dictionaryOf({})))}});
+  const Value good =
+      dictionaryOf({{"com.example.maps", entry}, {"com.example.notes", bare}, {"com.example.mail", bare}});
+  const Value odd = dictionaryOf({{"../../x", bare}, {"a/b", bare}, {"", bare}, {"text", "text"}});
+  seeds.push_back({"restore_list", "good", *plist::writeBinary(good)});
+  seeds.push_back({"restore_list", "ways-out", *plist::writeXML(odd)});
+}
+
+void addPackages(Seeds& seeds) {
+  const fuzz::SampleApp app;
+  const tests::ZipArchive::Entry manifest{"Maps.app/Info.plist", app.manifest};
+  seeds.push_back({"package", "good", app.package});
+  seeds.push_back(
+      {"package", "folders", tests::ZipArchive::of({{"Maps.app/", "", 040755}, manifest, {"Maps.app/a/b"}})});
+  seeds.push_back(
+      {"package", "ways-out",
+       tests::ZipArchive::of({manifest, {"Maps.app/../../x", "x"}, {"/canary", "x"}, {"..\\canary", "x"}})});
+  std::vector<tests::ZipArchive::Entry> deep{manifest};
+  for (char name = 'a'; name < 'h'; ++name) deep.push_back({"Maps.app/" + std::string(1, name) + "/b/c/d/e"});
+  seeds.push_back({"package", "folders-not-listed", tests::ZipArchive::of(deep)});
+  seeds.push_back({"package", "link", tests::ZipArchive::of({manifest, {"Maps.app/link", "/canary", 0120777}})});
+  seeds.push_back({"package", "lies", tests::ZipArchive::of({manifest, {"Maps.app/x", "xx", 0100644, 8, 70000}})});
+}
+
+void addIcons(Seeds& seeds) {
+  seeds.push_back({"icon", "small", tests::pngOf(1, 1)});
+  seeds.push_back({"icon", "wide", tests::pngOf(40, 8)});
+  Bytes huge = tests::pngOf(8, 8);
+  huge.replace(16, 8, Bytes("\0\0\x10\0\0\0\x10\1", 8));
+  seeds.push_back({"icon", "larger-than-drawn", huge});
+}
+
 bool write(const std::filesystem::path& folder, const Seed& seed) {
   std::filesystem::create_directories(folder / seed.target);
   std::ofstream file(folder / seed.target / seed.name, std::ios::binary);
@@ -99,6 +151,10 @@ int main(int count, char** arguments) {
   }
   Seeds seeds;
   addLists(seeds);
+  addTodoLists(seeds);
+  addRestoreLists(seeds);
+  addPackages(seeds);
+  addIcons(seeds);
   for (const auto& seed : seeds) {
     if (!write(arguments[1], seed)) {
       std::cerr << arguments[1] << ": cannot write " << seed.target << '/' << seed.name << '\n';
