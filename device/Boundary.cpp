@@ -32,9 +32,12 @@ struct Boundary::State {
   };
 
   // Set before the first call.
-  Journal journal;
+  std::vector<JournalListener> journals;
   Bystander bystander;
   std::vector<std::unique_ptr<Rule>> rules;
+
+  platform::Clock* const clock;
+  const platform::Clock::Instant start;
 
   std::mutex journalMutex;
   std::uint64_t records = 0;  // guarded by journalMutex
@@ -44,6 +47,13 @@ struct Boundary::State {
   std::map<std::pair<const void*, std::string>, KnownObject> objects;
   std::map<std::string, std::uint64_t, std::less<>> lastNumbers;
   std::size_t sweepAt = 256;
+
+  explicit State(platform::Clock* clock) : clock(clock), start(now()) {}
+
+  platform::Clock::Instant now() const { return clock ? clock->now() : platform::Clock::Instant{}; }
+  std::chrono::microseconds elapsed() const {
+    return std::chrono::duration_cast<std::chrono::microseconds>(now() - start);
+  }
 
   void sweep() {
     if (objects.size() < sweepAt) return;
@@ -97,17 +107,19 @@ struct Boundary::State {
   void write(CallRecord record) {
     std::lock_guard lock(journalMutex);
     record.number = ++records;
-    journal(record);
+    record.time = elapsed();
+    for (const auto& journal : journals) journal.hear(record);
   }
 };
 
-Boundary::Boundary() : _state(std::make_unique<State>()) {}
+Boundary::Boundary(platform::Clock* clock) : _state(std::make_unique<State>(clock)) {}
 Boundary::~Boundary() = default;
 
-void Boundary::setJournal(Journal journal) {
-  _state->journal = std::move(journal);
-  _journaled = _state->journal != nullptr;
-  _watched = _journaled || !_state->rules.empty();
+void Boundary::addJournal(JournalListener listener) {
+  _showsWhole |= listener.detail == JournalDetail::whole;
+  _state->journals.push_back(std::move(listener));
+  _journaled = true;
+  _watched = true;
 }
 
 void Boundary::setRules(std::vector<InjectionRule> rules) {
@@ -127,8 +139,10 @@ ErrorRef Boundary::injectedError(const Crossing& crossing) {
   return platform::makeError("Injection", 1, "injected at " + std::string(crossing.service) + "." + crossing.operation);
 }
 
-static CallRecord makeRecord(const Crossing& crossing) {
+CallRecord Boundary::makeRecord(const Visit& visit) {
+  const Crossing& crossing = visit.crossing;
   CallRecord record;
+  record.began = visit.began;
   record.thread = currentThreadName();
   record.service = crossing.service;
   record.operation = crossing.operation;
@@ -140,6 +154,7 @@ void Boundary::begin(Visit& visit, CallArguments arguments) {
   using Action = InjectionRule::Action;
   const Crossing& crossing = visit.crossing;
   if (_journaled) {
+    visit.began = _state->elapsed();
     visit.arguments = Value::makeDictionary();
     for (const auto& argument : arguments) {
       visit.arguments.dictionary()->set(argument.name, argument.journalValue(*this));
@@ -159,7 +174,7 @@ void Boundary::begin(Visit& visit, CallArguments arguments) {
     }
   });
   if (!_journaled || visit.direction == Direction::out || visit.order != Order::run) return;
-  CallRecord record = makeRecord(crossing);
+  CallRecord record = makeRecord(visit);
   record.arguments = std::move(visit.arguments);
   record.argumentNames = std::move(visit.argumentNames);
   _state->write(std::move(record));
@@ -176,7 +191,7 @@ void Boundary::settleError(const Visit& visit, ErrorRef* error) const {
 void Boundary::finish(Visit& visit, Value result, const ErrorRef* error) {
   bool inward = visit.direction == Direction::in;
   if (_journaled && !(inward && visit.order != Order::run)) {
-    CallRecord record = makeRecord(visit.crossing);
+    CallRecord record = makeRecord(visit);
     // Those of a call into the plug-in stand in its first record.
     record.arguments = inward ? Value::makeDictionary() : std::move(visit.arguments);
     record.argumentNames = std::move(visit.argumentNames);
@@ -225,11 +240,11 @@ Value CallArgument::journalValue(Boundary& boundary) const {
     case Kind::real:
       return real;
     case Kind::text:
-      return text;
+      return shownText(boundary, text);
     case Kind::bytes:
       return integer;
     case Kind::value:
-      return *static_cast<const Value*>(pointer);
+      return shownValue(boundary, *static_cast<const Value*>(pointer));
     case Kind::object:
       return boundary.nameOfObject(text.data(), pointer);
     case Kind::error:

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <chrono>
 #include <concepts>
 #include <cstdint>
 #include <functional>
@@ -16,6 +17,7 @@
 #include "device/Injection.h"
 #include "device/JournalValue.h"
 #include "device/ObjectKind.h"
+#include "platform/Clock.h"
 #include "platform/Error.h"
 #include "platform/StringSet.h"
 #include "platform/Value.h"
@@ -105,7 +107,10 @@ struct Crossing {
 
 /// One finished record of the journal, before it is written out.
 struct CallRecord {
-  std::uint64_t number = 0;  // increases by one
+  std::uint64_t number = 0;           // increases by one
+  std::chrono::microseconds began{};  // when the call began; of the second record of a call into the plug-in too
+  std::chrono::microseconds
+      time{};  // when the record was made; both since the boundary was, and `time` never goes back
   std::string thread;
   std::string service;
   std::string operation;
@@ -117,10 +122,20 @@ struct CallRecord {
   bool end = false;                        // the return of a call into the plug-in
 };
 
+/// How much of arguments and results a listener of the journal needs. `brief`: long lists stand as their length and
+/// long texts are cut (see `sketchOf`), so that a record costs the same however much the call was about.
+enum class JournalDetail : std::uint8_t { brief, whole };
+
+/// Gets every record, in the order of its numbers; called under the journal's own lock, must not call back.
+struct JournalListener {
+  std::function<void(const CallRecord&)> hear;
+  JournalDetail detail = JournalDetail::whole;  // at least
+};
+
 /// The one wrapper that every call runs through that crosses between the plug-in and the device, in either direction:
 /// services' operations and queries, daemon calls, callbacks, log and transaction records, file operations; not the
-/// facts of a proxy. It writes the call journal when asked, applies injection rules, and releases held-back events.
-/// With nobody listening and no rules it costs a few nanoseconds. From any thread.
+/// facts of a proxy. It tells the call journal's listeners, if any, applies injection rules, and releases held-back
+/// events. With nobody listening and no rules it costs a few nanoseconds. From any thread.
 ///
 /// What a rule orders:
 /// - `fail`: the body does not run; the answer is `failure`, with an error of the domain "Injection".
@@ -136,20 +151,21 @@ struct CallRecord {
 /// answer true: on false the body did not run, and the completion is to get that error.
 class Boundary {
  public:
-  /// Gets every record in the order of its numbers; called under the journal's own lock, must not call back.
-  using Journal = std::function<void(const CallRecord&)>;
   /// Carries out what somebody else does at this moment (cancel, prioritize, uninstall, store). Rules do not apply to
   /// what it does itself.
   using Bystander = std::function<void(InjectionRule::Action action, const std::string& target)>;
 
-  Boundary();
+  /// `clock`, which outlives the boundary, times the records; without one they carry no times.
+  explicit Boundary(platform::Clock* clock = nullptr);
   ~Boundary();
 
-  /// Set before the first call.
-  void setJournal(Journal journal);
+  /// All set before the first call.
+  void addJournal(JournalListener listener);
   void setRules(std::vector<InjectionRule> rules);
   void setBystander(Bystander bystander);
   bool hasJournal() const noexcept { return _journaled; }
+  /// Whether lists and texts stand in the records whole.
+  bool showsWhole() const noexcept { return _showsWhole; }
 
   /// A call from the plug-in to a service. `body` does the work and answers; `error` is the operation's error
   /// out-parameter (or null), read after the body for the journal. What a failed call answers is by default false,
@@ -211,6 +227,7 @@ class Boundary {
     bool addsError = false;
     bool dies = false;
     std::int64_t number = 0;
+    std::chrono::microseconds began{};
     platform::Value arguments{};
     std::vector<const char*> argumentNames{};
   };
@@ -220,6 +237,7 @@ class Boundary {
   void settleError(const Visit& visit, platform::ErrorRef* error) const;
   /// Writes the record and does what is left to be done after it.
   void finish(Visit& visit, platform::Value result, const platform::ErrorRef* error);
+  static CallRecord makeRecord(const Visit& visit);
   static platform::ErrorRef injectedError(const Crossing& crossing);
 
   template <class Body, class Failure>
@@ -231,6 +249,7 @@ class Boundary {
   std::unique_ptr<State> _state;
   bool _watched = false;  // somebody listens, or there are rules
   bool _journaled = false;
+  bool _showsWhole = false;
 };
 
 template <class Body, class Failure>

@@ -1,7 +1,9 @@
 #pragma once
 
+#include <cstddef>
 #include <memory>
 #include <optional>
+#include <string>
 #include <string_view>
 #include <type_traits>
 #include <vector>
@@ -18,13 +20,30 @@ namespace device {
 /// where there are any; absent for none.
 platform::Value journalValueOfError(const platform::ErrorRef& error);
 
+/// A value with long lists as their length ("[5000 elements]") and long texts cut, data as its count of bytes; small
+/// ones as they are.
+platform::Value sketchOf(const platform::Value& value);
+std::string sketchOfText(std::string_view text);
+std::string sketchOfList(std::size_t count);
+constexpr std::size_t longestShownList = 32;
+
+template <class Names>
+platform::Value shownText(Names& names, std::string_view text) {
+  return names.showsWhole() ? platform::Value(text) : platform::Value(sketchOfText(text));
+}
+template <class Names>
+platform::Value shownValue(Names& names, const platform::Value& value) {
+  return names.showsWhole() ? value : sketchOf(value);
+}
+
 /// How the journal shows results and arguments, by their type. `names` gives objects their names
-/// (`Boundary::nameOfObject`). A type that is none of these is shown as absent.
+/// (`Boundary::nameOfObject`) and tells whether lists and texts are shown whole. A type that is none of these is shown
+/// as absent.
 template <class Names, class T>
 platform::Value journalValue([[maybe_unused]] Names& names, [[maybe_unused]] const T& value,
                              [[maybe_unused]] bool textIsBytes = false) {
   if constexpr (std::is_same_v<T, platform::Value>) {
-    return value;
+    return shownValue(names, value);
   } else if constexpr (std::is_same_v<T, platform::ErrorRef>) {
     return journalValueOfError(value);
   } else if constexpr (std::is_same_v<T, bool> || std::is_integral_v<T>) {
@@ -35,7 +54,7 @@ platform::Value journalValue([[maybe_unused]] Names& names, [[maybe_unused]] con
     return platform::Value(static_cast<std::underlying_type_t<T>>(value));
   } else if constexpr (std::is_convertible_v<const T&, std::string_view>) {
     std::string_view text = value;
-    return textIsBytes ? platform::Value(text.size()) : platform::Value(text);
+    return textIsBytes ? platform::Value(text.size()) : shownText(names, text);
   } else if constexpr (std::is_same_v<T, platform::StringSet>) {
     return journalValue(names, value.members());
   } else if constexpr (std::is_same_v<T, platform::FileAttributes>) {
@@ -68,6 +87,7 @@ platform::Value journalValueOfContent(Names& names, const std::unique_ptr<T>& ob
 }
 template <class Names, class T>
 platform::Value journalValueOfContent(Names& names, const std::vector<T>& values, bool textIsBytes) {
+  if (!names.showsWhole() && values.size() > longestShownList) return platform::Value(sketchOfList(values.size()));
   auto array = platform::Value::makeArray();
   array.array()->reserve(values.size());
   for (const auto& value : values) array.array()->append(journalValue(names, value, textIsBytes));

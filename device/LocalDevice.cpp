@@ -77,6 +77,7 @@ class WholeDevice final : public LocalDevice {
       : _files(std::move(files)),
         _store(std::move(store)),
         _events(std::move(events)),
+        _boundary(&_events->clock()),
         _records(*_store),
         _registryReports(_records, _boundary, *_events, options.changed),
         _coordinatorReports(_boundary, *_events),
@@ -99,7 +100,7 @@ class WholeDevice final : public LocalDevice {
         _transactionLog(_boundary),
         _notifications(_boundary, *_events,
                        [this](const std::string& name, std::uint64_t state) { keepNotificationState(name, state); }) {
-    _boundary.setJournal(std::move(options.journal));
+    for (auto& journal : options.journals) _boundary.addJournal(std::move(journal));
     _boundary.setRules(std::move(options.rules));
     _boundary.setBystander([this](InjectionRule::Action action, const std::string& app) { stepIn(action, app); });
   }

@@ -88,7 +88,7 @@ struct DeviceOptions {
   /// Told of every file operation of the plug-in that failed, as the plug-in passes over some in silence: the
   /// operation, the path and the reason in one line. From any thread. May be null.
   std::function<void(std::string_view operation, std::string_view path, std::string_view reason)> fileFailed;
-  Boundary::Journal journal;
+  std::vector<JournalListener> journals;
   std::vector<InjectionRule> rules;
   /// The daemon's device service; null: one that has neither operation. Calls of the plug-in cross the boundary on
   /// their way to it.

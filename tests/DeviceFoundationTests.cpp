@@ -189,7 +189,7 @@ TEST(Boundary, matchesByClassAppAndCount) {
 TEST(BoundaryDeathTest, killsBeforeOrAfterTheEffect) {
   auto run = [](const char* text) {
     Boundary boundary;
-    boundary.setJournal([](const CallRecord& record) { std::fprintf(stderr, "%s ", record.operation.c_str()); });
+    boundary.addJournal({[](const CallRecord& record) { std::fprintf(stderr, "%s ", record.operation.c_str()); }});
     boundary.setRules({rule(text)});
     boundary.call({"FileSystem", "removeItem"}, nullptr, {}, [] { std::fputs("effect ", stderr); });
     std::fputs("alive", stderr);
@@ -201,7 +201,7 @@ TEST(BoundaryDeathTest, killsBeforeOrAfterTheEffect) {
 TEST(Journal, hasALineForEveryCall) {
   Boundary boundary;
   std::string lines;
-  boundary.setJournal([&](const CallRecord& record) { lines += journalLine(record) + "\n"; });
+  boundary.addJournal({[&](const CallRecord& record) { lines += journalLine(record) + "\n"; }});
   boundary.setRules({rule("applicationInstallsDidCancel=none")});
   auto asset = platform::TSAsset::downloadAssetWithIdentifier("a", "Application", std::nullopt);
   auto other = std::make_shared<platform::TSAsset>();
@@ -228,35 +228,47 @@ TEST(Journal, hasALineForEveryCall) {
                   return platform::makeError("E", 1, "why", error);
                 });
   EXPECT_EQ(lines,
-            R"({"n":1,"thread":"daemon","service":"AppsClient","op":"reconcileSync","app":null,)"
+            R"({"n":1,"t":0,"thread":"daemon","service":"AppsClient","op":"reconcileSync","app":null,)"
             R"("args":{"syncType":1,"newAnchor":"x"},"result":null,"error":null})"
             "\n"
-            R"({"n":2,"thread":"daemon","service":"TSDeviceService","op":"prioritizeAsset","app":"a",)"
+            R"({"n":2,"t":0,"thread":"daemon","service":"TSDeviceService","op":"prioritizeAsset","app":"a",)"
             R"("args":{"asset":"asset#1","all":["asset#2","asset#1"]},"result":true,"error":null})"
             "\n"
-            R"({"n":3,"thread":"daemon","service":"AppsClient","op":"reconcileSync","app":null,)"
+            R"({"n":3,"t":0,"thread":"daemon","service":"AppsClient","op":"reconcileSync","app":null,)"
             R"("args":{},"result":true,"error":null,"end":true})"
             "\n"
-            R"({"n":4,"thread":"daemon","service":"log","op":"default","app":null,"category":"8","text":"café \")"
+            R"({"n":4,"t":0,"thread":"daemon","service":"log","op":"default","app":null,"category":"8","text":"café \")"
             "\xEF\xBF\xBD"
             R"(\""})"
             "\n"
-            R"({"n":5,"thread":"daemon","service":"FileSystem","op":"readFile","app":null,)"
+            R"({"n":5,"t":0,"thread":"daemon","service":"FileSystem","op":"readFile","app":null,)"
             R"("args":{"path":null,"big":18446744073709551615,"half":0.5},"result":5,"error":null})"
             "\n"
-            R"({"n":6,"thread":"transfer-1","service":"RVAppInstallCoordinator","op":"error","app":"a",)"
+            R"({"n":6,"t":0,"thread":"transfer-1","service":"RVAppInstallCoordinator","op":"error","app":"a",)"
             R"("args":{"on":"coordinator#1","bytes":9},"result":{"domain":"E","code":1,"description":"why",)"
             R"("underlying":{"domain":"TSError","code":29}},"error":{"domain":"TSError","code":29}})"
             "\n");
+  auto last = parseJournalLine(std::string_view(lines).substr(lines.rfind('\n', lines.size() - 2) + 1));
+  ASSERT_TRUE(last);
+  EXPECT_EQ(last->app + last->thread + last->operation, "atransfer-1error");
+  EXPECT_EQ(last->error->describe() + jsonText(last->arguments), R"(TSError 29{"on":"coordinator#1","bytes":9})");
+  EXPECT_FALSE(parseJournalLine("{\"n\":1"));
   EXPECT_EQ(boundary.nameOfObject("coordinator", &coordinator), "coordinator#1");
   boundary.forgetObject(&coordinator);
   EXPECT_EQ(boundary.nameOfObject("coordinator", &coordinator), "coordinator#2");
 }
 
 TEST(Journal, numbersRecordsInTheOrderTheyArrive) {
-  Boundary boundary;
+  auto queue = makeThreadedEventQueue();
+  Boundary boundary(&queue->clock());
   std::vector<std::uint64_t> numbers;
-  boundary.setJournal([&](const CallRecord& record) { numbers.push_back(record.number); });
+  std::chrono::microseconds last{};
+  boundary.addJournal({[&](const CallRecord& record) { numbers.push_back(record.number); }});
+  boundary.addJournal({[&](const CallRecord& record) {
+    EXPECT_EQ(numbers.back(), record.number);
+    EXPECT_TRUE(last <= record.time && record.began <= record.time);
+    last = record.time;
+  }});
   std::vector<std::thread> threads;
   for (int i = 0; i < 4; ++i) {
     threads.emplace_back([&] {
@@ -286,6 +298,16 @@ TEST(JournalText, isValidJSONForAnyValue) {
             "\"data\":3,\"list\":[],\"bad\xEF\xBF\xBD\":false}");
   EXPECT_EQ(jsonText({}), "null");
   EXPECT_EQ(jsonText(Value("x"), 2), "\"x\"");
+  EXPECT_EQ(valueOfJson(jsonText(value, 2)), valueOfJson(jsonText(value)));
+
+  auto list = Value::makeArray();
+  for (int i = 0; i < 1000; ++i) list.array()->append(i);
+  entries.set("list", list);
+  entries.set("data", std::string(5000, 'x'));
+  std::string brief = jsonText(sketchOf(value));
+  EXPECT_NE(brief.find("\"list\":\"[1000 elements]\""), std::string::npos) << brief;
+  EXPECT_NE(brief.find("x… (5000 bytes)\""), std::string::npos) << brief;
+  EXPECT_LT(brief.size(), 1300u);
 }
 
 TEST(FileSystemService, tellsOfFailuresNobodyLooksAt) {
@@ -342,7 +364,7 @@ TEST(Logs, areWrittenAsLines) {
 
   SystemLogService deaf(boundary, nullptr);
   EXPECT_FALSE(deaf.makeHandle("8")->isEnabled(platform::LogLevel::error));
-  boundary.setJournal([](const CallRecord&) {});
+  boundary.addJournal({[](const CallRecord&) {}});
   EXPECT_TRUE(deaf.makeHandle("8")->isEnabled(platform::LogLevel::error));
 }
 

@@ -80,10 +80,10 @@ PluginRig::PluginRig(const Options& options) {
   chosen.mainBundleIdentifier = options.process;
   chosen.deviceService = &_transfers;
   if (options.journaled) {
-    chosen.journal = [this](const CallRecord& record) {
+    chosen.journals.push_back({[this](const CallRecord& record) {
       // What the transaction log makes of its records says the same again.
       if (!isTransactionMessage(record)) _records.push_back(record);
-    };
+    }});
   }
   for (const auto& rule : options.rules) {
     ErrorRef error;

@@ -43,7 +43,8 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
     };
   }
   if (_calls) {
-    options.journal = [this](const device::CallRecord& record) { _calls->write(device::journalLine(record)); };
+    options.journals.push_back(
+        {[this](const device::CallRecord& record) { _calls->write(device::journalLine(record)); }});
   }
   return options;
 }
