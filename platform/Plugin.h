@@ -8,7 +8,12 @@
 
 namespace platform {
 
-/// Grows whenever an interface in this folder changes in a way that a plug-in or a host built before would not survive.
+/// What a plug-in and its host must have in common. They share C++ types, so the number grows with every change to a
+/// class, a function or a constant of these headers that the two could see differently: an operation added, removed,
+/// moved or given other parameters, a field added, another order of `Platform`, another meaning of a value or a promise
+/// taken back. It stays for what only one side sees: comments that say more of the same, functions that are not virtual
+/// and are compiled into each side, what the plug-in does behind `TSClient`. There is no partial match: a host takes a
+/// plug-in of its own number and refuses any other. Both are built with the same C++ standard library.
 constexpr std::uint32_t pluginInterfaceVersion = 1;
 
 /// What a plug-in's library answers from its entry point. The first field never moves; a host looks at the others

@@ -33,94 +33,61 @@ class DeviceServices : public testing::TestWithParam<Medium>, protected DeviceRi
 
 INSTANTIATE_TEST_SUITE_P(Media, DeviceServices, testing::Values(Medium::disk, Medium::memory), nameOfMedium);
 
-TEST_P(DeviceServices, LookUpRules) {
-  auto lookUp = [&](Kind kind, bool create, const char* app = maps) {
-    bool created = true;
-    ErrorRef error;
-    auto found = coordination().coordinatorForAppWithBundleID(kind, app, 3, create, &created, &error);
-    return std::string(found ? "found" : "none") + (created ? " new" : "") + (error ? " error" : "");
-  };
-  constexpr auto any = Kind::RVAppInstallCoordinator;
-  constexpr auto initiating = Kind::RVInitiatingAppInstallCoordinator;
-  constexpr auto updating = Kind::RVUpdatingAppInstallCoordinator;
-  EXPECT_EQ(lookUp(any, false), "none");
-  EXPECT_EQ(lookUp(initiating, false), "none");
-  EXPECT_EQ(lookUp(any, true), "none error");
-  EXPECT_EQ(lookUp(initiating, true), "found new");
-  EXPECT_EQ(lookUp(initiating, true), "found");
-  EXPECT_EQ(lookUp(any, false), "found");
-  EXPECT_EQ(lookUp(updating, true), "none error");
-  EXPECT_EQ(lookUp(Kind::RVRestoringAppInstallCoordinator, false), "none error");
-  EXPECT_EQ(lookUp(initiating, true, "../etc"), "none error");
-  EXPECT_EQ(lookUp(initiating, true, ""), "none error");
-  // What another client made is found, and says whose it is.
-  ASSERT_TRUE(device().beginStoreInstall(notes, {}));
-  auto foreign = coordination().coordinatorForAppWithBundleID(initiating, notes, 3, true);
+TEST_P(DeviceServices, WhatTheStoreDoes) {
+  device::StoreInstall paused;
+  paused.paused = true;
+  paused.installState = 2;
+  ASSERT_TRUE(device().beginStoreInstall(notes, paused));
+  auto foreign = coordination().coordinatorForAppWithBundleID(Kind::RVInitiatingAppInstallCoordinator, notes, 3, true);
   ASSERT_TRUE(foreign);
   EXPECT_EQ(foreign->creatorIdentifier(), 1u);
-  EXPECT_EQ(foreign->bundleID(), notes);
-}
-
-TEST_P(DeviceServices, WhatACoordinatorRefuses) {
-  auto coordinator = this->coordinator(Kind::RVInitiatingAppInstallCoordinator);
-  auto refused = [](bool result, const ErrorRef& error) { return !result && error; };
-  ErrorRef error;
-  EXPECT_FALSE(coordinator->appAssetPromiseWithError(&error));
-  EXPECT_TRUE(error);
-  EXPECT_TRUE(refused(coordinator->setPlaceholderPromise(nullptr, &error), error));
-  EXPECT_TRUE(refused(coordinator->setPlaceholderPromise(placeholder(notes), &error), error));
-  EXPECT_TRUE(refused(coordinator->setAppAssetPromise(nullptr, &error), error));
-  auto cancelled = placeholder();
-  EXPECT_TRUE(cancelled->cancelForReason(platform::makeError("TSError", 1), 3));
-  EXPECT_TRUE(refused(coordinator->setPlaceholderPromise(cancelled, &error), error));
-  EXPECT_FALSE(coordinator->hasPlaceholderPromise());
-  auto configured = placeholder();
-  EXPECT_TRUE(refused(configured->setMetadata(nullptr, &error), error));
-  EXPECT_TRUE(coordinator->setPlaceholderPromise(configured, &error));
-  EXPECT_FALSE(error);
-  EXPECT_TRUE(refused(coordinator->setPlaceholderPromise(placeholder(), &error), error));
-  // An empty list of initial promises is one, too.
-  EXPECT_FALSE(coordinator->hasInitialZDRAssetPromises());
-  EXPECT_TRUE(coordinator->setInitialZDRAssetPromises({}));
-  EXPECT_TRUE(coordinator->hasInitialZDRAssetPromises());
-  auto promise = this->promise(coordinator);
-  EXPECT_EQ(coordinator->appAssetPromiseWithError(), promise);
-  EXPECT_TRUE(refused(coordinator->setAppAssetPromise(promise, &error), error));
-  // An install does not outlive its package's promise, and a promise kept afterwards comes to nothing.
-  EXPECT_TRUE(promise->cancelForReason(platform::makeError("TSError", 30), 3));
-  promise->setComplete(true);
-  deliver();
-  EXPECT_EQ(stateOf(), "");
-  EXPECT_TRUE(refused(coordinator->setUserDataPromise(
-                          coordination().makePromisedOutOfBandTransfer("com.example.maps-UserData", 3, 0), &error),
-                      error));
-  EXPECT_FALSE(coordinator->hasUserDataPromise());
-}
-
-TEST_P(DeviceServices, CallbacksGoToTheObserverElseToTheClientsObservers) {
-  auto own = std::make_shared<RecordingDelegate>();
-  auto ofClient = std::make_shared<RecordingDelegate>();
-  auto ofOthers = std::make_shared<RecordingDelegate>();
-  auto registration = coordination().makeAppInstallObserver("service", {2, 3}, ofClient);
-  auto other = coordination().makeAppInstallObserver("service", {1}, ofOthers);
+  auto observer = watchRegistry();
   begin(Kind::RVInitiatingAppInstallCoordinator);
   deliver();
-  EXPECT_EQ(ofClient->lines, Lines{"placeholder"});
-  auto coordinator = this->coordinator(Kind::RVInitiatingAppInstallCoordinator);
-  coordinator->setObserver(own);
+  EXPECT_EQ(observer->lines.back(), "runs com.example.maps/10 paused com.example.notes/20");
+  device::StoreInstall odd;
+  odd.installType = 40;
+  odd.installState = 41;
+  odd.installPhase = 42;
+  odd.createsCoordinator = false;
+  ASSERT_TRUE(device().beginStoreInstall(notes, odd));
+  deliver();
+  EXPECT_EQ(observer->lines.back(), "runs com.example.maps/10 com.example.notes/4142");
+  EXPECT_EQ(stateOf(notes), "placeholder 40");
+  device::StoreInstall system;
+  system.applicationType = "System";
+  system.systemBundle = true;
+  system.hasProgress = false;
+  ASSERT_TRUE(device().beginStoreInstall("com.example.other", system));
+  auto countOfType = [&](std::uint64_t type) {
+    int count = 0;
+    registry().enumerateBundlesOfType(type, [&](const auto&, bool&) { ++count; });
+    return count;
+  };
+  EXPECT_EQ(countOfType(1), 3);
+  EXPECT_EQ(countOfType(7), 1);
+  EXPECT_EQ(countOfType(3), 0);
+}
+
+TEST_P(DeviceServices, WhatThePersonDoes) {
+  auto delegate = observe(coordinator(Kind::RVInitiatingAppInstallCoordinator));
   ASSERT_TRUE(device().prioritizeByPerson(maps));
   deliver();
-  EXPECT_EQ(own->lines, Lines{"prioritize"});
-  own.reset();
-  ASSERT_TRUE(device().prioritizeByPerson(maps));
-  deliver();
-  EXPECT_EQ(ofClient->lines, (Lines{"placeholder", "prioritize"}));
-  ASSERT_TRUE(device().prioritizeByPerson(maps));
-  registration.reset();
-  deliver();
-  EXPECT_EQ(ofClient->lines.size(), 2u);
-  EXPECT_TRUE(ofOthers->lines.empty());
+  EXPECT_EQ(delegate->lines, Lines{"prioritize"});
   EXPECT_FALSE(device().prioritizeByPerson(notes));
+  install(notes, "1");
+  EXPECT_TRUE(device().uninstallByPerson(notes));
+  EXPECT_FALSE(device().uninstallByPerson(notes));
+  EXPECT_TRUE(platform().installer.CorvaneLookupUninstalled().dictionary()->contains(notes));
+}
+
+TEST_P(DeviceServices, NamesThatAreNoIdentifiers) {
+  for (const char* name : {"../etc", "", "a/b"}) {
+    ErrorRef error;
+    EXPECT_FALSE(coordination().coordinatorForAppWithBundleID(Kind::RVInitiatingAppInstallCoordinator, name, 3, true,
+                                                              nullptr, &error));
+    EXPECT_TRUE(error) << name;
+  }
 }
 
 TEST_P(DeviceServices, CallbacksWaitForTheCallersNextCall) {
@@ -133,114 +100,6 @@ TEST_P(DeviceServices, CallbacksWaitForTheCallersNextCall) {
   EXPECT_GT(events().pending(), before);
   deliver();
   EXPECT_EQ(delegate->lines, Lines{"placeholder"});
-}
-
-TEST_P(DeviceServices, AnObserverMayCallTheServicesBack) {
-  auto promise = begin(Kind::RVInitiatingAppInstallCoordinator);
-  auto coordinator = this->coordinator(Kind::RVInitiatingAppInstallCoordinator);
-  auto delegate = observe(coordinator);
-  delegate->then = [&](const Coordinator& each) {
-    registry().enumerateBundlesOfType(0, [&](const auto&, bool&) { registry().uninstallApplication(maps); });
-    each->setObserver({});
-  };
-  auto observer = std::make_shared<RecordingObserver>();
-  observer->then = [&] { registry().removeObserver(observer.get()); };
-  registry().addObserver(observer);
-  deliver();
-  EXPECT_EQ(delegate->lines, Lines{"placeholder"});
-  EXPECT_EQ(observer->lines.size(), 1u);
-  EXPECT_EQ(stateOf(), "");
-}
-
-TEST_P(DeviceServices, RegistryReports) {
-  device::StoreInstall paused;
-  paused.paused = true;
-  paused.installState = 2;
-  ASSERT_TRUE(device().beginStoreInstall(notes, paused));
-  begin(Kind::RVInitiatingAppInstallCoordinator);
-  deliver();
-  auto observer = std::make_shared<RecordingObserver>();
-  registry().addObserver(observer);
-  EXPECT_TRUE(observer->lines.empty());
-  deliver();
-  EXPECT_EQ(observer->lines, Lines{"runs com.example.maps/10 paused com.example.notes/20"});
-  device::StoreInstall odd;
-  odd.installType = 40;
-  odd.installState = 41;
-  odd.installPhase = 42;
-  odd.createsCoordinator = false;
-  ASSERT_TRUE(device().beginStoreInstall(notes, odd));
-  deliver();
-  EXPECT_EQ(observer->lines.back(), "runs com.example.maps/10 com.example.notes/4142");
-  EXPECT_EQ(stateOf(notes), "placeholder 40");
-  registry().removeObserver(observer.get());
-  ASSERT_TRUE(device().uninstallByPerson(notes));
-  deliver();
-  EXPECT_EQ(observer->lines.size(), 2u);
-  registry().addObserver(observer);
-  std::weak_ptr<RecordingObserver> alive = observer;
-  observer.reset();
-  EXPECT_TRUE(alive.expired());
-  deliver();
-}
-
-TEST_P(DeviceServices, TheRegistrysViewOfApps) {
-  install(maps, "1");
-  device::StoreInstall system;
-  system.applicationType = "System";
-  system.systemBundle = true;
-  system.hasProgress = false;
-  ASSERT_TRUE(device().beginStoreInstall(notes, system));
-  auto listed = [&](std::uint64_t type) {
-    Lines ids;
-    registry().enumerateBundlesOfType(type,
-                                      [&](const auto& bundle, bool&) { ids.push_back(*bundle->bundleIdentifier); });
-    return ids;
-  };
-  EXPECT_EQ(listed(0), (Lines{maps, notes}));
-  EXPECT_EQ(listed(1), (Lines{maps, notes}));
-  EXPECT_EQ(listed(7), Lines{notes});
-  EXPECT_EQ(listed(3), Lines{});
-  int calls = 0;
-  registry().enumerateBundlesOfType(0, [&](const auto&, bool& stop) { stop = ++calls == 1; });
-  EXPECT_EQ(calls, 1);
-  EXPECT_TRUE(registry().applicationIsInstalled(maps));
-  EXPECT_FALSE(registry().applicationIsInstalled(notes));
-  EXPECT_FALSE(registry().applicationProxyForIdentifier(notes, false));
-  EXPECT_FALSE(registry().applicationProxyForIdentifier(maps, true));
-  auto proxy = registry().applicationProxyForIdentifier(maps, false);
-  ASSERT_TRUE(proxy);
-  EXPECT_TRUE(proxy->isInstalled && proxy->appState.isInstalled && !proxy->isPlaceholder);
-  EXPECT_GT(proxy->diskUsage.staticUsage, 10u);
-  EXPECT_EQ(files().readFile(*proxy->bundleURL + "/data/tiles"), "0123456789");
-  // A proxy is a snapshot.
-  ASSERT_TRUE(registry().uninstallApplication(maps));
-  EXPECT_FALSE(registry().uninstallApplication(maps));
-  EXPECT_TRUE(proxy->isInstalled);
-}
-
-TEST_P(DeviceServices, UninstalledApps) {
-  install(maps, "1");
-  install(notes, "1");
-  Lines completions;
-  auto uninstall = [&](const std::string& app) {
-    coordination().uninstallAppWithBundleID(app, false, [&completions, app](const ErrorRef& error) {
-      completions.push_back(app + (error ? " error" : ""));
-    });
-  };
-  uninstall(maps);
-  uninstall("com.example.none");
-  EXPECT_TRUE(completions.empty());
-  events().release();
-  deliver();
-  EXPECT_EQ(completions, (Lines{"com.example.maps", "com.example.none error"}));
-  EXPECT_TRUE(device().uninstallByPerson(notes));
-  auto uninstalled = platform().installer.CorvaneLookupUninstalled();
-  EXPECT_EQ(uninstalled.dictionary()->size(), 2u);
-  install(maps, "2");
-  EXPECT_FALSE(platform().installer.CorvaneLookupUninstalled().dictionary()->contains(maps));
-  EXPECT_EQ(platform().installer.CorvaneClearUninstalled({notes}), 0);
-  EXPECT_TRUE(platform().installer.CorvaneLookupUninstalled().dictionary()->empty());
 }
 
 TEST_P(DeviceServices, HomeScreenLayouts) {

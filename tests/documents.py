@@ -39,7 +39,7 @@ def broken_links(document, text):
 
 def strange_examples(document, text):
     """Blocks of C++ that are not in a program of examples/, where they are compiled and run."""
-    programs = [path.read_text(encoding="utf-8") for path in (ROOT / "examples").glob("*.cpp")]
+    programs = [path.read_text(encoding="utf-8") for path in (ROOT / "examples").rglob("*.cpp")]
     for language, block in FENCE.findall(text):
         if language == "cpp" and not any(block in program for program in programs):
             yield f"{document.relative_to(ROOT)}: not in any program of examples/:\n{block}"

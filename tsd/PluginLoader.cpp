@@ -33,10 +33,14 @@ PluginLoader::PluginLoader(const std::string& file) : _file(file) {
 }
 
 std::string PluginLoader::defaultFile() {
+  constexpr const char* name = "libApplicationSync.so";
   std::error_code problem;
   auto program = std::filesystem::read_symlink("/proc/self/exe", problem);
-  return (problem ? std::filesystem::path("libApplicationSync.so") : program.parent_path() / "libApplicationSync.so")
-      .string();
+  if (problem) return name;
+  auto beside = program.parent_path() / name;
+  auto installed = program.parent_path() / PLUGIN_FOLDER / name;
+  bool isInstalled = !std::filesystem::exists(beside, problem) && std::filesystem::exists(installed, problem);
+  return (isInstalled ? installed.lexically_normal() : beside).string();
 }
 
 std::shared_ptr<platform::TSClient> PluginLoader::create(const platform::Platform& platform) const {

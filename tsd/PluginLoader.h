@@ -15,7 +15,7 @@ class PluginLoader {
   /// entry point, its interface has another version, its table is incomplete.
   explicit PluginLoader(const std::string& file);
 
-  /// The plug-in beside this program.
+  /// The plug-in beside this program, or where the two are installed together.
   static std::string defaultFile();
 
   /// The plug-in object, one per process. Throws a `CommandError` when it cannot be made.
