@@ -4,7 +4,8 @@
 usage: documents.py [BIN]
 
 BIN is the folder of the built program. With it the blocks marked `sh` are run, those of a document as one script that
-has to end with 0, in an empty folder where `build/release/bin` is BIN. Blocks marked otherwise are only shown.
+has to end with 0, in an empty folder where `build/release/bin` is BIN. Blocks marked otherwise are only shown; `make`
+has the targets that those marked `console` name.
 """
 
 import os
@@ -45,6 +46,16 @@ def strange_examples(document, text):
             yield f"{document.relative_to(ROOT)}: not in any program of examples/:\n{block}"
 
 
+def unknown_targets(document, text):
+    """`make` commands of the blocks that are only shown, with a target that the Makefile does not have."""
+    targets = set(re.findall(r"^([\w-]+):", (ROOT / "Makefile").read_text(encoding="utf-8"), re.MULTILINE))
+    for language, block in FENCE.findall(text):
+        for command in re.findall(r"^make ([^#;\n]*)", block, re.MULTILINE) if language == "console" else []:
+            for word in command.split():
+                if "=" not in word and word not in targets:
+                    yield f"{document.relative_to(ROOT)}: make {word}: there is no such target"
+
+
 def failing_commands(document, text, program_folder):
     script = "".join(block for language, block in FENCE.findall(text) if language == "sh")
     if not script:
@@ -66,6 +77,7 @@ def main():
         text = document.read_text(encoding="utf-8")
         problems += broken_links(document, text)
         problems += strange_examples(document, text)
+        problems += unknown_targets(document, text)
         if len(sys.argv) > 1:
             problems += failing_commands(document, text, os.path.abspath(sys.argv[1]))
     print("\n".join(problems) or f"{len(documents)} documents in order")
