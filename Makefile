@@ -2,8 +2,8 @@
 # presets of CMakePresets.json, each in build/<preset>.
 
 .DEFAULT_GOAL := help
-.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate fuzz bench format clean packages \
-        check-packages fuzz-packages
+.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate fuzz bench deb format clean packages \
+        check-packages fuzz-packages deb-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
 SEEDS ?=
@@ -30,10 +30,11 @@ demo: build ## a whole life of a device, from the first sync to a restore, in a 
 test: build-all ## all tests (SEEDS=N: that many random scenarios)
 	@cd build/release && $(WITH_SEEDS) $(CTEST)
 
-check: check-packages ## format, clang-tidy, includes, sizes, documents
+check: check-packages ## format, sizes, includes, spelling, documents, clang-tidy, clang's thread-safety analysis
 	@mkdir -p build
 	@cmake --preset clang >build/clang.configured
 	@.ci/check build/clang
+	@cmake --build --preset clang
 
 asan: packages ## all tests with the address and undefined-behaviour sanitizers
 	@$(call PRESET,asan)
@@ -63,6 +64,12 @@ fuzz: fuzz-packages ## looks for inputs that break something: make fuzz RUNS=100
 bench: build-all ## the speed of everything against its goals, as a table
 	@bench/table.py build/release/bin
 
+deb: deb-packages ## Debian packages of the plug-in, its headers and the program, tried in build/package/root
+	@$(call PRESET,package,tsd ApplicationSync platform plist written_by_program)
+	@rm -rf build/package/packages
+	@cd build/package && cpack -B packages >cpack.log || { cat cpack.log; exit 1; }
+	@packaging/check build/package
+
 format: check-packages ## puts every source file into the common format
 	@git ls-files -z '*.h' '*.cpp' | xargs -0 clang-format -i
 
@@ -77,3 +84,6 @@ check-packages:
 
 fuzz-packages:
 	@.ci/packages fuzz
+
+deb-packages:
+	@.ci/packages deb

@@ -61,6 +61,8 @@ install(FILES ${completions}/zsh DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor
         COMPONENT program)
 install(FILES ${completions}/fish DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d RENAME tsd.fish
         COMPONENT program)
+set_property(SOURCE ${CMAKE_SOURCE_DIR}/tsd/main.cpp TARGET_DIRECTORY tsd
+             APPEND PROPERTY COMPILE_DEFINITIONS TSD_VERSION="${PROJECT_VERSION}")
 # Where the program looks for the plug-in when it does not lie beside it.
 file(RELATIVE_PATH plugin_from_program /${CMAKE_INSTALL_BINDIR} /${plugin_folder})
 set_property(SOURCE ${CMAKE_SOURCE_DIR}/tsd/PluginLoader.cpp TARGET_DIRECTORY tsd

@@ -1,9 +1,10 @@
 #!/usr/bin/env python3
 """What an integrator gets: the installed tree, moved elsewhere, and programs built against it and nothing else.
 
-usage: installed_tree_tests.py BUILD
+usage: installed_tree_tests.py BUILD [TREE]
 
-Installs BUILD below BUILD/installed; what is compiled there stays, so that the next run has less to do.
+Installs BUILD below BUILD/installed, unless a TREE is given that came about in another way. What is compiled there
+stays, so that the next run has less to do.
 """
 
 import os
@@ -63,8 +64,9 @@ def main():
     settings = cache_of(build)
     work = build / "installed"
     work.mkdir(exist_ok=True)
-    prefix = work / "tree"
-    install(build, prefix)
+    prefix = pathlib.Path(sys.argv[2]).resolve() if len(sys.argv) > 2 else work / "tree"
+    if len(sys.argv) == 2:
+        install(build, prefix)
     check_headers(prefix)
     library = next(prefix.glob("lib*/**/libApplicationSync.so"))
     run(sys.executable, ROOT / "tests/plugin_library.py", library)
@@ -92,10 +94,10 @@ def main():
     run(prefix / "bin/tsd", "sample", "host", cwd=fresh(work / "run"))
     run(prefix / "bin/tsd", "init", "phone", cwd=work / "run")
     run(prefix / "bin/tsd", "sync", "phone", "host", "--progress", "none", cwd=work / "run")
-    for name in ["man/man1/tsd-sync.1", "bash-completion/completions/tsd", "zsh/vendor-completions/_tsd",
+    for name in ["man/man1/tsd-sync.1*", "bash-completion/completions/tsd", "zsh/vendor-completions/_tsd",
                  "fish/vendor_completions.d/tsd.fish"]:
-        if not (prefix / "share" / name).stat().st_size:
-            sys.exit(f"share/{name} is empty")
+        if not any(path.stat().st_size for path in prefix.glob(f"share/{name}")):
+            sys.exit(f"share/{name} is not there, or empty")
     print(f"{prefix}: a host builds and runs, and so does the program")
 
 

@@ -35,7 +35,7 @@ const std::map<std::string, ProgressMode> progressModes{{"auto", ProgressMode::a
                                                         {"none", ProgressMode::none}};
 
 constexpr const char* commonGroup = "Common";
-constexpr const char* version = "1.0.0";
+constexpr const char* version = TSD_VERSION;
 
 const std::vector<ExitCodeEntry> exitCodes{
     {ExitCode::done, "done"},
