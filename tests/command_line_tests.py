@@ -5,6 +5,7 @@ usage: command_line_tests.py TSD [unittest arguments]
 """
 
 import collections
+import contextlib
 import fcntl
 import json
 import os
@@ -13,9 +14,11 @@ import plistlib
 import re
 import shutil
 import signal
+import struct
 import subprocess
 import sys
 import tempfile
+import termios
 import unittest
 
 TSD = None
@@ -266,6 +269,36 @@ class Syncs(Folder):
         self.assertIn("asset transfer ended withsuccess: n", log)
         self.assertIn("sync ended with success: n", log)
         self.assertNotIn("asset transfer succeeded", log)
+
+    def test_bars_on_a_terminal(self):
+        apps = self.make(12)
+        pathlib.Path(f"host/Packages/{apps[3]}.pkg").write_bytes(b"no archive")
+        terminal, program_side = os.openpty()
+        sizes = [(9, 20), (30, 80)]
+        fcntl.ioctl(terminal, termios.TIOCSWINSZ, struct.pack("4H", *sizes[0], 0, 0))
+        run = subprocess.Popen([TSD, "sync", "dev", "host"], stdout=subprocess.PIPE, stderr=program_side,
+                               env={**os.environ, "TERM": "xterm", "NO_COLOR": "1"})
+        os.close(program_side)
+        shown = b""
+        with contextlib.suppress(OSError):  # that the other side is closed
+            while piece := os.read(terminal, 65536):
+                shown += piece
+                if b"Sending" in shown:
+                    fcntl.ioctl(terminal, termios.TIOCSWINSZ, struct.pack("4H", *sizes[1], 0, 0))
+        os.close(terminal)
+        run.communicate(timeout=60)
+        self.assertEqual(run.returncode, SOME_FAILED)
+        frames = re.findall(r"\x1b\[\?7l(.*?)\x1b\[\?7h", shown.decode(), re.DOTALL)
+        reached = collections.defaultdict(int)
+        for frame in frames:
+            rows = [row.rstrip() for row in frame.split("\x1b[K\r\n")[:-1]]
+            self.assertTrue(any(len(rows) < height and all(len(row) < width for row in rows)
+                                for height, width in sizes), rows)
+            for name, percent in re.findall(r"^(\S+) .*?(\d+) %", "\n".join(rows), re.MULTILINE):
+                self.assertGreaterEqual(int(percent), reached[name])
+                reached[name] = int(percent)
+        self.assertGreater(len(reached), 1)
+        self.assertLess(reached["12"], 100)  # "12 apps", of which one failed
 
     def test_the_order_of_packages_can_be_changed(self):
         apps = self.make(4)

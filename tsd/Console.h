@@ -6,14 +6,9 @@
 #include <string_view>
 #include <vector>
 
-namespace tsd {
+#include "tsd/TerminalText.h"
 
-/// Text from elsewhere, made harmless for a terminal: control characters and broken UTF-8 become '?'.
-std::string printable(std::string_view text);
-/// Columns that a text takes on a terminal, one for each character.
-std::size_t columnsOf(std::string_view text);
-/// `printable(text)` in exactly `columns` columns: filled up with spaces, or cut with "…" at its end.
-std::string fitted(std::string_view text, std::size_t columns);
+namespace tsd {
 
 /// Standard error: messages above, and below them, on a terminal, a few lines that are redrawn in place.
 /// From any thread; never fails.
@@ -27,24 +22,25 @@ class Console {
   void line(std::string_view text);
   /// "tsd: " and the text, one line.
   void message(std::string_view text);
-  /// Replaces the lines that are redrawn in place; none takes them away.
-  void setRegion(std::vector<std::string> lines);
-  /// The region's lines stay where they are as ordinary lines.
-  void keepRegion();
+  /// Replaces the lines that are redrawn in place; none takes them away. A line that is too wide for the terminal is
+  /// cut by it; that the terminal has become narrower since the last time is allowed for.
+  void setRegion(std::vector<TerminalLine> lines);
 
   struct Size {
     std::size_t rows;
     std::size_t columns;
   };
   static bool isTerminal();
+  /// Whether the person wants colours on a terminal.
+  static bool wantsColours();
   static Size size();
 
  private:
-  std::string eraseRegion() const;
+  std::string toRegionsBegin() const;
   std::string drawRegion() const;
 
   std::mutex _mutex;
-  std::vector<std::string> _region;  // guarded by _mutex
+  std::vector<TerminalLine> _region;  // guarded by _mutex
 };
 
 /// Writes to standard output; throws a `CommandError` when that fails.

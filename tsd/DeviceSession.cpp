@@ -49,9 +49,20 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
   return options;
 }
 
-platform::TSClient& DeviceSession::loadPlugin() { return loadPlugin(_device->platform()); }
+platform::TSClient& DeviceSession::loadPlugin() { return makeClient(_device->platform()); }
 
-platform::TSClient& DeviceSession::loadPlugin(const platform::Platform& platform) {
+platform::TSClient& DeviceSession::loadPlugin(const StopSignal& stop, CountdownClock::Tick tick) {
+  const auto& services = _device->platform();
+  _clock.emplace(services.clock, stop, std::move(tick));
+  _platform.emplace(platform::Platform{
+      services.process, *_clock, services.fileSystem, services.propertyLists, services.systemLog, services.support,
+      services.deviceService, services.installCoordination, services.workspace, services.installer, services.backup,
+      services.restrictions, services.homeScreen, services.iconRenderer, services.imageEncoder, services.transactionLog,
+      services.notifications});
+  return makeClient(*_platform);
+}
+
+platform::TSClient& DeviceSession::makeClient(const platform::Platform& platform) {
   if (!_loader) {
     const std::string& chosen = _context.options.plugin;
     _loader.emplace(chosen.empty() ? PluginLoader::defaultFile() : chosen);

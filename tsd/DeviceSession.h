@@ -6,8 +6,10 @@
 #include <string>
 
 #include "device/LocalDevice.h"
+#include "platform/Platform.h"
 #include "platform/TSClient.h"
 #include "tsd/Commands.h"
+#include "tsd/CountdownClock.h"
 #include "tsd/DeviceLock.h"
 #include "tsd/LineFile.h"
 #include "tsd/PluginLoader.h"
@@ -35,14 +37,15 @@ class DeviceSession {
   device::LocalDevice& device() { return *_device; }
   device::FileTree& files() { return _device->files(); }
 
-  /// Loads the plug-in and makes its object. At most once. `platform`, by default the device's,
-  /// outlives `unloadPlugin`.
+  /// Loads the plug-in and makes its object. At most once.
   platform::TSClient& loadPlugin();
-  platform::TSClient& loadPlugin(const platform::Platform& platform);
+  /// The same; the plug-in's waits end when a stop is wanted, and `tick` tells of them (see `CountdownClock`).
+  platform::TSClient& loadPlugin(const StopSignal& stop, CountdownClock::Tick tick = nullptr);
   /// Lets the plug-in's object go, and everything run that was posted for it.
   void unloadPlugin();
 
  private:
+  platform::TSClient& makeClient(const platform::Platform& platform);
   device::DeviceOptions deviceOptions(const Setup& setup);
 
   const CommandContext& _context;
@@ -51,6 +54,8 @@ class DeviceSession {
   std::optional<LineFile> _log;
   std::optional<LineFile> _calls;
   std::unique_ptr<device::LocalDevice> _device;
+  std::optional<CountdownClock> _clock;
+  std::optional<platform::Platform> _platform;  // the device's with that clock
   std::shared_ptr<platform::TSClient> _client;
 };
 

@@ -1,24 +1,28 @@
 #pragma once
 
 #include <chrono>
+#include <condition_variable>
 #include <cstdint>
 #include <map>
 #include <mutex>
 #include <string>
-#include <string_view>
+#include <thread>
 #include <vector>
 
 #include "tsd/CommonOptions.h"
 #include "tsd/Console.h"
+#include "tsd/ProgressDrawing.h"
 
 namespace tsd {
 
-/// Shows on the console how far each app is. From any thread.
+/// Shows on the console how far each app is: on a terminal as bars that are redrawn in place, otherwise as a line for
+/// each change. A thread of its own keeps the bars in the terminal's size and shows that the program is alive while
+/// nothing changes: on a terminal with a moving sign, otherwise with a line now and then. From any thread.
 ///
 /// An app's percentage and phase never go back; it has 100 % only once its outcome is recorded and good.
 class Progress {
  public:
-  enum class Phase : std::uint8_t { waiting, placeholder, sending, installing, ended };
+  using Phase = ProgressLine::Phase;
 
   /// What an app is to reach: with `placeholder` it has ended when its placeholder is shown.
   enum class Goal : std::uint8_t { installed, placeholder };
@@ -44,34 +48,36 @@ class Progress {
   void finish();
 
  private:
-  struct Line {
-    std::string id;
-    std::string name;
-    Phase phase = Phase::waiting;
-    int percent = 0;
-    int shownStep = 0;  // percent of the package, the last that was printed in plain mode
-    std::string outcome;
-    std::string reason;
-  };
   using Instant = std::chrono::steady_clock::time_point;
 
-  Line* find(const std::string& id);
-  void enter(Line& line, Phase phase, int percent);
-  void changed(const Line& line, const std::string& what, bool urgent);
+  ProgressLine* find(const std::string& id);
+  void enter(ProgressLine& line, Phase phase, int percent);
+  void end(ProgressLine& line, const std::string& outcome, const std::string& reason, bool good);
+  void changed(const ProgressLine& line, const std::string& what, bool urgent);
+  void print(const std::string& text);
   void draw();
-  std::string drawn(const Line& line, std::size_t columns) const;
-  std::string summary() const;
+  void beat();
+  void beatInPlainMode();
 
   Console& _console;
   const Goal _goal;
   const ProgressMode _mode;  // plain, tty or none
+  const bool _colours;
   std::mutex _mutex;
+  std::condition_variable _changed;
   // Guarded by _mutex.
-  std::vector<Line> _lines;
+  std::vector<ProgressLine> _lines;
   std::map<std::string, std::size_t, std::less<>> _places;
   std::string _headline;
   std::string _countingDown;  // in plain mode, the text of a countdown that has begun
+  int _percent = 0;           // of all apps together
+  std::size_t _endings = 0;   // apps that have ended
   Instant _lastDrawn{};
+  Instant _lastChange{};   // of anything
+  Instant _lastPrinted{};  // line in plain mode
+  std::size_t _beats = 0;  // in place of the moving sign
+  bool _over = false;
+  std::thread _heart;
 };
 
 }  // namespace tsd

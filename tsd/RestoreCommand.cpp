@@ -1,12 +1,10 @@
 #include <filesystem>
 #include <optional>
 
-#include "platform/Platform.h"
 #include "plist/PropertyList.h"
 #include "tsd/AppWatch.h"
 #include "tsd/CommandError.h"
 #include "tsd/Commands.h"
-#include "tsd/CountdownClock.h"
 #include "tsd/Daemon.h"
 #include "tsd/DeviceSession.h"
 #include "tsd/FileConduit.h"
@@ -105,7 +103,7 @@ class Restore {
 
  private:
   void pushLists(FileConduit& conduit);
-  void reconcile(DeviceSession& session, Progress& progress);
+  void reconcile(DeviceSession& session, const StopSignal& stop, Progress& progress);
   void look(DeviceSession& session);
   ExitCode code(bool stopped) const;
   Value document(ExitCode code) const;
@@ -130,10 +128,8 @@ ExitCode Restore::run() {
     pushLists(conduit);
     if (!restoresApps()) _list.apps.clear();
     for (const auto& app : _list.apps) progress.add(app.id, app.name);
-    StopSignal::Subscription told(stop, [this] {
-      _context.console.message("stopping once the plug-in has finished; a second signal ends at once");
-    });
-    reconcile(session, progress);
+    StopSignal::Subscription told(stop, [this] { _context.console.message("stopping; a second signal ends at once"); });
+    reconcile(session, stop, progress);
     session.device().events().drain();
     look(session);
     for (const auto& app : _list.apps) {
@@ -141,6 +137,7 @@ ExitCode Restore::run() {
     }
     progress.finish();
   }
+  stop.letFinish();
   ExitCode result = code(stop.requested());
   if (!_list.problem.empty()) _context.console.message(_list.problem);
   if (_declined) _context.console.message("the backup service declined: " + textOf(_declined));
@@ -159,20 +156,9 @@ void Restore::pushLists(FileConduit& conduit) {
   if (_list.exists) conduit.pushFile(folder + "/RestoreApplications.plist", listPath);
 }
 
-void Restore::reconcile(DeviceSession& session, Progress& progress) {
-  const auto& services = session.device().platform();
-  CountdownClock clock(services.clock,
-                       [&](long long seconds) { progress.countdown("Waiting for placeholders", seconds); });
-  platform::Platform platform{services.process,       clock,
-                              services.fileSystem,    services.propertyLists,
-                              services.systemLog,     services.support,
-                              services.deviceService, services.installCoordination,
-                              services.workspace,     services.installer,
-                              services.backup,        services.restrictions,
-                              services.homeScreen,    services.iconRenderer,
-                              services.imageEncoder,  services.transactionLog,
-                              services.notifications};
-  Daemon daemon(session.device(), session.loadPlugin(platform));
+void Restore::reconcile(DeviceSession& session, const StopSignal& stop, Progress& progress) {
+  auto waiting = [&](long long seconds) { progress.countdown("Waiting for placeholders", seconds); };
+  Daemon daemon(session.device(), session.loadPlugin(stop, waiting));
   if (_options.inDaemon) daemon.postStartupNotification();
   progress.headline("Preparing the restore");
   daemon.reconcileRestoreOfType(_options.type, &_declined);

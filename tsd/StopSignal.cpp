@@ -50,10 +50,16 @@ void StopSignal::watch() {
     if (sources[1].revents) return;
     signalfd_siginfo received{};
     if (::read(_signals, &received, sizeof received) != sizeof received) continue;
-    if (_requested.exchange(true)) _exit(static_cast<int>(ExitCode::cancelled));
     std::lock_guard lock(_mutex);
+    if (_finishes) continue;
+    if (_requested.exchange(true)) _exit(static_cast<int>(ExitCode::cancelled));
     for (auto& told : _subscribers) told();
   }
+}
+
+void StopSignal::letFinish() {
+  std::lock_guard lock(_mutex);
+  _finishes = true;
 }
 
 StopSignal::Subscription::Subscription(StopSignal& signal, std::function<void()> told) : _signal(signal) {

@@ -20,6 +20,9 @@ class StopSignal {
   StopSignal& operator=(const StopSignal&) = delete;
 
   bool requested() const { return _requested; }
+  /// From now on a second signal does not end the process any more: what is left is to write the result, and half a
+  /// document would be worse than none.
+  void letFinish();
 
   /// Calls `told` on the signals' thread when a stop is requested. Once the subscription is gone it is not called.
   class Subscription {
@@ -39,6 +42,7 @@ class StopSignal {
 
   std::atomic<bool> _requested{false};
   std::mutex _mutex;
+  bool _finishes = false;                         // guarded by _mutex
   std::list<std::function<void()>> _subscribers;  // guarded by _mutex
   int _signals = -1;                              // descriptor that reads the signals
   int _end = -1;                                  // descriptor that ends the watching thread

@@ -38,12 +38,15 @@ void show(const CommandContext& context, const std::vector<SyncReport>& reports)
 ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
   requireHostFolder(options.host);
   StopSignal stop;
-  StopSignal::Subscription told(stop, [&] { context.console.message("stopping; a second signal ends at once"); });
   Progress progress(context.console, context.options.progress);
+  StopSignal::Subscription told(stop, [&] {
+    context.console.message("stopping; a second signal ends at once");
+    progress.headline("Ending the sync in order");
+  });
   AppWatch watch(progress);
   TransferQueue queue({options.host + "/Packages", options.reports, options.transfers}, progress, stop);
   DeviceSession session(context, {options.device, "com.vantor.tsd", &queue, watch.listener()});
-  Daemon daemon(session.device(), session.loadPlugin());
+  Daemon daemon(session.device(), session.loadPlugin(stop));
   daemon.postStartupNotification();
 
   std::vector<SyncReport> reports;
@@ -53,6 +56,7 @@ ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
     if (code == ExitCode::done) code = reports.back().code;
     if (reports.back().code == ExitCode::cancelled || reports.back().code == ExitCode::deadline) break;
   }
+  stop.letFinish();
   show(context, reports);
   // A device that has not gone quiet by its deadline cannot be closed in order; the next one to open it tidies up.
   if (code == ExitCode::deadline) std::_Exit(static_cast<int>(code));
