@@ -35,6 +35,17 @@ void takeApp(DeviceState& state, AppRecord app) {
   state.apps.insert_or_assign(std::move(id), std::move(app));
 }
 
+void takeOutcome(DeviceState& state, const std::string& app, OutcomeRecord outcome) {
+  state.nextHomeOrder = std::max(state.nextHomeOrder, outcome.homeOrder + 1);
+  state.outcomes.insert_or_assign(app, std::move(outcome));
+}
+
+std::uint64_t homeOrderOfNew(const DeviceState& state, const std::string& id) {
+  auto outcome = state.outcomes.find(id);
+  bool wasLost = outcome != state.outcomes.end() && outcome->second.homeOrder != 0;
+  return wasLost ? outcome->second.homeOrder : state.nextHomeOrder;
+}
+
 void takeLayout(DeviceState& state, HomeLayout layout) {
   state.layout = std::move(layout);
   state.inLayout.clear();
@@ -97,21 +108,21 @@ void ChangeSet::add(StoreRecord record, std::function<void(DeviceState& state)> 
 void ChangeSet::put(AppRecord app) {
   auto shared = std::make_shared<AppRecord>(std::move(app));
   _steps.push_back({[shared](const DeviceState& state, std::vector<StoreRecord>& records) {
-                      if (!shared->homeOrder) shared->homeOrder = state.nextHomeOrder;
+                      if (!shared->homeOrder) shared->homeOrder = homeOrderOfNew(state, shared->id);
                       records.push_back({"app", shared->id, valueOfApp(*shared)});
                     },
                     [shared](DeviceState& state) { takeApp(state, *shared); }});
 }
 
-void ChangeSet::removeApp(std::string_view id) {
-  _steps.push_back({[id = std::string(id)](const DeviceState& state, std::vector<StoreRecord>& records) {
+void ChangeSet::removeApp(std::string_view id, bool isLost) {
+  _steps.push_back({[id = std::string(id), isLost](const DeviceState& state, std::vector<StoreRecord>& records) {
                       records.push_back({"app", id, {}});
-                      if (state.inLayout.count(id))
+                      if (!isLost && state.inLayout.count(id))
                         records.push_back({"home", "layout", valueOfLayout(without(state.layout, id))});
                     },
-                    [id = std::string(id)](DeviceState& state) {
+                    [id = std::string(id), isLost](DeviceState& state) {
                       state.apps.erase(id);
-                      if (state.inLayout.count(id)) takeLayout(state, without(state.layout, id));
+                      if (!isLost && state.inLayout.count(id)) takeLayout(state, without(state.layout, id));
                     }});
 }
 
@@ -122,7 +133,7 @@ void ChangeSet::removeCoordinator(std::string_view app) { add({"coordinator", st
 
 void ChangeSet::setOutcome(std::string_view app, const OutcomeRecord& outcome) {
   add({"outcome", std::string(app), valueOfOutcome(outcome)},
-      [app = std::string(app), outcome](DeviceState& state) { state.outcomes.insert_or_assign(app, outcome); });
+      [app = std::string(app), outcome](DeviceState& state) { takeOutcome(state, app, outcome); });
 }
 void ChangeSet::removeOutcome(std::string_view app) {
   add({"outcome", std::string(app), {}}, [app = std::string(app)](DeviceState& state) { state.outcomes.erase(app); });
@@ -184,7 +195,7 @@ bool AppRecords::take(const StoreRecord& record, Loaded& loaded) {
   }
   if (record.kind == "outcome") {
     auto outcome = outcomeOfValue(record.value);
-    if (outcome) _state.outcomes.insert_or_assign(record.key, std::move(*outcome));
+    if (outcome) takeOutcome(_state, record.key, std::move(*outcome));
     return outcome.has_value();
   }
   if (record.kind == "home") {

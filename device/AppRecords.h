@@ -41,6 +41,7 @@ struct AppRecord {
   bool launchProhibited = false;
   std::uint64_t installType = 0;
   std::uint64_t staticUsage = 0;  // bytes
+  std::uint64_t filesSum = 0;     // of a placeholder's files (see Containers.h); 0: not known
   std::uint64_t homeOrder = 0;    // apps that the layout does not name stand in this order; 0: not shown yet
   std::optional<InstallProgressRecord> progress{};
   /// What the registry hands out; made anew whenever the record changes.
@@ -53,6 +54,7 @@ struct AppRecord {
 struct OutcomeRecord {
   std::string outcome;  // "INSTALLED", "FAILED", "CANCELED"
   std::string reason;
+  std::uint64_t homeOrder = 0;  // of an app that went without anybody's doing, should it come back; 0: none
 };
 
 /// The pages of the home screen as the host set them. An identifier stands in it once.
@@ -84,10 +86,10 @@ struct DeviceState {
 /// or removes one app.
 class ChangeSet {
  public:
-  /// A new app is shown on the home screen behind the others.
+  /// A new app is shown on the home screen behind the others, one that was lost in its old place.
   void put(AppRecord app);
-  /// It leaves the home screen, too.
-  void removeApp(std::string_view id);
+  /// It leaves the home screen, too; what is lost keeps its place in the layout for when it comes back.
+  void removeApp(std::string_view id, bool isLost = false);
   void put(const CoordinatorRecord& coordinator);
   void removeCoordinator(std::string_view app);
   void setOutcome(std::string_view app, const OutcomeRecord& outcome);

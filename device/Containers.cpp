@@ -25,6 +25,29 @@ std::string drawName() {
   return name;
 }
 
+/// Store metadata comes from the host; what XML cannot carry is kept in the other form.
+std::optional<platform::Bytes> bytesOfMetadata(const platform::Value& metadata, platform::ErrorRef* error) {
+  auto bytes = plist::writeXML(metadata, error);
+  return bytes ? bytes : plist::writeBinary(metadata, error);
+}
+
+/// A checksum over contents in their order; FNV-1a.
+class FilesSum {
+ public:
+  void add(const std::optional<platform::Bytes>& content) {
+    mix(content ? std::to_string(content->size()) + '/' : "-");
+    if (content) mix(*content);
+  }
+  std::uint64_t value() const { return _value == 0 ? 1 : _value; }
+
+ private:
+  void mix(std::string_view bytes) {
+    for (unsigned char byte : bytes) _value = (_value ^ byte) * 0x100000001b3;
+  }
+
+  std::uint64_t _value = 0xcbf29ce484222325;
+};
+
 }  // namespace
 
 std::optional<std::string> Containers::makeFresh(platform::ErrorRef* error) {
@@ -44,31 +67,43 @@ bool Containers::writeNew(const std::string& path, platform::BytesView content, 
   return writer && writer->write(content, error) && writer->close(durable, error);
 }
 
-bool Containers::writePlaceholder(const std::string& container, const std::string& bundle, platform::Value info,
-                                  const std::optional<std::string>& iconPath, const platform::Value& metadata,
-                                  platform::ErrorRef* error) {
+std::optional<std::uint64_t> Containers::writePlaceholder(const std::string& container, const std::string& bundle,
+                                                          platform::Value info,
+                                                          const std::optional<std::string>& iconPath,
+                                                          const platform::Value& metadata, platform::ErrorRef* error) {
   std::string directory = container + '/' + bundle;
-  if (!_files.createDirectory(directory, false, {}, error)) return false;
+  if (!_files.createDirectory(directory, false, {}, error)) return std::nullopt;
+  FilesSum sum;
+  auto write = [&](const std::string& path, const std::optional<platform::Bytes>& content) {
+    sum.add(content);
+    return content && writeNew(path, *content, false, error);
+  };
+  std::optional<platform::Bytes> icon;
   if (iconPath) {
     auto attributes = _files.attributesOfItem(*iconPath);
-    std::optional<platform::Bytes> icon;
     if (attributes && !attributes->isDirectory && attributes->size <= maximumIconBytes)
       icon = _files.readFile(*iconPath);
-    if (icon) {
-      if (!writeNew(directory + '/' + std::string(iconName), *icon, false, error)) return false;
-      info.dictionary()->set("KBBundleIconFile", iconName);
-    }
+    if (icon) info.dictionary()->set("KBBundleIconFile", iconName);
   }
-  auto bytes = plist::writeBinary(info, error);
-  if (!bytes || !writeNew(directory + "/Info.plist", *bytes, false, error)) return false;
-  return metadata.isAbsent() || writeMetadata(container, metadata, false, error);
+  if (!write(directory + '/' + std::string(iconName), icon) && icon) return std::nullopt;
+  if (!write(directory + "/Info.plist", plist::writeBinary(info, error))) return std::nullopt;
+  auto metadataBytes = metadata.isAbsent() ? std::nullopt : bytesOfMetadata(metadata, error);
+  if (!write(container + '/' + std::string(storeMetadataName), metadataBytes) && !metadata.isAbsent())
+    return std::nullopt;
+  return sum.value();
+}
+
+std::uint64_t Containers::placeholderSum(const std::string& container, const std::string& bundle) {
+  FilesSum sum;
+  sum.add(_files.readFile(container + '/' + bundle + '/' + std::string(iconName)));
+  sum.add(_files.readFile(container + '/' + bundle + "/Info.plist"));
+  sum.add(_files.readFile(container + '/' + std::string(storeMetadataName)));
+  return sum.value();
 }
 
 bool Containers::writeMetadata(const std::string& container, const platform::Value& metadata, bool durable,
                                platform::ErrorRef* error) {
-  auto bytes = plist::writeXML(metadata, error);
-  // Store metadata comes from the host; what XML cannot carry is kept in the other form.
-  if (!bytes) bytes = plist::writeBinary(metadata, error);
+  auto bytes = bytesOfMetadata(metadata, error);
   return bytes && writeNew(container + '/' + std::string(storeMetadataName), *bytes, durable, error);
 }
 

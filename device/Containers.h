@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <optional>
 #include <set>
 #include <string>
@@ -26,10 +27,12 @@ class Containers {
 
   /// Fills a fresh container with a placeholder's bundle. `iconPath` is copied as the bundle's icon and `info` names it
   /// then; an icon that cannot be read is left out. Absent metadata: no metadata file. Nothing is flushed: what a loss
-  /// of power takes of a placeholder, the next sync brings again.
-  bool writePlaceholder(const std::string& container, const std::string& bundle, platform::Value info,
-                        const std::optional<std::string>& iconPath, const platform::Value& metadata,
-                        platform::ErrorRef* error = nullptr);
+  /// of power takes of a placeholder, the next sync brings again. Answers a checksum of the files, nothing on failure.
+  std::optional<std::uint64_t> writePlaceholder(const std::string& container, const std::string& bundle,
+                                                platform::Value info, const std::optional<std::string>& iconPath,
+                                                const platform::Value& metadata, platform::ErrorRef* error = nullptr);
+  /// That checksum of the files as they are now; never 0. Another one tells that a loss of power took some of them.
+  std::uint64_t placeholderSum(const std::string& container, const std::string& bundle);
   /// A dictionary, written as XML.
   bool writeMetadata(const std::string& container, const platform::Value& metadata, bool durable,
                      platform::ErrorRef* error = nullptr);

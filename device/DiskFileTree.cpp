@@ -126,7 +126,9 @@ class DiskFileReader final : public FileReader {
 int moveBetween(const DiskPlace& from, const DiskPlace& to) {
   if (int failure = from.moveTo(to)) return failure;
   if (int failure = to.syncDirectory()) return failure;
-  return from.syncDirectory();
+  if (int failure = from.syncDirectory()) return failure;
+  // Where things are moved to may be a directory that was made for them.
+  return to.syncDirectoryAbove();
 }
 
 int copyContents(int from, const FileInWriting& to) {

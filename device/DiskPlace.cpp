@@ -47,6 +47,11 @@ std::string joined(std::string_view directory, std::string_view name) {
   return std::string(directory == "/" ? "" : directory) + '/' + std::string(name);
 }
 
+std::string_view parentOf(std::string_view path) {
+  auto slash = path.rfind('/');
+  return slash == 0 ? "/" : path.substr(0, slash);
+}
+
 /// What is not there counts as removed.
 int removeAt(int directory, const char* name, int flags, const std::string& path, StepWatch* watch) {
   return takeStep(watch, {Step::Kind::remove, path},
@@ -171,10 +176,7 @@ int DiskPlace::find(const FileDescriptor& root, std::string_view path, bool make
   return 0;
 }
 
-std::string_view DiskPlace::directoryPath() const {
-  auto slash = _path.rfind('/');
-  return _isRoot || slash == 0 ? "/" : _path.substr(0, slash);
-}
+std::string_view DiskPlace::directoryPath() const { return _isRoot ? "/" : parentOf(_path); }
 
 int DiskPlace::status(struct stat& status) const {
   if (::fstatat(directory(), name(), &status, AT_SYMLINK_NOFOLLOW) != 0) return errno;
@@ -208,6 +210,15 @@ int DiskPlace::syncDirectory() const {
   FileDescriptor opened;
   if (int failure = openDirectoryAt(directory(), ".", O_RDONLY, opened)) return failure;
   return device::syncDirectory(opened.get(), directoryPath(), _watch);
+}
+
+int DiskPlace::syncDirectoryAbove() const {
+  auto path = directoryPath();
+  if (path == "/") return 0;
+  FileDescriptor opened;
+  // The directory is held open, so that its ".." is the one that it was found in or moved to.
+  if (int failure = openDirectoryAt(directory(), "..", O_RDONLY, opened)) return failure;
+  return device::syncDirectory(opened.get(), parentOf(path), _watch);
 }
 
 int DiskPlace::makeDirectory() const {

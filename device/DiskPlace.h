@@ -42,6 +42,9 @@ class DiskPlace {
   /// Makes the entry's presence or absence durable.
   int syncDirectory() const;
 
+  /// Makes the directory itself durable that the entry is in. Nothing for one in the root.
+  int syncDirectoryAbove() const;
+
   int makeDirectory() const;
   /// A new file, open for writing; something there is EEXIST.
   int createFile(bool executable, FileDescriptor& file) const;

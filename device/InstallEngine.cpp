@@ -180,10 +180,11 @@ std::optional<AppRecord> InstallEngine::writePlaceholder(const PlaceholderRecord
   auto container = _containers.makeFresh(error);
   if (!container) return std::nullopt;
   app.container = *container;
-  bool written = _containers.writePlaceholder(app.container, app.bundle, std::move(info),
-                                              placeholder.configured ? placeholder.iconPath : std::nullopt,
-                                              placeholder.configured ? placeholder.metadata : platform::Value(), error);
-  if (written) return app;
+  auto sum = _containers.writePlaceholder(app.container, app.bundle, std::move(info),
+                                          placeholder.configured ? placeholder.iconPath : std::nullopt,
+                                          placeholder.configured ? placeholder.metadata : platform::Value(), error);
+  app.filesSum = sum.value_or(0);
+  if (sum) return app;
   _containers.remove(app.container);
   return std::nullopt;
 }
@@ -272,15 +273,18 @@ bool InstallEngine::endInstall(const CoordinatorRef& coordinator, const std::str
   platform::OBApplicationProxyRef cancelled = record && record->progress ? record->proxy : nullptr;
   std::string superfluous;
   ChangeSet changes;
+  OutcomeRecord outcome{ending == Ending::failed ? "FAILED" : "CANCELED", reason ? reason->describe() : ""};
   if (record && record->isPlaceholder) {
     superfluous = record->container;
-    changes.removeApp(app);
+    // What an interrupted process lost is likely to be asked for again, and then to be where it was.
+    changes.removeApp(app, !_tells);
+    if (!_tells) outcome.homeOrder = record->homeOrder;
   } else if (record && record->progress) {
     auto kept = *record;
     kept.progress.reset();
     changes.put(std::move(kept));
   }
-  changes.setOutcome(app, {ending == Ending::failed ? "FAILED" : "CANCELED", reason ? reason->describe() : ""});
+  changes.setOutcome(app, outcome);
   if (coordinator) changes.removeCoordinator(app);
   if (!_records.commit(std::move(changes), error)) return false;
   abandoned = std::move(superfluous);

@@ -299,7 +299,8 @@ void InstallEngine::removeLostPlaceholders() {
   }
   for (const auto& app : placeholders) {
     auto bytes = _files.readFile(app.bundlePath() + "/Info.plist");
-    if (bytes && plist::read(std::move(*bytes)).dictionary()) continue;
+    bool isWhole = app.filesSum == 0 || app.filesSum == _containers.placeholderSum(app.container, app.bundle);
+    if (isWhole && bytes && plist::read(std::move(*bytes)).dictionary()) continue;
     std::string abandoned;
     {
       Lock lock(_records.mutex);

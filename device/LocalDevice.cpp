@@ -1,5 +1,6 @@
 #include "device/LocalDevice.h"
 
+#include <algorithm>
 #include <filesystem>
 #include <set>
 #include <system_error>
@@ -57,6 +58,16 @@ bool makeDirectories(FileTree& files, ErrorRef* error) {
     if (!files.createDirectory(directory, true, {}, error)) return false;
   }
   return true;
+}
+
+/// Makes these directories durable, and the way to each of them.
+bool syncDirectories(FileTree& files, ErrorRef* error) {
+  std::set<std::string_view> parents{"/"};
+  for (auto directory : directories) {
+    for (auto slash = directory.rfind('/'); slash != 0; slash = directory.rfind('/', slash - 1))
+      parents.insert(directory.substr(0, slash));
+  }
+  return std::all_of(parents.begin(), parents.end(), [&](auto parent) { return files.syncDirectory(parent, error); });
 }
 
 /// The record that makes a store a device's.
@@ -267,7 +278,8 @@ bool makeDeviceParts(FileTree& files, Store& store, ErrorRef* error) {
   if (!items) return false;
   if (!items->empty() || !store.load().empty())
     return fail(error, localDeviceError(LocalDeviceError::notEmpty, "what is to become a device is not empty"));
-  return makeDirectories(files, error) && store.commit({{"device", "version", storeVersion}}, error);
+  return makeDirectories(files, error) && syncDirectories(files, error) &&
+         store.commit({{"device", "version", storeVersion}}, error);
 }
 
 bool createDevice(const std::string& folder, ErrorRef* error) {

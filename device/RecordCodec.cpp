@@ -138,6 +138,7 @@ Value valueOfApp(const AppRecord& app) {
   setFlag(entries, "launchProhibited", app.launchProhibited);
   setNumber(entries, "installType", app.installType);
   setNumber(entries, "staticUsage", app.staticUsage);
+  setNumber(entries, "filesSum", app.filesSum);
   setNumber(entries, "homeOrder", app.homeOrder);
   if (app.progress) {
     auto progress = Value::makeDictionary();
@@ -165,6 +166,7 @@ std::optional<AppRecord> appOfValue(const std::string& id, const Value& value) {
   app.launchProhibited = flag(*entries, "launchProhibited");
   app.installType = number(*entries, "installType");
   app.staticUsage = number(*entries, "staticUsage");
+  app.filesSum = number(*entries, "filesSum");
   app.homeOrder = number(*entries, "homeOrder");
   if (const auto* progress = (*entries)["progress"].dictionary()) {
     app.progress = InstallProgressRecord{number(*progress, "state"), number(*progress, "phase"),
@@ -220,13 +222,14 @@ Value valueOfOutcome(const OutcomeRecord& outcome) {
   auto value = Value::makeDictionary();
   value.dictionary()->set("outcome", outcome.outcome);
   value.dictionary()->set("reason", outcome.reason);
+  setNumber(*value.dictionary(), "homeOrder", outcome.homeOrder);
   return value;
 }
 
 std::optional<OutcomeRecord> outcomeOfValue(const Value& value) {
   const auto* entries = value.dictionary();
   if (!entries) return std::nullopt;
-  return OutcomeRecord{text(*entries, "outcome"), text(*entries, "reason")};
+  return OutcomeRecord{text(*entries, "outcome"), text(*entries, "reason"), number(*entries, "homeOrder")};
 }
 
 Value valueOfLayout(const HomeLayout& layout) {

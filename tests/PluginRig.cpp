@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <stdexcept>
 
 #include "platform/Describe.h"
 #include "platform/FileSystem.h"
@@ -75,12 +76,16 @@ static bool isTransactionMessage(const CallRecord& record) {
   return record.service == "log" && (*record.arguments.dictionary())["category"].string() == "tsd.appsync";
 }
 
-PluginRig::PluginRig(const Options& options) {
+PluginRig::PluginRig(const Options& options) : PluginRig(options, nullptr, nullptr) {}
+
+PluginRig::PluginRig(const Options& options, std::unique_ptr<device::FileTree> files,
+                     std::unique_ptr<device::Store> store) {
   device::DeviceOptions chosen;
   chosen.mainBundleIdentifier = options.process;
   chosen.deviceService = &_transfers;
   if (options.journaled) {
-    chosen.journals.push_back({[this](const CallRecord& record) {
+    chosen.journals.push_back({[this, told = options.told](const CallRecord& record) {
+      if (told) told(record);
       // What the transaction log makes of its records says the same again.
       if (!isTransactionMessage(record)) _records.push_back(record);
     }});
@@ -96,8 +101,10 @@ PluginRig::PluginRig(const Options& options) {
   } else {
     auto events = device::makeManualEventQueue();
     _manualEvents = events.get();
-    _device = device::makeMemoryDevice(std::move(events), std::move(chosen));
+    _device = files ? device::LocalDevice::open(std::move(files), std::move(store), std::move(events), chosen)
+                    : device::makeMemoryDevice(std::move(events), std::move(chosen));
   }
+  if (!_device) throw std::runtime_error("these parts are no device's");
   _transfers.serve(*_device);
   EXPECT_TRUE(_device->set("icon-size", "16"));
   load();

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -73,9 +74,12 @@ class PluginRig {
     std::vector<std::string> rules{};
     bool threaded = false;  // real threads and the real clock instead of delivery by hand
     bool journaled = true;
+    std::function<void(const device::CallRecord&)> told{};  // each record as it is written
   };
   explicit PluginRig(const Options& options);
   PluginRig() : PluginRig(Options()) {}
+  /// On a device of these parts instead of an empty one.
+  PluginRig(const Options& options, std::unique_ptr<device::FileTree> files, std::unique_ptr<device::Store> store);
   ~PluginRig();
   PluginRig(const PluginRig&) = delete;
   PluginRig& operator=(const PluginRig&) = delete;

@@ -114,7 +114,9 @@ void FileConduit::pushItem(const Level& level, const std::string& name) {
   platform::ErrorRef error;
   auto file = HostFile::openAt(level.directory, name, &error);
   if (!file) return refuse(hostPath, textOf(error));
-  if (auto refusal = copy(*file, hostPath, devicePath, false)) refuse(hostPath, textOf(refusal));
+  // The rest comes again with the next sync, should power be lost. A torn list would be taken for the host's.
+  bool isTodoList = level.depth == 0 && name == todoListName;
+  if (auto refusal = copy(*file, hostPath, devicePath, isTodoList)) refuse(hostPath, textOf(refusal));
 }
 
 platform::ErrorRef FileConduit::copy(HostFile& file, const std::string& hostPath, std::string_view devicePath,
