@@ -15,7 +15,7 @@ PRESET = mkdir -p build && cmake --preset $(1) >build/$(1).configured && \
          cmake --build --preset $(1) $(if $(2),--target $(2))
 
 help: ## this list
-	@awk -F ':.*## ' '/^[a-z]+:.*## / {printf "make %-10s %s\n", $$1, $$2}' Makefile
+	@awk -F ':.*## ' '/^[a-z-]+:.*## / {printf "make %-11s %s\n", $$1, $$2}' Makefile
 
 build: packages ## the program and the plug-in, into build/release/bin
 	@$(call PRESET,release,tsd ApplicationSync)
@@ -53,6 +53,15 @@ debug: packages ## a build for a debugger
 
 sweep: build-all ## every call of every scenario failed once, all of them
 	@cd build/release && APPSYNC_SWEEP=all bin/plugin_tests --gtest_filter='*Sweep*' --gtest_brief=1
+
+kill-sweep: build ## tsd killed before and after every step of a sync and a restore, and again in the recovery
+	@python3 tests/kill_sweep.py build/release/bin/tsd kill
+
+error-sweep: build ## every step of a sync and a restore failed in every way, once and for ever
+	@python3 tests/kill_sweep.py build/release/bin/tsd error
+
+power-loss: build-all ## power lost after every step of a sync and a restore
+	@cd build/release && APPSYNC_POWER_LOSS=all bin/power_loss_tests --gtest_brief=1
 
 simulate: build-all ## random scenarios against the model: make simulate SEEDS=10000
 	@cd build/release && $(WITH_SEEDS) bin/plugin_tests --gtest_filter='*Simulation*' --gtest_brief=1
