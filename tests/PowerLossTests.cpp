@@ -7,13 +7,13 @@
 #include <map>
 #include <optional>
 #include <random>
+#include <stdexcept>
 
 #include "platform/OBApplicationWorkspace.h"
 #include "plist/PropertyList.h"
 #include "tests/PluginRig.h"
 #include "tests/PowerLog.h"
 #include "tsd/FileConduit.h"
-#include "tsd/SampleHost.h"
 
 namespace tests {
 namespace {
@@ -92,12 +92,17 @@ class PowerLoss : public testing::Test {
   PowerLoss() {
     std::string pattern = testing::TempDir() + "power-loss-XXXXXX";
     _folder = ::mkdtemp(pattern.data());
-    tsd::SampleHost({_folder + "/earlier", 1, 3000, 7}).write();
-    tsd::SampleHost({_folder + "/host", 5, 3000, 1, true}).write();
-    tsd::SampleHost({_folder + "/restored", 5, 3000, 3}).write();
+    makeHost("earlier --apps 1 --seed 7");
+    makeHost("host --apps 5 --demo");
+    makeHost("restored --apps 5 --seed 3");
     std::filesystem::create_directory(_folder + "/fs");
   }
   ~PowerLoss() override { std::filesystem::remove_all(_folder); }
+
+  void makeHost(const std::string& options) const {
+    std::string command = "cd '" + _folder + "' && '" TSD_PROGRAM "' sample --package-size 3000 " + options;
+    if (std::system((command + " >sample.out").c_str()) != 0) throw std::runtime_error(command);
+  }
 
   using Play = void (PowerLoss::*)(PluginRig&);
 
