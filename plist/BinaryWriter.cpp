@@ -56,7 +56,7 @@ std::optional<platform::Bytes> BinaryWriter::write(const Value& value, platform:
   _strings.reset();
   bytes.resize(size);
   _offsets = _begin + table;
-  _nextString = _stringNumbers.data();
+  _nextString = _stringNumbers.cbegin();
   writeStringOffsets();
   std::uint32_t top = writeValue(value);
   writeTrailer(top);

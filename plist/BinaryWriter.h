@@ -2,6 +2,7 @@
 
 #include <array>
 #include <cstdint>
+#include <deque>
 #include <optional>
 #include <string_view>
 #include <utility>
@@ -50,14 +51,15 @@ class BinaryWriter {
   std::uint32_t beginObject();
 
   std::optional<StringTable> _strings{std::in_place};
-  std::vector<std::uint32_t> _stringNumbers;  // of every key and string, in the order of both passes
+  // Of every key and string, in the order of both passes. In pieces: there are too many of them to be moved about.
+  std::deque<std::uint32_t> _stringNumbers;
   std::array<Key, 8> _lastKeys;
   std::size_t _objects = 0;
   std::size_t _references = 0;
   std::size_t _stringsSize = 0;
   std::size_t _size = 0;  // of the other objects, without references
 
-  const std::uint32_t* _nextString = nullptr;
+  std::deque<std::uint32_t>::const_iterator _nextString;
   std::uint32_t _nextObject = 0;
   std::vector<std::uint32_t> _pending;  // the numbers that containers being written will refer to
   unsigned _referenceSize = 0;

@@ -18,12 +18,12 @@ StringTable::Number StringTable::number(std::string_view text) {
   auto number = static_cast<std::uint32_t>(_strings.size());
   _strings.push_back({text.data(), static_cast<std::uint32_t>(text.size()), hash});
   _slots[at] = number + 1;
-  if (_strings.size() * 4 > _slots.size() * 3) grow();
+  if (_strings.size() * 2 > _slots.size()) grow();
   return {number, true};
 }
 
 void StringTable::grow() {
-  std::vector<std::uint32_t> slots(_slots.size() * 4);
+  std::vector<std::uint32_t> slots(_slots.size() * 2);
   _mask = static_cast<std::uint32_t>(slots.size() - 1);
   for (std::uint32_t number = 0; number < _strings.size(); ++number) {
     std::uint32_t at = _strings[number].hash & _mask;

@@ -36,7 +36,7 @@ class StringTable {
 
   std::uint64_t _seed;
   std::uint32_t _mask;
-  std::vector<std::uint32_t> _slots;  // open-addressed, at most three quarters full: number + 1, or 0
+  std::vector<std::uint32_t> _slots;  // open-addressed, at most half full: number + 1, or 0
   std::vector<String> _strings;
 };
 
