@@ -22,8 +22,9 @@ void Measurements::ReportRuns(const std::vector<Run>& runs) {
   }
 }
 
-void Measurements::run(bool isShort) {
+void Measurements::run(const std::string& pattern) {
   std::vector<std::string> options = {"benchmarks", "--benchmark_enable_random_interleaving=true",
+                                      "--benchmark_filter=" + pattern,
                                       isShort ? "--benchmark_repetitions=1" : "--benchmark_repetitions=15",
                                       isShort ? "--benchmark_min_time=0.000001" : "--benchmark_min_time=0.05"};
   std::vector<char*> arguments;
@@ -31,6 +32,10 @@ void Measurements::run(bool isShort) {
   int count = static_cast<int>(arguments.size());
   benchmark::Initialize(&count, arguments.data());
   benchmark::RunSpecifiedBenchmarks(this);
+}
+
+void Measurements::print() const {
+  for (const auto& [name, seconds] : _least) std::printf("%-40s %14.3f microseconds\n", name.c_str(), seconds * 1e6);
 }
 
 static void print(std::string_view work, const std::string& figure, std::string_view goal, const char* met) {

@@ -8,6 +8,9 @@
 
 namespace bench {
 
+/// Whether this run is a short one, whose figures say nothing.
+inline bool isShort = false;
+
 /// How long one iteration of each benchmark takes, in seconds: the least over its repetitions, which are interleaved
 /// with those of all others. The thread's processor time, or what the benchmark itself says it was.
 class Measurements final : public benchmark::BenchmarkReporter {
@@ -15,16 +18,16 @@ class Measurements final : public benchmark::BenchmarkReporter {
   bool ReportContext(const Context&) override { return true; }
   void ReportRuns(const std::vector<Run>& runs) override;
 
-  /// Runs everything that is registered. A short run takes one repetition and as few iterations as there can be.
-  void run(bool isShort);
+  /// Runs what is registered and matches the pattern. A short run takes one repetition and as few iterations as there
+  /// can be.
+  void run(const std::string& pattern = ".");
+  /// What was measured, for people.
+  void print() const;
   double operator[](const std::string& benchmark) const { return _least.at(benchmark); }
 
  private:
   std::map<std::string, double> _least;
 };
-
-/// Whether this run is a short one, whose figures say nothing.
-inline bool isShort = false;
 
 /// One row of the table. Of a short run nothing is met or missed.
 void printRow(std::string_view work, const std::string& figure, std::string_view goal, bool met);

@@ -5,7 +5,9 @@
 #include "bench/Benchmarks.h"
 #include "bench/PeakMemory.h"
 
-/// usage: in_memory_benchmarks [--short]; what it calls itself with is no concern of anybody else.
+/// usage: in_memory_benchmarks [--short | --only PATTERN]
+///
+/// --only measures what matches, as for a profile, and prints times instead of rows. It calls itself with --edit.
 int main(int count, char** arguments) try {
   if (count == 4 && arguments[1] == std::string_view("--edit")) return !bench::runEdit(arguments[2], arguments[3]);
   bench::isShort = count > 1 && arguments[1] == std::string_view("--short");
@@ -16,7 +18,12 @@ int main(int count, char** arguments) try {
   plugin.add();
   icons.add();
   bench::Measurements taken;
-  taken.run(bench::isShort);
+  if (count == 3 && arguments[1] == std::string_view("--only")) {
+    taken.run(arguments[2]);
+    taken.print();
+    return 0;
+  }
+  taken.run();
   propertyLists.printRows(taken);
   plugin.printRows(taken);
   icons.printRows(taken);

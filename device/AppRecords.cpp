@@ -32,6 +32,7 @@ void takeApp(DeviceState& state, AppRecord app) {
   app.proxy = makeProxy(app);
   state.nextHomeOrder = std::max(state.nextHomeOrder, app.homeOrder + 1);
   auto id = app.id;
+  state.changedApps.insert(id);
   state.apps.insert_or_assign(std::move(id), std::move(app));
 }
 
@@ -122,6 +123,7 @@ void ChangeSet::removeApp(std::string_view id, bool isLost) {
                     },
                     [id = std::string(id), isLost](DeviceState& state) {
                       state.apps.erase(id);
+                      state.changedApps.insert(id);
                       if (!isLost && state.inLayout.count(id)) takeLayout(state, without(state.layout, id));
                     }});
 }

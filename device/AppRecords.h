@@ -5,6 +5,7 @@
 #include <map>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <string_view>
 #include <unordered_set>
@@ -73,6 +74,7 @@ struct DeviceState {
   HomeLayout layout;
   std::unordered_set<std::string> inLayout;
   std::uint64_t nextHomeOrder = 1;
+  std::set<std::string> changedApps;  // put or removed since they were last taken
 
   const AppRecord* app(std::string_view id) const;
   /// The flattened order: the layout's identifiers, whether or not their apps are there yet, then the apps it does not
@@ -145,6 +147,8 @@ class AppRecords {
   void flush() EXCLUDES(mutex);
   /// How far a transfer has come. In memory only; goes to the store with the app's next change.
   void setFraction(std::string_view app, double fraction) REQUIRES(mutex);
+  /// The apps that were put or removed since this was last asked; for whoever keeps a view of them up to date.
+  std::set<std::string> takeChangedApps() REQUIRES(mutex) { return std::exchange(_state.changedApps, {}); }
 
  private:
   bool take(const StoreRecord& record, Loaded& loaded) REQUIRES(mutex);

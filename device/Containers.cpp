@@ -13,14 +13,16 @@ namespace {
 constexpr std::uint64_t maximumIconBytes = std::uint64_t{16} << 20;
 constexpr std::string_view iconName = "Icon.png";
 
-/// Drawn anew for each container, so that a name is never used again.
+/// Drawn anew for each container, so that a name is never used again. The source is slow: every bit of it is used.
 std::string drawName() {
   static thread_local std::random_device source;
   constexpr char digits[] = "0123456789ABCDEF";
   std::string name;
+  std::uint32_t drawn = 0;
   for (int i = 0; i < 32; ++i) {
+    if (i % 8 == 0) drawn = source();
     if (i == 8 || i == 12 || i == 16 || i == 20) name += '-';
-    name += digits[source() % 16];
+    name += digits[drawn >> i % 8 * 4 & 15];
   }
   return name;
 }

@@ -1,10 +1,26 @@
 #include "device/RegistryReports.h"
 
+#include <algorithm>
+
 namespace device {
 
 namespace {
 
 using Proxies = std::vector<platform::OBApplicationProxyRef>;
+
+/// Puts the app's proxy where it belongs by its identifier, or takes the one that is there away when there is none.
+void place(Proxies& proxies, const std::string& id, const platform::OBApplicationProxyRef& proxy) {
+  auto at = std::lower_bound(proxies.begin(), proxies.end(), id, [](const auto& each, const std::string& identifier) {
+    return *each->applicationIdentifier < identifier;
+  });
+  bool isThere = at != proxies.end() && *(*at)->applicationIdentifier == id;
+  if (isThere && proxy)
+    *at = proxy;
+  else if (isThere)
+    proxies.erase(at);
+  else if (proxy)
+    proxies.insert(at, proxy);
+}
 
 std::vector<std::string> identifiers(const Proxies& proxies) {
   std::vector<std::string> result;
@@ -23,17 +39,24 @@ void RegistryReports::addObserver(const std::weak_ptr<Observer>& observer) {
   });
 }
 
-void RegistryReports::report(Observer& observer) {
-  Proxies prioritized, paused;
-  {
-    platform::Mutex::Lock lock(_records.mutex);
-    for (const auto& [id, app] : _records.state().apps) {
-      if (app.progress) (app.progress->paused ? paused : prioritized).push_back(app.proxy);
-    }
+void RegistryReports::bringUpToDate() {
+  platform::Mutex::Lock lock(_records.mutex);
+  for (const auto& id : _records.takeChangedApps()) {
+    const auto* app = _records.state().app(id);
+    const auto* progress = app && app->progress ? &*app->progress : nullptr;
+    place(_prioritized, id, progress && !progress->paused ? app->proxy : nullptr);
+    place(_paused, id, progress && progress->paused ? app->proxy : nullptr);
   }
+}
+
+void RegistryReports::report(Observer& observer) {
+  bringUpToDate();
+  auto shown = [&](const Proxies& proxies) {
+    return _boundary.hasJournal() ? identifiers(proxies) : std::vector<std::string>();
+  };
   _boundary.enter({"AppsClient", "applicationInstallsArePrioritized"},
-                  {{"prioritized", identifiers(prioritized)}, {"paused", identifiers(paused)}},
-                  [&] { observer.applicationInstallsArePrioritized(prioritized, paused); });
+                  {{"prioritized", shown(_prioritized)}, {"paused", shown(_paused)}},
+                  [&] { observer.applicationInstallsArePrioritized(_prioritized, _paused); });
 }
 
 void RegistryReports::installsChanged() {

@@ -37,7 +37,10 @@ class RegistryReports {
   void appChanged(AppStatus status);
 
  private:
+  using Proxies = std::vector<platform::OBApplicationProxyRef>;
+
   void report(Observer& observer);
+  void bringUpToDate();
 
   AppRecords& _records;
   Boundary& _boundary;
@@ -45,6 +48,9 @@ class RegistryReports {
   const Changed _changed;
   ObserverList<Observer> _observers;
   std::atomic<bool> _reportPosted{false};
+  // What runs and what is paused, in order of identifier: kept from report to report, as each install makes several of
+  // them and there may be many installs. Only the registry lane touches them.
+  Proxies _prioritized, _paused;
 };
 
 }  // namespace device
