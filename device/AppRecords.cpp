@@ -100,8 +100,8 @@ std::optional<AppStatus> DeviceState::status(std::string_view id) const {
 }
 
 void ChangeSet::add(StoreRecord record, std::function<void(DeviceState& state)> apply) {
-  _steps.push_back({[record = std::move(record)](const DeviceState&, std::vector<StoreRecord>& records) {
-                      records.push_back(record);
+  _steps.push_back({[record = std::move(record)](const DeviceState&, std::vector<StoreRecord>& records) mutable {
+                      records.push_back(std::move(record));
                     },
                     std::move(apply)});
 }
@@ -221,7 +221,9 @@ bool AppRecords::commit(ChangeSet&& changes, platform::ErrorRef* error) { return
 bool AppRecords::write(ChangeSet&& changes, platform::ErrorRef* error) { return keep(&Store::write, changes, error); }
 
 bool AppRecords::keep(Keep keep, const ChangeSet& changes, platform::ErrorRef* error) {
-  auto records = _later;
+  std::vector<StoreRecord> records;
+  records.reserve(_later.size() + 2 * changes._steps.size());  // records are costly to move
+  records.insert(records.end(), _later.begin(), _later.end());
   for (const auto& step : changes._steps) step.encode(_state, records);
   platform::setError(error, nullptr);
   if (!(_store.*keep)(records, error)) return false;

@@ -107,7 +107,7 @@ class ChangeSet {
 
  private:
   friend class AppRecords;
-  /// What the store is to take, worked out before it is asked; then what becomes of the state, which cannot fail.
+  /// What the store is to take, worked out once, before it is asked; then what becomes of the state, which cannot fail.
   struct Step {
     std::function<void(const DeviceState& state, std::vector<StoreRecord>& records)> encode;
     std::function<void(DeviceState& state)> apply;

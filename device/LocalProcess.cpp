@@ -37,7 +37,7 @@ Value LocalProcess::infoDictionaryOfBundleAtPath(std::string_view path) {
   return _boundary.call({"Process", "infoDictionaryOfBundleAtPath"}, nullptr, {{"path", path}}, [&] {
     auto bytes = _files.readFile(std::string(path) + "/Info.plist");
     Value info = bytes ? plist::read(std::move(*bytes)) : Value();
-    return info.dictionary() ? info : Value();
+    return info.dictionary() ? std::move(info) : Value();
   });
 }
 

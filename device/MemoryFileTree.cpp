@@ -2,11 +2,13 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <map>
+#include <functional>
 #include <mutex>
+#include <unordered_map>
 #include <utility>
 
 #include "device/DevicePath.h"
+#include "platform/TextHash.h"
 
 namespace device {
 
@@ -16,11 +18,21 @@ using platform::ErrorRef;
 using platform::FileAttributes;
 using platform::Value;
 
+namespace {
+struct NameHash {
+  using is_transparent = void;
+  std::size_t operator()(std::string_view name) const {
+    return static_cast<std::size_t>(platform::textHash(name, platform::textHashSeed()));
+  }
+};
+}  // namespace
+
 struct MemoryFileTree::Node {
   bool isDirectory = false;
   bool executable = false;
   Bytes contents;
-  std::map<std::string, std::shared_ptr<Node>, std::less<>> items;
+  // In no order, so that a name is found as fast among many.
+  std::unordered_map<std::string, std::shared_ptr<Node>, NameHash, std::equal_to<>> items;
   std::shared_ptr<std::mutex> guard;  // one for all nodes of a tree; files that are open outlive it
 };
 
@@ -230,6 +242,7 @@ std::optional<std::vector<FileTree::Entry>> MemoryFileTree::list(std::string_vie
   if (!answerFileOperation(failure, path, error)) return std::nullopt;
   std::vector<Entry> entries;
   for (const auto& [name, item] : directory->items) entries.push_back({name, item->isDirectory, item->contents.size()});
+  std::sort(entries.begin(), entries.end(), [](const Entry& one, const Entry& other) { return one.name < other.name; });
   return entries;
 }
 

@@ -1,9 +1,8 @@
 #pragma once
 
-#include <cstdint>
-#include <map>
+#include <list>
 #include <string>
-#include <utility>
+#include <unordered_map>
 #include <vector>
 
 #include "device/Store.h"
@@ -14,14 +13,19 @@ namespace device {
 /// synchronised.
 class RecordList {
  public:
+  RecordList() = default;
+  RecordList(const RecordList&) = delete;
+  RecordList& operator=(const RecordList&) = delete;
+
   /// An absent value removes the record, if it is there.
   void apply(const StoreRecord& change);
-  std::vector<StoreRecord> all() const;
+  std::vector<StoreRecord> all() const { return {_records.begin(), _records.end()}; }
 
  private:
-  std::map<std::pair<std::string, std::string>, std::uint64_t> _places;
-  std::map<std::uint64_t, StoreRecord> _records;  // by place
-  std::uint64_t _lastPlace = 0;
+  using Records = std::list<StoreRecord>;
+
+  Records _records;
+  std::unordered_map<std::string, Records::iterator> _places;  // by the kind, a zero and the key
 };
 
 }  // namespace device
