@@ -121,8 +121,15 @@ CoordinatorRef InstallEngine::openCoordinator(std::string_view app) {
 std::vector<CoordinatorStatus> InstallEngine::openCoordinators() {
   Lock lock(_records.mutex);
   std::vector<CoordinatorStatus> result;
-  for (const auto& [app, coordinator] : _open)
-    result.push_back({app, shortNameOfKind(coordinator->kind), coordinator->creator});
+  for (const auto& [app, coordinator] : _open) {
+    const auto& held = coordinator->state.record;
+    CoordinatorStatus status{app, shortNameOfKind(coordinator->kind), coordinator->creator};
+    status.hasPlaceholder = held.placeholder.has_value();
+    status.promisesPackage = held.appAsset || held.responsibleClient != 0;
+    status.packageClient = held.responsibleClient != coordinator->creator ? held.responsibleClient : 0;
+    if (held.appAsset) status.fraction = held.appAsset->fraction;
+    result.push_back(std::move(status));
+  }
   return result;
 }
 

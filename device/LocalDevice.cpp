@@ -20,6 +20,7 @@
 #include "device/InstallerService.h"
 #include "device/LocalProcess.h"
 #include "device/NotificationService.h"
+#include "device/OverlayFileTree.h"
 #include "device/PropertyListService.h"
 #include "device/RegistryReports.h"
 #include "device/RegistryService.h"
@@ -304,22 +305,34 @@ bool createDevice(const std::string& folder, ErrorRef* error) {
   return store && makeDeviceParts(*files, *store, error);
 }
 
-std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_ptr<EventQueue> events,
-                                        DeviceOptions options, ErrorRef* error) {
+/// False with an error that says what is there instead.
+static bool checkIsDevice(const std::string& folder, ErrorRef* error) {
   namespace fs = std::filesystem;
   setError(error, nullptr);
   std::error_code failure;
-  if (!fs::is_regular_file(folder + databaseName, failure) || !fs::is_directory(folder + treeName, failure)) {
-    setError(error,
-             localDeviceError(LocalDeviceError::notADevice,
+  if (fs::is_regular_file(folder + databaseName, failure) && fs::is_directory(folder + treeName, failure)) return true;
+  return fail(
+      error, localDeviceError(LocalDeviceError::notADevice,
                               folder + (fs::exists(folder, failure) ? ": not a device" : ": there is no such folder")));
-    return nullptr;
-  }
-  auto steps = InjectedSteps::of(options.rules);
-  auto files = openDiskFileTree(folder + treeName, error, steps);
-  auto store = files ? openDatabaseStore(folder + databaseName, error, steps) : nullptr;
+}
+
+std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_ptr<EventQueue> events,
+                                        DeviceOptions options, ErrorRef* error) {
+  if (!checkIsDevice(folder, error)) return nullptr;
+  auto files = openDiskFileTree(folder + treeName, error);
+  auto store = files ? openDatabaseStore(folder + databaseName, error) : nullptr;
   if (!store) return nullptr;
   return LocalDevice::open(std::move(files), std::move(store), std::move(events), std::move(options), error);
+}
+
+std::unique_ptr<LocalDevice> openDeviceCopy(const std::string& folder, std::unique_ptr<EventQueue> events,
+                                            DeviceOptions options, ErrorRef* error) {
+  if (!checkIsDevice(folder, error)) return nullptr;
+  auto files = openDiskFileTree(folder + treeName, error);
+  auto store = files ? copyDatabaseStore(folder + databaseName, error) : nullptr;
+  if (!store) return nullptr;
+  return LocalDevice::open(std::make_unique<OverlayFileTree>(std::move(files)), std::move(store), std::move(events),
+                           std::move(options), error);
 }
 
 std::unique_ptr<LocalDevice> makeMemoryDevice(std::unique_ptr<EventQueue> events, DeviceOptions options) {

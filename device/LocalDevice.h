@@ -68,6 +68,10 @@ struct CoordinatorStatus {
   std::string app;
   std::string kind;  // "initiating", "updating", "restoring", "restoring-demoted"
   std::uint64_t client = 0;
+  bool hasPlaceholder = false;
+  bool promisesPackage = false;     // somebody is to deliver the package
+  std::uint64_t packageClient = 0;  // who, where that is not the coordinator's own client; else 0
+  double fraction = 0;              // of the package that has come
 };
 /// The canonical state of a device: the same for two devices that differ only in container names.
 struct DeviceStatus {
@@ -77,7 +81,7 @@ struct DeviceStatus {
   /// The home screen's pages as the host set them, one for a layout without pages. Apps that it does not name stand
   /// in `home` alone.
   std::vector<std::vector<std::string>> pages;
-  std::uint64_t syncing = 0;                    // state of the home screen's sync notification
+  std::uint64_t syncing = 0;  // state of the home screen's sync notification
 };
 
 /// What the owner of a device chooses when it is opened.
@@ -151,6 +155,10 @@ bool makeDeviceParts(FileTree& files, Store& store, platform::ErrorRef* error = 
 bool createDevice(const std::string& folder, platform::ErrorRef* error = nullptr);
 std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_ptr<EventQueue> events,
                                         DeviceOptions options, platform::ErrorRef* error = nullptr);
+/// A device in memory that begins as the one in the folder is, and of whose files it reads those that are asked for.
+/// The folder is only read; nobody changes it as long as the copy is used.
+std::unique_ptr<LocalDevice> openDeviceCopy(const std::string& folder, std::unique_ptr<EventQueue> events,
+                                            DeviceOptions options, platform::ErrorRef* error = nullptr);
 /// An empty device in memory.
 std::unique_ptr<LocalDevice> makeMemoryDevice(std::unique_ptr<EventQueue> events, DeviceOptions options);
 

@@ -38,6 +38,9 @@ class Store {
 /// write; each is one step, whole or not at all, so that what the watch answers after it does not count.
 std::unique_ptr<Store> openDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr,
                                          std::shared_ptr<StepWatch> watch = nullptr);
+/// A store in memory that begins with what the file holds. The file, and what else belongs to it, is only read; nobody
+/// has it open. Null with an error as above.
+std::unique_ptr<Store> copyDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr);
 /// Forgets everything when it goes.
 std::unique_ptr<Store> makeMemoryStore();
 

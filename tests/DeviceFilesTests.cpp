@@ -12,6 +12,7 @@
 #include <random>
 
 #include "device/FileTree.h"
+#include "device/OverlayFileTree.h"
 #include "device/Store.h"
 #include "device/TemporaryFiles.h"
 
@@ -55,13 +56,13 @@ class LoweredLimit {
   rlimit _before;
 };
 
-enum class Medium { disk, memory };
+enum class Medium { disk, memory, overlay };
 std::string nameOf(const testing::TestParamInfo<Medium>& info) {
-  return info.param == Medium::disk ? "disk" : "memory";
+  return info.param == Medium::disk ? "disk" : info.param == Medium::memory ? "memory" : "overlay";
 }
 
 std::unique_ptr<FileTree> makeTree(Medium medium, const Folder& folder) {
-  return medium == Medium::disk ? openDiskFileTree(folder.path()) : makeMemoryFileTree();
+  return medium == Medium::memory ? makeMemoryFileTree() : openDiskFileTree(folder.path());
 }
 
 /// "/d/f" holds "old", "/d/s/x" holds "x", "/e" is empty.
@@ -84,12 +85,19 @@ std::string picture(FileTree& files, const std::string& directory = "") {
   return text;
 }
 
+/// An overlay's files lie below it.
+std::unique_ptr<FileTree> makeFilledTree(Medium medium, const Folder& folder) {
+  auto files = makeTree(medium, folder);
+  fill(*files);
+  return medium == Medium::overlay ? std::make_unique<OverlayFileTree>(std::move(files)) : std::move(files);
+}
+
 class FileTrees : public testing::TestWithParam<Medium> {
  protected:
   Folder _folder;
-  std::unique_ptr<FileTree> _files = makeTree(GetParam(), _folder);
+  std::unique_ptr<FileTree> _files = makeFilledTree(GetParam(), _folder);
 };
-INSTANTIATE_TEST_SUITE_P(, FileTrees, testing::Values(Medium::disk, Medium::memory), nameOf);
+INSTANTIATE_TEST_SUITE_P(, FileTrees, testing::Values(Medium::disk, Medium::memory, Medium::overlay), nameOf);
 
 struct FileRow {
   const char* name;
@@ -183,8 +191,7 @@ TEST_P(FileTrees, answerEveryOperationWithItsErrorNumber) {
   for (const auto& row : fileRows()) {
     SCOPED_TRACE(row.name);
     Folder folder;
-    auto files = makeTree(GetParam(), folder);
-    fill(*files);
+    auto files = makeFilledTree(GetParam(), folder);
     ErrorRef error = platform::makeError("stale", 1);
     EXPECT_EQ(row.operation(*files, &error), row.code == 0);
     ASSERT_EQ(error == nullptr, row.code == 0) << (error ? error->describe() : "");
@@ -211,7 +218,6 @@ TEST_P(FileTrees, keepAnOpenFileAsItWasOpened) {
 }
 
 TEST_P(FileTrees, loseTheTemporaryFilesOfAnInterruptedWrite) {
-  fill(*_files);
   auto whole = picture(*_files);
   for (std::string directory : {"", "/d", "/d/s"})
     _files->createFile(directory + "/" + std::string(temporaryFilePrefix) + "1-1", "half", {});
@@ -219,13 +225,15 @@ TEST_P(FileTrees, loseTheTemporaryFilesOfAnInterruptedWrite) {
   EXPECT_EQ(picture(*_files), whole);
 }
 
-/// Both trees through the same random operations: the same answers, the same trees.
+/// The trees through the same random operations: the same answers, the same trees. Half-way one goes on above itself.
 TEST(FileTreesTogether, doTheSame) {
   for (unsigned seed = 0; seed < 8; ++seed) {
     SCOPED_TRACE("seed " + std::to_string(seed));
     std::mt19937 random(seed);
-    Folder folder;
-    std::unique_ptr<FileTree> trees[] = {openDiskFileTree(folder.path()), makeMemoryFileTree()};
+    Folder folder, below;
+    std::unique_ptr<FileTree> trees[] = {openDiskFileTree(folder.path()), makeMemoryFileTree(),
+                                         openDiskFileTree(below.path())};
+    std::string left;
     auto path = [&] {
       std::string text;
       for (unsigned names = random() % 4 + 1; names > 0; --names) text += std::string("/") + "abc"[random() % 3];
@@ -233,8 +241,12 @@ TEST(FileTreesTogether, doTheSame) {
     };
     for (int step = 0; step < 200; ++step) {
       unsigned operation = random() % 8;
-      std::string one = path(), other = path(), answers[2];
-      for (int i = 0; i < 2; ++i) {
+      std::string one = path(), other = path(), answers[3];
+      if (step == 100) {
+        left = picture(*trees[2]);
+        trees[2] = std::make_unique<OverlayFileTree>(std::move(trees[2]));
+      }
+      for (int i = 0; i < 3; ++i) {
         FileTree& files = *trees[i];
         ErrorRef error;
         switch (operation) {
@@ -265,9 +277,12 @@ TEST(FileTreesTogether, doTheSame) {
         }
         answers[i] = error ? error->describe() : "";
       }
-      ASSERT_EQ(answers[0], answers[1]) << "step " << step << " operation " << operation << " " << one << " " << other;
+      for (int i : {1, 2})
+        ASSERT_EQ(answers[0], answers[i])
+            << "step " << step << " operation " << operation << " " << one << " " << other;
     }
-    EXPECT_EQ(picture(*trees[0]), picture(*trees[1]));
+    for (int i : {1, 2}) EXPECT_EQ(picture(*trees[0]), picture(*trees[i]));
+    EXPECT_EQ(picture(*openDiskFileTree(below.path())), left);
   }
 }
 
