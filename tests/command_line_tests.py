@@ -121,10 +121,10 @@ def c_library():
 
 
 def tree_of(folder):
-    """Every file's content but the lock's, as other processes are told there who holds it."""
+    """Every file's content but those of the lock, which tells who holds it, and of the runs that are kept."""
     folder = pathlib.Path(folder)
     return {str(path.relative_to(folder)): path.read_bytes() if path.is_file() else None
-            for path in folder.rglob("*") if path.name != "lock"}
+            for path in folder.rglob("*") if path.name != "lock" and "runs" not in path.parts}
 
 
 class Folder(unittest.TestCase):

@@ -6,7 +6,7 @@
 namespace tsd {
 
 ExitCode runBackup(const CommandContext& context, const DeviceOnlyOptions& options) {
-  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
+  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr, DeviceUse::kept});
   Daemon daemon(session.device(), session.loadPlugin());
   daemon.postStartupNotification();
   daemon.prepareForBackup();

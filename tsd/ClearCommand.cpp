@@ -19,7 +19,7 @@ std::set<std::string> appsOn(device::LocalDevice& device) {
 }  // namespace
 
 ExitCode runClear(const CommandContext& context, const DeviceOnlyOptions& options) {
-  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
+  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr, DeviceUse::kept});
   Daemon daemon(session.device(), session.loadPlugin());
   daemon.postStartupNotification();
   auto before = appsOn(session.device());

@@ -11,6 +11,7 @@
 #include "tsd/CommonOptions.h"
 #include "tsd/Console.h"
 #include "tsd/ExitCode.h"
+#include "tsd/KeptRun.h"
 #include "tsd/OptionTable.h"
 
 namespace tsd {
@@ -20,6 +21,9 @@ namespace tsd {
 struct CommandContext {
   const CommonOptions& options;
   Console& console;
+  /// The run that the device keeps of a command that drives the plug-in or stands for somebody on the device; made when
+  /// the command opens the device. Outlives the command.
+  std::optional<KeptRun>& kept;
 };
 
 struct SampleOptions {
@@ -49,6 +53,18 @@ struct SyncOptions {
   std::size_t transfers = 2;  // packages in flight
 };
 ExitCode runSync(const CommandContext& context, const SyncOptions& options);
+
+struct PlanOptions {
+  std::string device;
+  std::string host;
+};
+ExitCode runPlan(const CommandContext& context, const PlanOptions& options);
+
+struct WhyOptions {
+  std::string device;
+  std::string app;
+};
+ExitCode runWhy(const CommandContext& context, const WhyOptions& options);
 
 struct RestoreOptions {
   std::string device;

@@ -12,8 +12,9 @@ enum class ProgressMode : std::uint8_t { automatic, plain, tty, none };
 
 /// What every subcommand takes.
 struct CommonOptions {
-  std::string command;  // the subcommand's name
-  bool json = false;    // one JSON document on standard output
+  std::string command;                 // the subcommand's name
+  std::vector<std::string> arguments;  // what followed it
+  bool json = false;                   // one JSON document on standard output
   ProgressMode progress = ProgressMode::automatic;
   std::string log;     // file for the system log; empty: none
   std::string calls;   // file for the call journal; empty: none

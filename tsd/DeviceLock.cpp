@@ -50,12 +50,14 @@ std::string contentOf(int descriptor) {
 
 }  // namespace
 
-DeviceLock::DeviceLock(const std::string& folder) {
+DeviceLock::DeviceLock(const std::string& folder, Use use) : _use(use) {
   checkIsDevice(folder);
   std::string path = folder + "/lock";
-  _descriptor = ::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0644);
+  bool changes = use == Use::change;
+  _descriptor = ::open(path.c_str(), (changes ? O_RDWR | O_CREAT : O_RDONLY) | O_CLOEXEC | O_NOFOLLOW, 0644);
+  if (_descriptor < 0 && !changes && errno == ENOENT) return;
   if (_descriptor < 0) throw CommandError(path + ": " + std::strerror(errno));
-  while (::flock(_descriptor, LOCK_EX | LOCK_NB) != 0) {
+  while (::flock(_descriptor, (changes ? LOCK_EX : LOCK_SH) | LOCK_NB) != 0) {
     if (errno == EINTR) continue;
     int reason = errno;
     std::string holder = reason == EWOULDBLOCK ? contentOf(_descriptor) : "";
@@ -64,12 +66,13 @@ DeviceLock::DeviceLock(const std::string& folder) {
     throw CommandError(ExitCode::busy,
                        folder + ": in use by " + (holder.empty() ? "another process" : "process " + holder));
   }
-  noteHolder();
+  if (changes) noteHolder();
 }
 
 DeviceLock::~DeviceLock() {
+  if (_descriptor < 0) return;
   // The file stays: removing it would let two processes lock two files of one name.
-  while (::ftruncate(_descriptor, 0) < 0 && errno == EINTR) {
+  while (_use == Use::change && ::ftruncate(_descriptor, 0) < 0 && errno == EINTR) {
   }
   ::close(_descriptor);
 }

@@ -2,15 +2,21 @@
 
 #include "device/Journal.h"
 #include "tsd/CommandError.h"
+#include "tsd/LogLine.h"
 
 namespace tsd {
 
 DeviceSession::DeviceSession(const CommandContext& context, const Setup& setup)
-    : _context(context), _lock(setup.folder) {
+    : _context(context),
+      _lock(setup.folder, setup.use == DeviceUse::copy ? DeviceLock::Use::look : DeviceLock::Use::change) {
+  if (setup.use == DeviceUse::kept && !context.kept)
+    context.kept.emplace(setup.folder, context.options, context.console);
   if (!context.options.log.empty()) _log.emplace(context.options.log);
   if (!context.options.calls.empty()) _calls.emplace(context.options.calls);
   platform::ErrorRef error;
-  _device = device::openDevice(setup.folder, device::makeThreadedEventQueue(), deviceOptions(setup), &error);
+  _device = setup.use == DeviceUse::copy
+                ? device::openDeviceCopy(setup.folder, device::makeManualEventQueue(), deviceOptions(setup), &error)
+                : device::openDevice(setup.folder, device::makeThreadedEventQueue(), deviceOptions(setup), &error);
   if (!_device) throw CommandError(setup.folder + ": " + textOf(error));
 }
 
@@ -36,11 +42,16 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
   options.fileFailed = [this](std::string_view operation, std::string_view path, std::string_view reason) {
     _context.console.message(std::string(path) + ": " + std::string(operation) + " failed: " + std::string(reason));
   };
-  if (_log) {
-    options.log = [this](const device::LogRecord& record) {
-      const char* level = record.level == platform::LogLevel::error ? "error" : "default";
-      _log->write(currentTimeText() + " " + level + " " + record.category + " " + record.message);
+  KeptRun* kept = setup.use == DeviceUse::kept ? &*_context.kept : nullptr;
+  if (_log || kept) {
+    options.log = [this, kept](const device::LogRecord& record) {
+      if (_log) _log->write(logLine(record));
+      if (kept) kept->hear(record);
     };
+  }
+  if (kept) {
+    options.journals.push_back(
+        {[kept](const device::CallRecord& record) { kept->hear(record); }, device::JournalDetail::brief});
   }
   if (_calls) {
     options.journals.push_back(

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <optional>
@@ -16,6 +17,10 @@
 
 namespace tsd {
 
+/// What a command does with a device: uses it; uses it in a run that the device keeps; or uses a copy of it in memory,
+/// whose events run on the caller's thread when it waits, and whose waits take no time.
+enum class DeviceUse : std::uint8_t { plain, kept, copy };
+
 /// A device folder in use by this process: locked, opened, with the log and the journal that the common options ask
 /// for, and on demand with a plug-in object on it. On the way out the plug-in goes first, then everything that was
 /// posted runs, then the device closes.
@@ -26,6 +31,7 @@ class DeviceSession {
     std::string mainBundleIdentifier = "com.vantor.tsd";
     platform::TSDeviceService* deviceService = nullptr;
     std::function<void(const device::AppStatus&)> changed;
+    DeviceUse use = DeviceUse::plain;
   };
 
   /// Throws a `CommandError` when any of it fails.

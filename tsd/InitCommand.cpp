@@ -1,5 +1,6 @@
 #include "tsd/CommandError.h"
 #include "tsd/Commands.h"
+#include "tsd/DeviceLock.h"
 #include "tsd/Output.h"
 
 namespace tsd {
@@ -7,6 +8,7 @@ namespace tsd {
 ExitCode runInit(const CommandContext& context, const DeviceOnlyOptions& options) {
   platform::ErrorRef error;
   if (!device::createDevice(options.device, &error)) throw CommandError(textOf(error));
+  DeviceLock(options.device);  // makes its file, so that whoever only looks at the device can lock it
   if (context.options.json) {
     auto document = startDocument(context.options.command);
     document.dictionary()->set("result", "done");

@@ -10,6 +10,8 @@ namespace tsd {
 
 using platform::Value;
 
+constexpr std::size_t lineWidth = 80;
+
 Value startDocument(std::string_view command) {
   Value document = Value::makeDictionary();
   document.dictionary()->set("schema", 1);
@@ -33,6 +35,20 @@ void writeFailure(const CommonOptions& options, ExitCode code, std::string_view 
   }
 }
 
+const char* nameOfResult(ExitCode code) {
+  switch (code) {
+    case ExitCode::done:
+      return "done";
+    case ExitCode::someFailed:
+    case ExitCode::deadline:
+      return "partial";
+    case ExitCode::cancelled:
+      return "cancelled";
+    default:
+      return "failed";
+  }
+}
+
 Value arrayOf(const std::vector<std::string>& texts) {
   Value array = Value::makeArray();
   array.array()->reserve(texts.size());
@@ -49,8 +65,29 @@ std::string reasonForPeople(std::string_view description) {
   return std::string(isCode ? description.substr(colon + 2) : description);
 }
 
+std::string wrappedLine(const std::string& front, std::string_view text) {
+  std::string result;
+  std::string line = front;
+  std::size_t begin = columnsOf(front);
+  bool isEmpty = true;
+  std::size_t start = 0;
+  std::string whole = printable(text);
+  while (start <= whole.size()) {
+    std::size_t end = std::min(whole.find(' ', start), whole.size());
+    std::string word = whole.substr(start, end - start);
+    if (!isEmpty && columnsOf(line) + 1 + columnsOf(word) > lineWidth) {
+      result += line + "\n";
+      line = std::string(begin, ' ');
+      isEmpty = true;
+    }
+    line += (isEmpty ? "" : " ") + word;
+    isEmpty = false;
+    start = end + 1;
+  }
+  return result + line + "\n";
+}
+
 std::vector<std::size_t> Table::widths() const {
-  constexpr std::size_t lineWidth = 80;
   constexpr std::size_t gap = 2;
   std::vector<std::size_t> widths;
   std::size_t total = gap * (_columns.size() - 1);

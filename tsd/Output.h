@@ -17,11 +17,19 @@ void writeDocument(const platform::Value& document);
 /// The document of a command that could not go on.
 void writeFailure(const CommonOptions& options, ExitCode code, std::string_view message);
 
+/// What a document says the result was: "done", "partial" (some apps failed, or a deadline passed), "failed" or
+/// "cancelled".
+const char* nameOfResult(ExitCode code);
+
 /// An array of strings.
 platform::Value arrayOf(const std::vector<std::string>& texts);
 
 /// An error's one-line description without its domain and code, where words follow them.
 std::string reasonForPeople(std::string_view description);
+
+/// The front and the text on a line of at most 80 columns, and, indented by the front's width, as many more as the text
+/// needs. The front is printable.
+std::string wrappedLine(const std::string& front, std::string_view text);
 
 /// A table for people: columns as wide as their content, the whole no wider than 80 columns as long as the columns
 /// that may be shortened allow it.

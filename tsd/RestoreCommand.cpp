@@ -123,7 +123,7 @@ ExitCode Restore::run() {
   AppWatch watch(progress);
   const char* process = _options.inDaemon ? "com.vantor.tsd" : "com.vantor.shiftwell";
   {
-    DeviceSession session(_context, {_options.device, process, nullptr, watch.listener()});
+    DeviceSession session(_context, {_options.device, process, nullptr, watch.listener(), DeviceUse::kept});
     FileConduit conduit(session.files(), _context.console);
     pushLists(conduit);
     if (!restoresApps()) _list.apps.clear();
@@ -193,10 +193,7 @@ ExitCode Restore::code(bool stopped) const {
 Value Restore::document(ExitCode code) const {
   Value document = startDocument(_context.options.command);
   auto& entries = *document.dictionary();
-  entries.set("result", code == ExitCode::done        ? "done"
-                        : code == ExitCode::deadline  ? "partial"
-                        : code == ExitCode::cancelled ? "cancelled"
-                                                      : "failed");
+  entries.set("result", nameOfResult(code));
   entries.set("type", _options.type);
   Value apps = Value::makeArray();
   for (const auto& app : _list.apps) {

@@ -36,7 +36,7 @@ void finish(const CommandContext& context, DeviceSession& session, const StoreOp
 }  // namespace
 
 ExitCode runStore(const CommandContext& context, const StoreOptions& options) {
-  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
+  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr, DeviceUse::kept});
   auto& device = session.device();
   if (options.finish) {
     finish(context, session, options);

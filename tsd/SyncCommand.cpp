@@ -45,7 +45,7 @@ ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
   });
   AppWatch watch(progress);
   TransferQueue queue({options.host + "/Packages", options.reports, options.transfers}, progress, stop);
-  DeviceSession session(context, {options.device, "com.vantor.tsd", &queue, watch.listener()});
+  DeviceSession session(context, {options.device, "com.vantor.tsd", &queue, watch.listener(), DeviceUse::kept});
   Daemon daemon(session.device(), session.loadPlugin(stop));
   daemon.postStartupNotification();
 
@@ -59,7 +59,10 @@ ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
   stop.letFinish();
   show(context, reports);
   // A device that has not gone quiet by its deadline cannot be closed in order; the next one to open it tidies up.
-  if (code == ExitCode::deadline) std::_Exit(static_cast<int>(code));
+  if (code == ExitCode::deadline) {
+    context.kept->end(code);
+    std::_Exit(static_cast<int>(code));
+  }
   return code;
 }
 

@@ -12,20 +12,6 @@ using platform::Value;
 
 namespace {
 
-const char* nameOfResult(ExitCode code) {
-  switch (code) {
-    case ExitCode::done:
-      return "done";
-    case ExitCode::someFailed:
-    case ExitCode::deadline:
-      return "partial";
-    case ExitCode::cancelled:
-      return "cancelled";
-    default:
-      return "failed";
-  }
-}
-
 std::string lowered(std::string text) {
   for (char& c : text) {
     if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');

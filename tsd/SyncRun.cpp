@@ -8,6 +8,7 @@
 #include "tsd/FileConduit.h"
 #include "tsd/Output.h"
 #include "tsd/QuietWatch.h"
+#include "tsd/SyncOpening.h"
 
 namespace tsd {
 
@@ -16,7 +17,6 @@ using platform::Value;
 
 namespace {
 
-constexpr std::uint32_t ordinarySync = 0;
 constexpr auto displayInterval = std::chrono::milliseconds(100);
 /// How long the outcomes are waited for: a base, and as long as a slow device needs for the bytes.
 constexpr auto outcomeBase = std::chrono::seconds(60);
@@ -24,18 +24,6 @@ constexpr std::uint64_t outcomeBytesPerSecond = std::uint64_t{4} << 20;
 
 double secondsSince(std::chrono::steady_clock::time_point start, std::chrono::steady_clock::time_point end) {
   return std::chrono::duration<double>(end - start).count();
-}
-
-std::vector<std::string> deletedIn(const Value& installed) {
-  std::vector<std::string> ids;
-  const auto* answer = installed.dictionary();
-  const auto* deleted = answer ? (*answer)["_Deleted"].array() : nullptr;
-  if (!deleted) return ids;
-  for (const auto& each : *deleted) {
-    const auto* app = each.dictionary();
-    if (auto id = app ? (*app)["KBBundleIdentifier"].string() : std::nullopt) ids.emplace_back(*id);
-  }
-  return ids;
 }
 
 }  // namespace
@@ -68,22 +56,10 @@ SyncReport SyncRun::run() {
 
 /// Everything up to the reconciliation. False when the plug-in refused a step.
 bool SyncRun::begin() {
-  auto classes = _parts.daemon.supportedDataclasses();
-  if (std::find(classes.begin(), classes.end(), "Application") == classes.end()) {
-    _report.message = "the plug-in does not serve the data class Application";
-    return false;
-  }
-  std::string anchor = _parts.daemon.currentSyncAnchor();
-  ErrorRef error;
-  if (!_parts.daemon.prepareForSync(anchor, &error)) {
-    _report.message = "the plug-in could not prepare for the sync" + (error ? ": " + textOf(error) : "");
-    return false;
-  }
-  _report.deleted = deletedIn(_parts.daemon.installedAssets());
-  if (!_parts.daemon.reconcileSync(ordinarySync, anchor, &error)) {
-    _report.message = "the plug-in could not take over the host's files" + (error ? ": " + textOf(error) : "");
-    return false;
-  }
+  auto opening = openSync(_parts.daemon);
+  _report.deleted = std::move(opening.deleted);
+  _report.message = std::move(opening.problem);
+  if (!_report.message.empty()) return false;
   std::string problem;
   _todo = readTodoList(_parts.session.files(), &problem);
   if (!problem.empty()) _parts.context.console.message("the host's todo list cannot be read: " + problem);

@@ -6,7 +6,7 @@
 namespace tsd {
 
 ExitCode runUninstall(const CommandContext& context, const UninstallOptions& options) {
-  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr});
+  DeviceSession session(context, {options.device, "com.vantor.tsd", nullptr, nullptr, DeviceUse::kept});
   platform::ErrorRef error;
   if (!session.device().uninstallByPerson(options.app, &error)) {
     throw CommandError(textOf(error));

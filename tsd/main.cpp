@@ -9,6 +9,7 @@
 #include <map>
 #include <memory>
 #include <new>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -194,6 +195,14 @@ void addSync(CLI::App& program, Invocation& invocation) {
   addNumber<std::size_t>(command, "--transfers", options->transfers, "Packages in flight (2)", 1, 256);
 }
 
+void addPlan(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<PlanOptions>();
+  auto* command =
+      addCommand(program, invocation, "plan", "Show what a sync would do, and why, without doing it", runPlan, options);
+  addDevice(command, options->device);
+  addHost(command, options->host);
+}
+
 void addRestore(CLI::App& program, Invocation& invocation) {
   auto options = std::make_shared<RestoreOptions>();
   auto* command =
@@ -257,6 +266,14 @@ void addUninstall(CLI::App& program, Invocation& invocation) {
   auto options = std::make_shared<UninstallOptions>();
   auto* command = addCommand(program, invocation, "uninstall", "Uninstall an app as the person on the device would",
                              runUninstall, options);
+  addDevice(command, options->device);
+  addApp(command, options->app);
+}
+
+void addWhy(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<WhyOptions>();
+  auto* command =
+      addCommand(program, invocation, "why", "Tell what happened to an app in the last runs", runWhy, options);
   addDevice(command, options->device);
   addApp(command, options->app);
 }
@@ -366,8 +383,10 @@ void addCommands(CLI::App& program, Invocation& invocation) {
   addSample(program, invocation);
   addDeviceCommand(program, invocation, "init", "Make an empty device", runInit);
   addSync(program, invocation);
+  addPlan(program, invocation);
   addRestore(program, invocation);
   addDeviceCommand(program, invocation, "status", "Show the apps of a device and the installs under way", runStatus);
+  addWhy(program, invocation);
   addHome(program, invocation);
   addQuery(program, invocation);
   addDeviceCommand(program, invocation, "backup", "Make the apps' store metadata ready for a backup", runBackup);
@@ -394,9 +413,12 @@ std::vector<device::InjectionRule> parseRules(const std::vector<std::string>& te
 ExitCode carryOut(Invocation& invocation, Console& console) {
   ExitCode code = ExitCode::failed;
   std::string message;
+  std::optional<KeptRun> kept;
   try {
     invocation.common.rules = parseRules(invocation.rules);
-    return invocation.run({invocation.common, console});
+    code = invocation.run({invocation.common, console, kept});
+    if (kept) kept->end(code);
+    return code;
   } catch (const CommandError& error) {
     code = error.code();
     message = error.what();
@@ -405,6 +427,7 @@ ExitCode carryOut(Invocation& invocation, Console& console) {
   } catch (const std::exception& error) {
     message = error.what();
   }
+  if (kept) kept->end(code);
   console.message(message);
   if (invocation.common.json) writeFailure(invocation.common, code, message);
   return code;
@@ -437,6 +460,7 @@ ExitCode run(int count, char** arguments) {
     if (count > 1 && arguments[1][0] != '-' && command.empty()) {
       throw CommandError(ExitCode::usage, "there is no subcommand '" + std::string(arguments[1]) + "'");
     }
+    invocation.common.arguments.assign(arguments + std::min(count, 2), arguments + count);
     program.parse(count, arguments);
     return carryOut(invocation, console);
   } catch (const CLI::Success& wish) {

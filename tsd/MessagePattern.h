@@ -1,0 +1,12 @@
+#pragma once
+
+#include <string_view>
+#include <vector>
+
+namespace tsd {
+
+/// Whether the text reads like the pattern, in which each "{}" stands for any text, the shortest that fits. `captured`
+/// becomes what stands there, borrowed from the text.
+bool matches(std::string_view text, std::string_view pattern, std::vector<std::string_view>& captured);
+
+}  // namespace tsd
