@@ -196,7 +196,7 @@ TEST_P(CoordinationContract, TheReleaseOfAnObserverWaitsForItsCallback) {
   auto delegate = std::make_shared<RecordingDelegate>();
   std::unique_ptr<platform::RVAppInstallObserver> registration;
   expectRemovalToWait(
-      [&](std::function<void()> callback) {
+      [&](const std::function<void()>& callback) {
         delegate->then = [callback](const CoordinatorRef&) { callback(); };
         registration = coordination().makeAppInstallObserver("service", {3}, delegate);
         begin(initiating);

@@ -1,5 +1,6 @@
 #include "contract/Fixture.h"
 
+#include <future>
 #include <ostream>
 #include <thread>
 
@@ -141,7 +142,7 @@ std::string Fixture::stateOf(const std::string& app) {
   return (proxy->installProgressSync ? "updating " : "installed ") + proxy->bundleVersion.value_or("?");
 }
 
-void Fixture::expectRemovalToWait(const std::function<void(std::function<void()> callback)>& arrange,
+void Fixture::expectRemovalToWait(const std::function<void(const std::function<void()>& callback)>& arrange,
                                   const std::function<void()>& remove) {
   std::mutex mutex;
   std::condition_variable changed;
@@ -152,6 +153,8 @@ void Fixture::expectRemovalToWait(const std::function<void(std::function<void()>
     entered = true;
     changed.notify_all();
     changed.wait(lock, [&] { return mayEnd; });
+    // A removal that does not wait returns by now.
+    for (int i = 0; i < 1000; ++i) std::this_thread::yield();
     ended = true;
   });
   // A device may hold back what a call caused until the same thread's next call.
@@ -161,10 +164,13 @@ void Fixture::expectRemovalToWait(const std::function<void(std::function<void()>
     std::unique_lock lock(mutex);
     changed.wait(lock, [&] { return entered; });
   }
+  std::promise<void> removing;
   std::thread removal([&] {
+    removing.set_value();
     remove();
     EXPECT_TRUE(ended) << "the observer was gone while its callback ran";
   });
+  removing.get_future().wait();
   {
     std::lock_guard lock(mutex);
     mayEnd = true;

@@ -101,7 +101,7 @@ class Fixture : public testing::TestWithParam<NamedHost> {
 
   /// While a callback runs, which `arrange` has made do `callback` on the next delivery, another thread ends the
   /// observer by `remove`: that must not return before the callback has.
-  void expectRemovalToWait(const std::function<void(std::function<void()> callback)>& arrange,
+  void expectRemovalToWait(const std::function<void(const std::function<void()>& callback)>& arrange,
                            const std::function<void()>& remove);
 
  private:

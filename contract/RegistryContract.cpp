@@ -102,8 +102,8 @@ TEST_P(RegistryContract, AnObserverMayEndItselfInItsReport) {
 TEST_P(RegistryContract, TheRemovalOfAnObserverWaitsForItsReport) {
   auto observer = std::make_shared<RecordingObserver>();
   expectRemovalToWait(
-      [&](std::function<void()> callback) {
-        observer->then = std::move(callback);
+      [&](const std::function<void()>& callback) {
+        observer->then = callback;
         registry().addObserver(observer);
       },
       [&] { registry().removeObserver(observer.get()); });

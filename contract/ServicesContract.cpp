@@ -144,7 +144,7 @@ TEST_P(ServicesContract, TheRemovalOfANotificationObserverWaitsForItsCallback) {
   auto& center = platform().notifications;
   auto observer = std::make_shared<NotificationObserver>();
   expectRemovalToWait(
-      [&](std::function<void()> callback) {
+      [&](const std::function<void()>& callback) {
         observer->then = [callback](platform::NotificationCenter&) { callback(); };
         center.KBNotificationCenterAddObserver(observer, note, "one", nullptr,
                                                platform::KBNotificationSuspensionBehavior::drop);
