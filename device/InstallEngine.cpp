@@ -39,7 +39,7 @@ platform::Value infoOf(const PlaceholderRecord& placeholder) {
 
 bool isAppIdentifier(std::string_view text) {
   // With ".app" behind it, it is the name of a placeholder's bundle.
-  if (text.empty() || text.size() > 251) return false;
+  if (text.empty() || text == "." || text == ".." || text.size() > 251) return false;
   return std::none_of(text.begin(), text.end(), [](char c) {
     return c == '/' || c == '\\' || static_cast<unsigned char>(c) < 0x20 || c == 0x7f;
   });

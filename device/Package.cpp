@@ -10,6 +10,7 @@
 
 #include "device/PackageSource.h"
 #include "device/ServiceErrors.h"
+#include "device/UTF8Locale.h"
 #include "plist/PropertyList.h"
 
 namespace device {
@@ -228,6 +229,8 @@ std::optional<UnpackedPackage> unpackPackage(FileTree& files, std::string_view p
                                              const std::string& directory, const PackageLimits& limits,
                                              platform::ErrorRef* error) {
   try {
+    // libarchive cannot tell of a name that the thread's locale has no characters for.
+    const UTF8Locale utf8;
     return Unpacking(files, packagePath, directory, limits).run(error);
   } catch (const std::exception& exception) {
     platform::setError(error, packageError("package " + shown(packagePath) + ": " + exception.what()));

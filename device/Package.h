@@ -34,7 +34,8 @@ struct UnpackedPackage {
 /// when two names differ in case only, or when a limit is passed; what has been written so far stays then, for the
 /// caller to remove.
 ///
-/// Of an entry's attributes only owner execute is kept.
+/// Of an entry's attributes only owner execute is kept. Case is that of ASCII letters; all other characters of a name
+/// are taken as they are. Before a name gets here, libarchive makes slashes of its backslashes where it has no slash.
 std::optional<UnpackedPackage> unpackPackage(FileTree& files, std::string_view packagePath,
                                              const std::string& directory, const PackageLimits& limits = {},
                                              platform::ErrorRef* error = nullptr);

@@ -97,6 +97,17 @@ TEST(DevicePackages, RefusesWhatIsNoPlainAppAndNamesTheEntry) {
   }
 }
 
+TEST(DevicePackages, TakesWhatKeepsEveryLimit) {
+  auto files = device::makeMemoryFileTree();
+  std::string name = "Maps.app/a/b/" + std::string(20, 'c');
+  ASSERT_TRUE(files->createDirectory(target, false, {}));
+  auto package = ZipArchive::of({{"Maps.app/Info.plist", manifest()}, {name, std::string(500, 'x')}});
+  ASSERT_TRUE(files->createFile(source, package, {}));
+  ErrorRef error;
+  EXPECT_TRUE(device::unpackPackage(*files, source, target, {5, manifest().size() + 500, name.size(), 20, 4}, &error));
+  EXPECT_FALSE(error) << error->describe();
+}
+
 TEST(DevicePackages, RefusesEveryCutAndSurvivesEveryFlippedByte) {
   auto whole = packageOf(maps, "1");
   auto files = device::makeMemoryFileTree();

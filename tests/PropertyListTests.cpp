@@ -291,6 +291,32 @@ TEST(PropertyList, LimitsWhatSharingExpandsTo) {
   EXPECT_EQ(list.array()->size(), references.size());
 }
 
+std::string counted(char kind, std::string_view items) {
+  return std::string{kind, '\x12'} + bigEndian(items.size(), 4) + std::string(items);
+}
+
+/// The size of a document decides what it may expand to; what it refers to varies, and padding makes up for that.
+TEST(PropertyList, ExpandsToItsBudgetAndNotBeyond) {
+  auto ofNodes = [](std::size_t shared, std::size_t alone) {
+    std::string inner(1000, '\3'), outer = std::string(shared, '\1') + '\2', rest(alone, '\3');
+    return binary({counted('\xaf', outer), counted('\xaf', inner), counted('\xaf', rest), "\x09",
+                   counted('\x4f', std::string(4000 - shared - alone, 'p'))});
+  };
+  std::size_t nodes = maximumNodes(ofNodes(0, 0).size()), shared = (nodes - 1) / 1001 - 1;
+  std::size_t alone = nodes - 1 - 1001 * shared;
+  EXPECT_EQ(read(ofNodes(shared, alone)).array()->size(), shared + 1);
+  expectRejected({{ofNodes(shared, alone + 1), ErrorCode::tooLarge, "containers"}});
+
+  auto ofText = [](std::size_t places, std::size_t alone) {
+    return binary({counted('\xaf', std::string(places, '\1') + '\2'), counted('\x4f', std::string(40000, 't')),
+                   counted('\x4f', std::string(alone, 't')),
+                   counted('\x4f', std::string(50000 - places - alone, 'p'))});
+  };
+  std::size_t text = maximumText(ofText(0, 0).size()), places = text / 40000;
+  EXPECT_EQ(read(ofText(places, text % 40000)).array()->size(), places + 1);
+  expectRejected({{ofText(places, text % 40000 + 1), ErrorCode::tooLarge, "data"}});
+}
+
 TEST(PropertyList, RefusesToWriteWhatAFormCannotCarry) {
   struct Row {
     Value value;
