@@ -42,7 +42,7 @@ asan: packages ## all tests with the address and undefined-behaviour sanitizers
 	  LSAN_OPTIONS=suppressions=$(CURDIR)/.ci/leaks:print_suppressions=0 $(CTEST)
 
 tsan: packages ## the threaded tests with the thread sanitizer
-	@$(call PRESET,tsan,tsd ApplicationSync plugin_tests device_service_tests device_foundation_tests)
+	@$(call PRESET,tsan,tsd ApplicationSync plugin_tests device_service_tests device_foundation_tests contract_tests)
 	@.ci/threaded-tests build/tsan
 
 clang: check-packages ## a build with clang, whose thread-safety analysis may find nothing
