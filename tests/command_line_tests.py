@@ -380,6 +380,76 @@ class Syncs(Folder):
         self.assertEqual([report["deleted"] for report in reports], [[apps[0]], []])
 
 
+class Explanations(Folder):
+    def plan(self, *options):
+        before = {path: (path.stat().st_mtime_ns, path.is_file() and path.read_bytes())
+                  for path in pathlib.Path("dev").rglob("*")}
+        apps = self.document("plan", "dev", "host", *options)["apps"]
+        self.assertEqual({path: (path.stat().st_mtime_ns, path.is_file() and path.read_bytes())
+                          for path in pathlib.Path("dev").rglob("*")}, before)
+        return {app["id"]: (app["decision"], app["rule"], app["fact"]) for app in apps}, [
+            app["id"] for app in apps if "place" in app]
+
+    def test_a_plan_says_what_a_sync_does(self):
+        apps = self.make(6)
+        self.document("restore", "dev", "host")
+        self.tsd("store", "dev", apps[2], "--finish", "--package", f"host/Packages/{apps[2]}.pkg")
+        self.tsd("store", "dev", apps[5])
+        todo = plistlib.loads(pathlib.Path("host/ApplicationsSync.plist").read_bytes())
+        version = todo[2]["version"]
+        todo[2]["version"] = "99"
+        todo[3]["operation"] = "remove"
+        del todo[4]
+        todo.append({"identifier": "x/../y", "operation": "install"})
+        todo.append({"identifier": "com.example.done", "operation": "INSTALLED"})
+        pathlib.Path("host/ApplicationsSync.plist").write_bytes(plistlib.dumps(todo))
+        decisions, places = self.plan()
+        self.assertEqual(decisions, {
+            apps[0]: ("skipped", "being restored: its package is the restore's to bring", ""),
+            apps[1]: ("skipped", "being restored: its package is the restore's to bring", ""),
+            apps[2]: ("update", "the host wants it", f"99 over {version}"),
+            apps[3]: ("removed", "the host wants it removed", ""),
+            apps[4]: ("skipped", "auto demoted and not requested", ""),
+            apps[5]: ("skipped", "install under way", "store download, active, loading"),
+            "x/../y": ("refused", "its identifier would lead out of its folder", ""),
+            "com.example.done": ("nothing", "nothing is to be done for its entry of the todo list", "INSTALLED")})
+        self.assertEqual(places, self.sync("dev", "host", code=SOME_FAILED)["requested"])
+        self.tsd("set", "dev", "app-removal=forbidden")
+        decisions, _ = self.plan("--inject", f"setInstallOptions:{apps[2]}=fail")
+        self.assertEqual(decisions[apps[3]], ("kept", "removing apps is restricted", ""))
+        self.assertEqual(decisions[apps[2]][:2], ("failed", "its install could not be prepared"))
+
+    def kinds(self, app):
+        """Of each run, without what the device's own threads tell of, as that may come a little earlier or later."""
+        return [[event["kind"] for event in run["events"] if event["kind"] != "shown"]
+                for run in self.document("why", "dev", app)["runs"]]
+
+    def test_an_apps_life(self):
+        apps = self.make(2)
+        self.tsd("sync", "dev", "host", "--inject", f"transfer:{apps[0]}@3=kill", code=-signal.SIGKILL)
+        story = self.document("why", "dev", apps[0])
+        self.assertEqual(self.kinds(apps[0]), [["preparing", "attached", "prepared", "transferring", "transferring"]])
+        self.assertNotIn("ended", story["runs"][0])
+        self.assertIn("waits for its package, which the sync is to deliver", story["install"]["waits"])
+        self.sync("dev", "host", "--inject", f"transfer:{apps[0]}@2=fail", "--end-phase", "failed", code=SOME_FAILED)
+        self.assertEqual(self.kinds(apps[0])[1][-2:], ["transferring", "transferFailed"])
+        self.assertNotIn(b"\0", pathlib.Path("dev/runs/0001-sync/calls.jsonl").read_bytes())
+        self.tsd("uninstall", "dev", apps[1])
+        self.assertEqual(self.kinds(apps[1])[-1], ["person"])
+        self.assertRegex(self.tsd("why", "dev", apps[1]).stdout,
+                         r"not on the device(.|\n)* s installed\n(.|\n)*the person removes it")
+        self.assertIn("none of the 3 kept runs", self.tsd("why", "dev", "com.example.nobody", code=FAILED).stderr)
+
+    def test_the_last_runs_are_kept(self):
+        self.make(1)
+        for _ in range(21):
+            self.tsd("backup", "dev")
+        self.assertEqual(sorted(os.listdir("dev/runs")), [f"{number:04}-backup" for number in range(2, 22)])
+        shutil.rmtree("dev/runs")
+        pathlib.Path("dev/runs").write_text("no folder")
+        self.assertRegex(self.tsd("backup", "dev").stderr, says("this run is not kept whole"))
+
+
 class Shells(Folder):
     """What is made of the options besides the help: completions and manual pages."""
 

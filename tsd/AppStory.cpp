@@ -201,9 +201,10 @@ void AppStory::hearCall(const device::CallRecord& record) {
       tell(Kind::transferFailed, record.app, "its package did not arrive" + stood,
            reasonOfError((*arguments)["error"]));
   } else if (record.operation == "coordinatorCanceledWithReason") {
-    tell(Kind::cancelled, record.app,
-         "cancelled by " + nameOfClient((*arguments)["client"].unsignedInteger().value_or(0)),
-         reasonOfError((*arguments)["reason"]));
+    std::uint64_t client = (*arguments)["client"].unsignedInteger().value_or(0);
+    // The person gives no reason of their own.
+    tell(Kind::cancelled, record.app, "cancelled by " + nameOfClient(client),
+         client == 0 ? "" : reasonOfError((*arguments)["reason"]));
   } else if (record.operation == "coordinatorShouldPrioritize") {
     tell(Kind::prioritized, record.app, "the person wants it first");
   } else if (record.operation == "assetInstallSucceeded") {

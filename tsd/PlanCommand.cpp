@@ -144,16 +144,17 @@ Decision Rehearsal::requested(const std::string& id, const TodoEntry* entry) con
   if (entry) {
     decision.name = entry->name;
     decision.version = entry->version;
-    decision.rule = "the host wants " + (entry->version.empty() ? "it" : "version " + entry->version);
+    decision.rule = "the host wants it";
+    if (!entry->version.empty()) decision.fact = "version " + entry->version;
   } else {
     decision.rule = "its placeholder waits for a package";
   }
   if (seen != _seen.end() && seen->second.exception) {
     decision.rule = seen->second.exception->text;
   } else if (before != _before.end() && updates) {
-    decision.fact = before->second.version + (before->second.version.empty() ? "it" : "") + " is installed";
+    if (entry && !entry->version.empty()) decision.fact = entry->version + " over " + before->second.version;
   } else if (before != _before.end() && entry) {
-    decision.fact = "its placeholder is there from before";
+    decision.fact += std::string(decision.fact.empty() ? "" : ", ") + "its placeholder is there";
   }
   return decision;
 }
@@ -229,7 +230,8 @@ std::string text(const Rehearsal& rehearsal) {
   for (const char* what : {"new", "update", "removed", "kept", "skipped", "refused", "failed", "nothing"}) {
     if (counts[what]) sum += (sum.empty() ? "" : ", ") + std::to_string(counts[what]) + " " + what;
   }
-  return text + "A sync would do this" + (sum.empty() ? "" : ": " + sum) + ". The device is as it was.\n";
+  return text +
+         wrappedLine("", "A sync would do this" + (sum.empty() ? "" : ": " + sum) + ". The device is as it was.");
 }
 
 }  // namespace

@@ -73,7 +73,9 @@ Chapter chapterOf(const RunSummary& run, const std::string& app) {
   std::chrono::microseconds now{};
   AppStory story([&](const AppEvent& event) {
     if (event.app == app && event.kind != AppEvent::Kind::considered)
-      chapter.lines.push_back({nameOfKind(event.kind), event.line(), event.time});
+      chapter.lines.push_back({nameOfKind(event.kind),
+                               (event.kind == AppEvent::Kind::skipped ? "not asked for: " : "") + event.line(),
+                               event.time});
   });
   std::string inJson = device::jsonText(Value(app));
   readJournal(run, std::string_view(inJson).substr(1, inJson.size() - 2), [&](const device::CallRecord& record) {
@@ -83,7 +85,7 @@ Chapter chapterOf(const RunSummary& run, const std::string& app) {
     if (names(text, app)) chapter.lines.push_back({"message", "message: " + withoutPrefix(text), record.time});
   });
   if (auto fraction = story.fractionOf(app)) {
-    std::string text = "that is all of its package: " + std::to_string(std::lround(*fraction * 100)) + " %";
+    std::string text = std::to_string(std::lround(*fraction * 100)) + " % of its package had come when the run ended";
     chapter.lines.push_back({"transferring", text, now});
   }
   return chapter;
@@ -139,12 +141,12 @@ std::string dayAndTime(const std::string& moment) {
   return text;
 }
 
-std::string headOf(const RunSummary& run) {
+std::string headOf(const RunSummary& run, bool mayRunStill) {
   std::string words = "tsd " + run.command;
   for (const auto& argument : run.arguments) words += " " + argument;
-  std::string end = run.ended ? run.result : "no end: killed, or still running";
-  return "\n" + wrappedLine("", "Run " + std::to_string(run.number) + ", " + dayAndTime(run.began) + ": " + words +
-                                    " (" + end + ")");
+  std::string end = run.ended ? run.result : mayRunStill ? "killed, or still running" : "killed";
+  return "\n" + wrappedLine("Run " + std::to_string(run.number) + ", ",
+                            dayAndTime(run.began) + ": " + words + " (" + end + ")");
 }
 
 Value document(const CommandContext& context, const WhyOptions& options, const std::optional<Present>& present,
@@ -195,7 +197,7 @@ std::string text(const WhyOptions& options, const std::optional<Present>& presen
                  std::size_t others) {
   std::string text = wrappedLine("", options.app + (present ? ": " + stateText(*present) : ""));
   for (const auto& chapter : chapters) {
-    text += headOf(chapter.run);
+    text += headOf(chapter.run, !present);
     for (const auto& line : chapter.lines) text += wrappedLine(timeText(line), line.text);
   }
   if (others) {
@@ -208,6 +210,7 @@ std::string text(const WhyOptions& options, const std::optional<Present>& presen
   } else if (present->app && !present->app->lastOutcome.empty() && present->app->lastOutcome != "INSTALLED") {
     bool failed = present->app->lastOutcome == "FAILED";
     std::string reason = reasonForPeople(present->app->lastReason);
+    if (reason == options.app + " was cancelled by the person") reason = "by the person";
     text += "\n" + wrappedLine("Now: ", std::string("its last install ") + (failed ? "failed" : "was cancelled") +
                                             (reason.empty() ? "" : ": " + reason) + ".");
   }
@@ -225,9 +228,10 @@ ExitCode runWhy(const CommandContext& context, const WhyOptions& options) {
     if (!chapter.lines.empty()) chapters.push_back(std::move(chapter));
   }
   if (chapters.empty() && present && !present->app && !present->install) {
-    throw CommandError(options.app + ": neither the device nor " +
-                       (runs.empty() ? "a kept run" : "any of its " + std::to_string(runs.size()) + " kept runs") +
-                       " knows this app");
+    throw CommandError(options.app + ": the device does not know this app, and " +
+                       (runs.empty()
+                            ? "has no kept run"
+                            : "none of the " + std::to_string(runs.size()) + " kept runs says anything of it"));
   }
   if (context.options.json)
     writeDocument(document(context, options, present, chapters));
