@@ -108,10 +108,9 @@ struct Arrangement {
   }
 
   Box page(std::size_t number) const {
-    auto column = static_cast<double>(number % across);
-    auto row = static_cast<double>(number / across);
-    return {margin + column * (pageWidth + pageGap), margin + headerHeight + row * (pageHeight + pageGap), pageWidth,
-            pageHeight};
+    std::size_t row = number / across;
+    return {margin + static_cast<double>(number % across) * (pageWidth + pageGap),
+            margin + headerHeight + static_cast<double>(row) * (pageHeight + pageGap), pageWidth, pageHeight};
   }
 };
 
@@ -159,8 +158,9 @@ void drawPage(const Canvas& canvas, const Box& box, const std::vector<HomeIcon>&
   traceRounded(pen, box, 22);
   cairo_fill(pen);
   for (std::size_t i = 0; i < icons.size(); ++i) {
+    std::size_t row = i / iconsAcross;
     double x = box.x + pagePadding + static_cast<double>(i % iconsAcross) * cell.width;
-    double y = box.y + pagePadding + static_cast<double>(i / iconsAcross) * cell.height;
+    double y = box.y + pagePadding + static_cast<double>(row) * cell.height;
     Box icon{x + (cell.width - homeIconSide) / 2, y + 6, homeIconSide, homeIconSide};
     drawHomeIcon(pen, icons[i], icon);
     drawLabel(pen, icons[i], {x + 3, y + homeIconSide + 11, cell.width - 6, 34});
