@@ -300,6 +300,39 @@ class Syncs(Folder):
         self.assertGreater(len(reached), 1)
         self.assertLess(reached["12"], 100)  # "12 apps", of which one failed
 
+    def test_a_timeline(self):
+        apps = self.make(3)
+        self.tsd("sync", "dev", "host", "--progress", "none", "--trace", "killed", "--inject", "transfer@9=kill",
+                 code=-signal.SIGKILL)
+        self.tsd("init", "other")
+        self.sync("other", "host", "--trace", "whole")
+        killed = json.loads(pathlib.Path("killed").read_text() + "]")
+        whole = json.loads(pathlib.Path("whole").read_text())
+        for events in (killed, whole):
+            names = {(each["pid"], each["tid"]): each["args"]["name"] for each in events if each["ph"] == "M"}
+            self.assertLessEqual({"daemon", "coordination", "transfer-1", *apps}, set(names.values()))
+            slices, begun = collections.defaultdict(list), collections.defaultdict(list)
+            for event in events:
+                track, time = names[event["pid"], event["tid"]], event["ts"]
+                if event["ph"] == "B":
+                    begun[track].append((time, event["name"]))
+                elif event["ph"] == "E":
+                    slices[track].append((begun[track][-1][0], -time, begun[track].pop()[1]))
+                elif event["ph"] == "X":
+                    slices[track].append((time, -time - event["dur"], event["name"]))
+            for track, all_of_it in slices.items():
+                around = []  # the slices that a slice stands in: it may not outlast them
+                for begin, end, name in sorted(all_of_it):
+                    self.assertLessEqual(begin, -end)
+                    while around and around[-1] <= begin:
+                        around.pop()
+                    self.assertTrue(not around or -end <= around[-1] or begin == -end, (track, name))
+                    around.append(-end)
+            self.assertEqual(any(begun.values()), events is killed)
+        for app in apps:
+            self.assertEqual([name for _, _, name in sorted(slices[app])],
+                             [app, "prepare", "placeholder", "transfer", "install"])
+
     def test_the_order_of_packages_can_be_changed(self):
         apps = self.make(4)
         report = self.sync("dev", "host", "--transfers", "1", "--calls", "calls",

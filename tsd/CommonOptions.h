@@ -18,6 +18,7 @@ struct CommonOptions {
   ProgressMode progress = ProgressMode::automatic;
   std::string log;     // file for the system log; empty: none
   std::string calls;   // file for the call journal; empty: none
+  std::string trace;   // file for the timeline; empty: none
   std::string plugin;  // file of the plug-in; empty: the one beside the program
   std::vector<device::InjectionRule> rules;
 };

@@ -13,6 +13,7 @@ DeviceSession::DeviceSession(const CommandContext& context, const Setup& setup)
     context.kept.emplace(setup.folder, context.options, context.console);
   if (!context.options.log.empty()) _log.emplace(context.options.log);
   if (!context.options.calls.empty()) _calls.emplace(context.options.calls);
+  if (!context.options.trace.empty()) _trace.emplace(context.options.trace);
   platform::ErrorRef error;
   _device = setup.use == DeviceUse::copy
                 ? device::openDeviceCopy(setup.folder, device::makeManualEventQueue(), deviceOptions(setup), &error)
@@ -26,6 +27,8 @@ DeviceSession::~DeviceSession() {
   if (_log && _log->failed()) _context.console.message(_context.options.log + ": not every line could be written");
   if (_calls && _calls->failed())
     _context.console.message(_context.options.calls + ": not every line could be written");
+  if (_trace && _trace->failed())
+    _context.console.message(_context.options.trace + ": not every line could be written");
 }
 
 void DeviceSession::unloadPlugin() {
@@ -56,6 +59,10 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
   if (_calls) {
     options.journals.push_back(
         {[this](const device::CallRecord& record) { _calls->write(device::journalLine(record)); }});
+  }
+  if (_trace) {
+    options.journals.push_back(
+        {[this](const device::CallRecord& record) { _trace->hear(record); }, device::JournalDetail::brief});
   }
   return options;
 }

@@ -14,6 +14,7 @@
 #include "tsd/DeviceLock.h"
 #include "tsd/LineFile.h"
 #include "tsd/PluginLoader.h"
+#include "tsd/TraceFile.h"
 
 namespace tsd {
 
@@ -59,6 +60,7 @@ class DeviceSession {
   DeviceLock _lock;
   std::optional<LineFile> _log;
   std::optional<LineFile> _calls;
+  std::optional<TraceFile> _trace;
   std::unique_ptr<device::LocalDevice> _device;
   std::optional<CountdownClock> _clock;
   std::optional<platform::Platform> _platform;  // the device's with that clock

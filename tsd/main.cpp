@@ -167,6 +167,13 @@ void addDeviceCommand(CLI::App& program, Invocation& invocation, const char* nam
   addDevice(addCommand(program, invocation, name, description, run, options), options->device);
 }
 
+void addTrace(CLI::App* command, Invocation& invocation) {
+  command
+      ->add_option("--trace", invocation.common.trace,
+                   wrapped("Write a timeline to this file, in the trace event format that timeline viewers open"))
+      ->option_text("FILE");
+}
+
 void addSync(CLI::App& program, Invocation& invocation) {
   auto options = std::make_shared<SyncOptions>();
   auto* command = addCommand(program, invocation, "sync", "Sync a device with a host folder", runSync, options);
@@ -192,6 +199,7 @@ void addSync(CLI::App& program, Invocation& invocation) {
                     wrapped("Report the installs' outcomes to the plug-in as well"));
   addNumber<std::size_t>(command, "--repeat", options->repeat, "Syncs in a row, with one plug-in object (1)", 1,
                          1000000);
+  addTrace(command, invocation);
   addNumber<std::size_t>(command, "--transfers", options->transfers, "Packages in flight (2)", 1, 256);
 }
 
@@ -210,6 +218,7 @@ void addRestore(CLI::App& program, Invocation& invocation) {
   addDevice(command, options->device);
   addHost(command, options->host);
   addNumber(command, "--type", options->type, "Type of the restore; 2 and 3 bring apps back (2)");
+  addTrace(command, invocation);
   command->add_flag("--in-daemon", options->inDaemon,
                     wrapped("Run in the daemon's own process, not the migration component's"));
 }
