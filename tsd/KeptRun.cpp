@@ -81,8 +81,7 @@ void KeptRun::end(ExitCode code) {
   } catch (const std::exception& problem) {
     tell(problem.what());
   }
-  if ((_calls && _calls->failed()) || (_log && _log->failed()))
-    tell(_folder + ": not every line could be written");
+  if ((_calls && _calls->failed()) || (_log && _log->failed())) tell(_folder + ": not every line could be written");
 }
 
 void KeptRun::tell(const std::string& problem) {
