@@ -63,8 +63,8 @@ error-sweep: build ## every step of a sync and a restore failed in every way, on
 power-loss: build-all ## power lost after every step of a sync and a restore
 	@cd build/release && APPSYNC_POWER_LOSS=all bin/power_loss_tests --gtest_brief=1
 
-simulate: build-all ## random scenarios against the model: make simulate SEEDS=10000
-	@cd build/release && $(WITH_SEEDS) bin/plugin_tests --gtest_filter='*Simulation*' --gtest_brief=1
+simulate: build-all ## random lives of a device against the model: make simulate SEEDS=10000
+	@.ci/simulate build/release $(or $(SEEDS),10000)
 
 fuzz: fuzz-packages ## looks for inputs that break something: make fuzz RUNS=1000000 TARGETS=xml_list
 	@$(call PRESET,fuzz,$(addprefix fuzz_,$(or $(TARGETS),$(notdir $(wildcard fuzz/seeds/*)))))

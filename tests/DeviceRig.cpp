@@ -4,76 +4,9 @@
 
 #include <filesystem>
 
-#include "device/Store.h"
 #include "plist/PropertyList.h"
 
 namespace tests {
-
-namespace {
-
-/// Parts that outlive the device they are given to.
-class SharedStore final : public device::Store {
- public:
-  SharedStore(device::Store& store, const bool& broken) : _store(store), _broken(broken) {}
-  std::vector<device::StoreRecord> load() override { return _store.load(); }
-  bool commit(const std::vector<device::StoreRecord>& changes, ErrorRef* error) override {
-    if (!_broken) return _store.commit(changes, error);
-    platform::setError(error, platform::makeError("Store", 28, "no space left"));
-    return false;
-  }
-
- private:
-  device::Store& _store;
-  const bool& _broken;
-};
-
-class SharedTree final : public device::FileTree {
- public:
-  explicit SharedTree(device::FileTree& tree) : _tree(tree) {}
-  bool removeItem(std::string_view path, ErrorRef* error) override { return _tree.removeItem(path, error); }
-  bool createDirectory(std::string_view path, bool intermediates, const Value& attributes, ErrorRef* error) override {
-    return _tree.createDirectory(path, intermediates, attributes, error);
-  }
-  bool moveItem(std::string_view from, std::string_view to, ErrorRef* error) override {
-    return _tree.moveItem(from, to, error);
-  }
-  bool copyItem(std::string_view from, std::string_view to, ErrorRef* error) override {
-    return _tree.copyItem(from, to, error);
-  }
-  bool fileExists(std::string_view path, bool* isDirectory) override { return _tree.fileExists(path, isDirectory); }
-  std::optional<platform::FileAttributes> attributesOfItem(std::string_view path, ErrorRef* error) override {
-    return _tree.attributesOfItem(path, error);
-  }
-  bool createFile(std::string_view path, platform::BytesView contents, const Value& attributes) override {
-    return _tree.createFile(path, contents, attributes);
-  }
-  std::optional<Bytes> readFile(std::string_view path, ErrorRef* error) override { return _tree.readFile(path, error); }
-  bool writeAtomically(std::string_view path, platform::BytesView contents, ErrorRef* error) override {
-    return _tree.writeAtomically(path, contents, error);
-  }
-  int utimes(std::string_view path, int& number) override { return _tree.utimes(path, number); }
-  std::optional<std::vector<Entry>> list(std::string_view path, ErrorRef* error) override {
-    return _tree.list(path, error);
-  }
-  std::unique_ptr<device::FileWriter> createNew(std::string_view path, bool executable, ErrorRef* error) override {
-    return _tree.createNew(path, executable, error);
-  }
-  std::unique_ptr<device::FileReader> openForReading(std::string_view path, ErrorRef* error) override {
-    return _tree.openForReading(path, error);
-  }
-  bool syncDirectory(std::string_view path, ErrorRef* error) override { return _tree.syncDirectory(path, error); }
-
- private:
-  device::FileTree& _tree;
-};
-
-}  // namespace
-
-struct DeviceRig::SharedParts {
-  std::unique_ptr<device::FileTree> files;
-  std::unique_ptr<device::Store> store;
-  bool broken = false;
-};
 
 std::string nameOfMedium(const testing::TestParamInfo<Medium>& info) {
   return info.param == Medium::disk ? "disk" : "memory";
@@ -98,9 +31,7 @@ DeviceRig::DeviceRig(Medium medium) : _medium(medium), _parts(std::make_unique<S
     _parts->files = device::openDiskFileTree(_folder + "/fs", &error);
     _parts->store = device::openDatabaseStore(_folder + "/device.db", &error);
   } else {
-    _parts->files = device::makeMemoryFileTree();
-    _parts->store = device::makeMemoryStore();
-    EXPECT_TRUE(device::makeDeviceParts(*_parts->files, *_parts->store, &error)) << error->describe();
+    _parts->makeInMemory();
   }
   open();
 }
@@ -119,9 +50,8 @@ void DeviceRig::open() {
     _told.push_back(app.id + ' ' + app.state + (app.lastOutcome.empty() ? "" : ' ' + app.lastOutcome));
   };
   ErrorRef error;
-  _device = device::LocalDevice::open(std::make_unique<SharedTree>(*_parts->files),
-                                      std::make_unique<SharedStore>(*_parts->store, _parts->broken), std::move(events),
-                                      std::move(options), &error);
+  _device = device::LocalDevice::open(_parts->lendFiles(), _parts->lendStore(), std::move(events), std::move(options),
+                                      &error);
   ASSERT_TRUE(_device) << (error ? error->describe() : "no reason");
 }
 

@@ -18,6 +18,7 @@
 #include "platform/OBApplicationWorkspace.h"
 #include "platform/Process.h"
 #include "tests/SampleContent.h"
+#include "tests/SharedParts.h"
 
 namespace tests {
 
@@ -112,7 +113,6 @@ class DeviceRig {
   bool isShown(const std::string& app = maps);
 
  private:
-  struct SharedParts;
   void open();
 
   const Medium _medium;

@@ -62,6 +62,12 @@ bool DaemonTransfers::wasCancelled(const std::string& identifier) const {
   return std::count(_cancelled.begin(), _cancelled.end(), identifier) != 0;
 }
 
+void DaemonTransfers::forget() {
+  std::lock_guard lock(_mutex);
+  _prioritized.clear();
+  _cancelled.clear();
+}
+
 bool DaemonTransfers::complete() {
   std::vector<std::function<void(ErrorRef)>> completions;
   {
@@ -76,38 +82,67 @@ static bool isTransactionMessage(const CallRecord& record) {
   return record.service == "log" && (*record.arguments.dictionary())["category"].string() == "tsd.appsync";
 }
 
+static std::vector<device::InjectionRule> parsedRules(const std::vector<std::string>& rules) {
+  std::vector<device::InjectionRule> parsed;
+  for (const auto& rule : rules) {
+    ErrorRef error;
+    auto each = device::InjectionRule::parse(rule, &error);
+    if (each) parsed.push_back(*each);
+    EXPECT_TRUE(each) << error->describe();
+  }
+  return parsed;
+}
+
 PluginRig::PluginRig(const Options& options) : PluginRig(options, nullptr, nullptr) {}
 
 PluginRig::PluginRig(const Options& options, std::unique_ptr<device::FileTree> files,
-                     std::unique_ptr<device::Store> store) {
+                     std::unique_ptr<device::Store> store)
+    : _options(options) {
+  _parts.files = std::move(files);
+  _parts.store = std::move(store);
+  if (!_parts.files) _parts.makeInMemory();
+  open();
+  EXPECT_TRUE(_device->set("icon-size", "16"));
+  load();
+}
+
+void PluginRig::open() {
   device::DeviceOptions chosen;
-  chosen.mainBundleIdentifier = options.process;
+  chosen.mainBundleIdentifier = _options.process;
   chosen.deviceService = &_transfers;
-  if (options.journaled) {
-    chosen.journals.push_back({[this, told = options.told](const CallRecord& record) {
-      if (told) told(record);
+  chosen.rules = parsedRules(_options.rules);
+  if (_options.journaled) {
+    _records.reserve(1024);
+    chosen.journals.push_back({[this](const CallRecord& record) {
+      if (_options.told) _options.told(record);
       // What the transaction log makes of its records says the same again.
       if (!isTransactionMessage(record)) _records.push_back(record);
     }});
   }
-  for (const auto& rule : options.rules) {
-    ErrorRef error;
-    auto parsed = device::InjectionRule::parse(rule, &error);
-    if (parsed) chosen.rules.push_back(*parsed);
-    EXPECT_TRUE(parsed) << error->describe();
-  }
-  if (options.threaded) {
-    _device = device::makeMemoryDevice(device::makeThreadedEventQueue(), std::move(chosen));
+  std::unique_ptr<device::EventQueue> events;
+  if (_options.threaded) {
+    events = device::makeThreadedEventQueue();
   } else {
-    auto events = device::makeManualEventQueue();
-    _manualEvents = events.get();
-    _device = files ? device::LocalDevice::open(std::move(files), std::move(store), std::move(events), chosen)
-                    : device::makeMemoryDevice(std::move(events), std::move(chosen));
+    auto manual = device::makeManualEventQueue();
+    _manualEvents = manual.get();
+    events = std::move(manual);
   }
+  _device = device::LocalDevice::open(_parts.lendFiles(), _parts.lendStore(), std::move(events), std::move(chosen));
   if (!_device) throw std::runtime_error("these parts are no device's");
   _transfers.serve(*_device);
-  EXPECT_TRUE(_device->set("icon-size", "16"));
+}
+
+void PluginRig::reopen() {
+  unload();
+  _device = nullptr;
+  open();
   load();
+}
+
+void PluginRig::beginStep(const std::vector<std::string>& rules) {
+  _device->boundary().setRules(parsedRules(rules));
+  _records.clear();
+  _transfers.forget();
 }
 
 PluginRig::~PluginRig() {

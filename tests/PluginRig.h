@@ -12,6 +12,7 @@
 #include "platform/TSClient.h"
 #include "platform/TSDeviceService.h"
 #include "tests/SampleContent.h"
+#include "tests/SharedParts.h"
 #include "tsd/Daemon.h"
 
 namespace tests {
@@ -53,6 +54,7 @@ class DaemonTransfers final : public platform::TSDeviceService {
   }
   void cancelAssetTransferForFailedAsset(const TSAssetRef& asset) override;
 
+  void forget();
   std::vector<std::string> prioritized() const;
   bool wasCancelled(const std::string& identifier) const;
   /// Runs the completions that are due. True when there was one.
@@ -96,6 +98,10 @@ class PluginRig {
   void unload();
   /// Lets it go at once, whoever may be calling back.
   void forget() { _client = nullptr; }
+  /// Ends the process and begins it anew, on the same device. Not with real threads.
+  void reopen();
+  /// In place of the rules there are, while nothing is under way. What has been written down is forgotten.
+  void beginStep(const std::vector<std::string>& rules);
   void postStartup();
   /// Delivers everything that is due, also what follows from it.
   void deliver();
@@ -131,8 +137,11 @@ class PluginRig {
   std::size_t countOf(std::string_view operation, std::string_view app = {}) const;
 
  private:
+  void open();
   std::vector<const device::CallRecord*> recordsIn(std::string_view operation, std::size_t nth) const;
 
+  const Options _options;
+  SharedParts _parts;
   DaemonTransfers _transfers;
   std::vector<device::CallRecord> _records;  // written under the journal's lock
   device::ManualEventQueue* _manualEvents = nullptr;

@@ -19,12 +19,13 @@ class FailurePlan {
   bool next(const std::string& operation, const std::string& app, const std::string& path = {},
             const std::string& service = {}) {
     std::uint64_t ordinal = ++_ordinals[_entry + operation + service + app + path];
+    std::uint64_t match = ++_matches[operation + service + app];
     return std::any_of(_failures.begin(), _failures.end(), [&](const Failure& failure) {
       auto dot = failure.point.find('.');
       if (failure.point.substr(dot + 1) != operation) return false;
       if (!service.empty() && failure.point.substr(0, dot) != service) return false;
       return failure.app == app && matches(path, failure.path) && (failure.entry.empty() || failure.entry == _entry) &&
-             (failure.ordinal == 0 || failure.ordinal == ordinal);
+             (failure.ordinal == 0 ? failure.match == 0 || failure.match == match : failure.ordinal == ordinal);
     });
   }
 
@@ -32,14 +33,67 @@ class FailurePlan {
   const std::vector<Failure>& _failures;
   std::string _entry;
   std::map<std::string, std::uint64_t> _ordinals;
+  std::map<std::string, std::uint64_t> _matches;
 };
 
-class SyncModel {
+/// What both kinds of runs do with the device.
+class DeviceModel {
  public:
-  explicit SyncModel(const Scenario& scenario) : _scenario(scenario), _plan(scenario.failures) {}
+  DeviceModel(World& world, const std::vector<Failure>& failures) : _world(world), _plan(failures) {}
+
+ protected:
+  bool fails(const std::string& operation, const std::string& app = {}, const std::string& path = {},
+             const std::string& service = {}) {
+    return _plan.next(operation, app, path, service);
+  }
+
+  /// The plug-in hears that the app's coordinator was cancelled. True when that is news to it.
+  bool tellCancelled(const std::string& id) {
+    if (!_world.hears(id)) return false;
+    std::string entry = _plan.entry();
+    _plan.enter("coordinatorCanceledWithReason");
+    bool known = !fails("bundleID", id);
+    _plan.enter(entry);
+    if (known) _world.awaited.erase(id);
+    return known && _world.cancelled.insert(id).second;
+  }
+
+  /// True when the plug-in heard of it as news.
+  bool endCancelled(const std::string& id) {
+    bool isNews = tellCancelled(id);
+    _world.endCoordinator(id);
+    return isNews;
+  }
+
+  bool uninstall(const std::string& id) {
+    auto known = _world.apps.find(id);
+    if (known == _world.apps.end() || (!known->second.installed && !known->second.placeholder)) return false;
+    bool isNews = !known->second.coordinator.empty() && tellCancelled(id);
+    _world.uninstalled.insert(id);
+    _world.remove(id);
+    return isNews;
+  }
+
+  std::vector<std::string> open() const {
+    std::vector<std::string> coordinators;
+    for (const auto& [id, app] : _world.apps) {
+      if (app.own && !app.coordinator.empty()) coordinators.push_back(id + ' ' + app.coordinator);
+    }
+    return coordinators;
+  }
+
+  World& _world;
+  FailurePlan _plan;
+};
+
+class SyncModel : DeviceModel {
+ public:
+  SyncModel(const Scenario& scenario, World& world) : DeviceModel(world, scenario.failures), _scenario(scenario) {}
 
   Outcome run() {
-    for (const auto& app : _scenario.apps) prepareDevice(app);
+    for (const auto& app : _scenario.apps) {
+      if (!_scenario.continues) prepareDevice(app);
+    }
     _plan.enter("installedAssets");
     reportDeleted();
     _plan.enter("reconcileSync");
@@ -52,28 +106,14 @@ class SyncModel {
       for (const auto& id : _outcome.requested) report(*given(id));
     }
     _plan.enter("assetTransferEndedWithSuccess");
-    if (!_outcome.reconciled || !_scenario.phaseSucceeded) cancelOutstanding();
+    endPhase(_outcome.reconciled && _scenario.phaseSucceeded);
+    if (_scenario.syncSucceeded.value_or(_outcome.reconciled)) endSync();
     finish();
     return _outcome;
   }
 
  private:
   using App = ScenarioApp;
-  /// What the device knows about an app.
-  struct Known {
-    bool installed = false;
-    bool placeholder = false;
-    bool ofStore = false;  // its facts are the scenario's
-    std::string coordinator{};
-    bool ownCoordinator = false;
-    bool attached = false;  // the coordinator's placeholder is shown
-  };
-
-  bool fails(const std::string& operation, const std::string& app = {}, const std::string& path = {},
-             const std::string& service = {}) {
-    return _plan.next(operation, app, path, service);
-  }
-
   const App* given(const std::string& id) const {
     for (const auto& app : _scenario.apps) {
       if (app.id == id) return &app;
@@ -85,48 +125,34 @@ class SyncModel {
     return std::count(_scenario.settings.begin(), _scenario.settings.end(), std::pair(key, value)) != 0;
   }
 
-  void show(const std::string& id) {
-    if (std::find(_shown.begin(), _shown.end(), id) == _shown.end()) _shown.push_back(id);
-  }
-
-  void remove(const std::string& id) {
-    _known.erase(id);
-    _shown.erase(std::remove(_shown.begin(), _shown.end(), id), _shown.end());
-  }
-
-  void endCoordinator(const std::string& id) {
-    auto& app = _known[id];
-    app.coordinator.clear();
-    if (!app.installed && (app.attached || !app.placeholder)) remove(id);
-  }
-
   void cancel(const std::string& object, const std::string& id, const std::string& reason) {
     _outcome.cancelled.push_back(object + ' ' + id + ' ' + reason);
-    if (object == "coordinator" && !fails("cancelForReason", id, {}, "RVAppInstallCoordinator")) endCoordinator(id);
+    if (object == "coordinator" && !fails("cancelForReason", id, {}, "RVAppInstallCoordinator")) endCancelled(id);
   }
 
   void prepareDevice(const App& app) {
     if (!app.previousMark.empty()) {
-      _hasList = true;
-      _marks.try_emplace(app.id, app.previousMark);
+      _world.hasList = true;
+      _world.marks.try_emplace(app.id, app.previousMark);
     }
+    if (app.lost) _world.uninstalled.insert(app.id);
     if (app.before == App::Before::absent) return;
-    auto& known = _known[app.id];
+    auto& known = _world.apps[app.id];
     known.installed = app.before == App::Before::installed;
     known.placeholder = app.before == App::Before::placeholder;
-    known.ofStore = known.placeholder;
+    if (known.placeholder) known.facts = app.store;
     if (known.placeholder && app.store.createsCoordinator) known.coordinator = "initiating";
-    show(app.id);
+    _world.show(app.id);
   }
 
   bool readsList() {
-    return _hasList && !fails("readFile", {}, todoListPath) && !fails("propertyListWithData", {}, todoListPath);
+    return _world.hasList && !fails("readFile", {}, todoListPath) && !fails("propertyListWithData", {}, todoListPath);
   }
 
   void mark(const std::string& id, const std::string& operation) {
-    if (!readsList() || !_marks.count(id)) return;
+    if (!readsList() || !_world.marks.count(id)) return;
     if (fails("dataWithPropertyList", {}, todoListPath) || fails("writeAtomically", {}, todoListPath)) return;
-    _marks[id] = operation;
+    _world.marks[id] = operation;
   }
 
   void reportDeleted() {
@@ -134,43 +160,47 @@ class SyncModel {
     bool hasLastSync = !fails("readFile", {}, lastSyncPath) && !fails("propertyListWithData", {}, lastSyncPath);
     bool hasLost = !fails("CorvaneLookupUninstalled");
     for (const auto& app : _scenario.apps) {
-      bool candidate = hasLost && app.lost;
+      bool candidate = hasLost && _world.uninstalled.count(app.id);
       if (hasLastSync && app.inLastSync) {
-        candidate |= fails("applicationIsInstalled", app.id) || app.before != App::Before::installed;
+        candidate |= fails("applicationIsInstalled", app.id) || !_world.installed(app.id);
       }
-      const auto& mark = app.previousMark;
+      auto known = _world.marks.find(app.id);
+      const auto mark = known == _world.marks.end() ? std::string() : known->second;
       bool awaited = hasList && !mark.empty() && mark != "FAILED" && mark != "INSTALLED";
       if (candidate && !awaited) _outcome.deleted.push_back(app.id);
     }
     std::sort(_outcome.deleted.begin(), _outcome.deleted.end());
+    if (hasLost) _world.lookedUp = _world.uninstalled;
   }
 
   bool reconcile() {
-    bool keepsOld = _hasList && fails("removeItem", {}, workArea);
+    bool keepsOld = _world.hasList && fails("removeItem", {}, workArea);
     if (!keepsOld) {
-      _hasList = false;
-      _marks.clear();
+      _world.hasList = false;
+      _world.marks.clear();
     }
     if (fails("createDirectory", {}, pluginDirectory)) return false;
     if (!_scenario.stages || fails("fileExists", {}, stagingDirectory)) return true;
     if (keepsOld || fails("moveItem", {}, workArea)) return false;
-    _hasList = !_scenario.rawTodo;
+    _world.hasList = !_scenario.rawTodo;
     for (const auto& app : _scenario.apps) {
-      if (_hasList && !app.operation.empty()) _marks.try_emplace(app.id, app.operation);
+      if (_world.hasList && !app.operation.empty()) _world.marks.try_emplace(app.id, app.operation);
     }
     bool removes = readsList() && !hasSetting("app-removal", "forbidden");
     for (const auto& app : _scenario.apps) {
       bool safe = app.id.find("/..") == app.id.npos;
-      if (removes && app.operation == "remove" && safe && !fails("uninstallAppWithBundleID", app.id)) remove(app.id);
+      if (removes && app.operation == "remove" && safe && !fails("uninstallAppWithBundleID", app.id)) uninstall(app.id);
     }
     std::string layoutPath = std::string(workArea) + "/PanelloIconState.plist";
-    if (!fails("readFile", {}, layoutPath) && !fails("PNSetIconState")) _layout = _scenario.layout;
+    if (_scenario.layout.empty()) return true;
+    if (!fails("readFile", {}, layoutPath) && !fails("PNSetIconState")) _world.layout = _scenario.layout;
     return true;
   }
 
   bool isUnderWay(const std::string& id) const {
-    const auto& store = given(id)->store;
-    if (!_known.at(id).ofStore || !store.hasProgress || store.paused || store.installState != 1) return false;
+    const auto& known = _world.apps.at(id);
+    const auto& store = known.facts;
+    if (!known.placeholder || !store.hasProgress || store.paused || store.installState != 1) return false;
     return (store.installType != 2 && store.installPhase == 1) || (store.installType == 1 && store.installPhase == 0);
   }
 
@@ -179,9 +209,9 @@ class SyncModel {
     bool hasList = readsList();
     bool hasSystem = !fails("enumerateBundlesOfType");
     bool hasPlaceholders = !fails("enumerateBundlesOfType");
-    for (const auto& [id, known] : _known) {
+    for (const auto& [id, known] : _world.apps) {
       if (!known.placeholder) continue;
-      if (hasSystem && given(id)->store.systemBundle) systemPlaceholders.insert(id);
+      if (hasSystem && known.facts.systemBundle) systemPlaceholders.insert(id);
       if (hasPlaceholders) wanted.push_back(id);
     }
     for (const auto& app : _scenario.apps) {
@@ -193,14 +223,14 @@ class SyncModel {
     }
     bool isTold = !fails("addObserver") && std::count(_scenario.rules.begin(), _scenario.rules.end(),
                                                       "applicationInstallsArePrioritized=none") == 0;
-    auto underWay = [&](const std::string& id) { return isTold && _known.count(id) && isUnderWay(id); };
+    auto underWay = [&](const std::string& id) { return isTold && _world.apps.count(id) && isUnderWay(id); };
     wanted.erase(std::remove_if(wanted.begin(), wanted.end(), underWay), wanted.end());
     return wanted;
   }
 
   std::vector<std::string> inHomeOrder(std::vector<std::string> wanted) {
-    std::vector<std::string> order = _layout;
-    order.insert(order.end(), _shown.begin(), _shown.end());
+    std::vector<std::string> order = _world.layout;
+    order.insert(order.end(), _world.shown.begin(), _world.shown.end());
     if (fails("PNGetFlattenedIconState") || fails("propertyListWithData", {}, todoListPath)) return wanted;
     std::vector<std::string> ordered;
     for (const auto* source : {&order, &wanted}) {
@@ -217,45 +247,46 @@ class SyncModel {
     std::set<std::string> systemPlaceholders;
     auto wanted = inHomeOrder(candidates(requests, systemPlaceholders));
     for (const auto& id : wanted) {
-      const auto& store = given(id)->store;
       bool ofStore = !_stagedFolder.count(id);
+      const device::StoreInstall store = ofStore ? _world.apps[id].facts : device::StoreInstall();
       if (hasSetting("app-installation", "forbidden")) continue;
       if (ofStore && store.installType == 2) continue;
       if (ofStore && (store.applicationType == "System" || systemPlaceholders.count(id))) continue;
       if (ofStore && (store.installType == 7 || store.installType == 8) && !requests.count(id)) continue;
-      bool existing = !fails("applicationProxyForIdentifier", id) && _known[id].installed;
+      bool existing = !fails("applicationProxyForIdentifier", id) && _world.apps[id].installed;
       if (prepare(id, existing)) {
         _outcome.requested.push_back(id);
-        if (existing) _updating.insert(id);
+        if (existing) _world.updating.insert(id);
       } else {
         mark(id, "FAILED");
-        if (!_known[id].installed && !_known[id].placeholder && _known[id].coordinator.empty()) remove(id);
+        if (!_world.apps[id].installed && !_world.apps[id].placeholder && _world.apps[id].coordinator.empty())
+          _world.remove(id);
       }
     }
   }
 
   bool prepare(const std::string& id, bool existing) {
-    auto& app = _known[id];
+    auto& app = _world.apps[id];
     if (fails("coordinatorForAppWithBundleID", id)) return false;
     std::string kind = existing ? "updating" : "initiating";
-    bool foreign = !app.coordinator.empty();
-    if (!foreign) {
+    if (app.coordinator.empty()) {
       app.coordinator = kind;
-      app.ownCoordinator = true;
+      app.own = true;
     }
-    if (fails("creatorIdentifier", id) || foreign) return false;
-    // Nobody hears of the coordinator, unless the process listens to all of them.
-    if (fails("setObserver", id) && _scenario.process != "com.vantor.tsd") _unheard.insert(id);
-    if (fails("makeInstallOptions") || fails("setInstallOptions", id) || fails("setInitialZDRAssetPromises", id) ||
-        fails("makePromisedTransferToPathWithoutPath", id)) {
-      cancel("coordinator", id, "TSError 1");
-      return false;
-    }
-    if (fails("setAppAssetPromise", id)) {
+    if (app.coordinator != kind || fails("creatorIdentifier", id) || !app.own) return false;
+    app.observed |= !fails("setObserver", id);
+    auto giveUp = [&] { return cancel("coordinator", id, "TSError 1"), false; };
+    if (!app.options && (fails("makeInstallOptions") || fails("setInstallOptions", id))) return giveUp();
+    app.options = true;
+    if (!app.initialPromises && fails("setInitialZDRAssetPromises", id)) return giveUp();
+    app.initialPromises = true;
+    if (!app.asset && fails("makePromisedTransferToPathWithoutPath", id)) return giveUp();
+    if (!app.asset && fails("setAppAssetPromise", id)) {
       _outcome.cancelled.push_back("promise " + id + " TSError 30");
-      cancel("coordinator", id, "TSError 1");
-      return false;
+      return giveUp();
     }
+    app.asset = true;
+    if (app.attached) return true;
     bool made = !fails("makeAppPlaceholder", id);
     bool hasIcon = _stagedFolder.count(id) && given(id)->hasFolder;
     if (made && hasIcon && fails("setIconPromise", id)) {
@@ -263,22 +294,19 @@ class SyncModel {
     }
     if (!made || fails("setPlaceholderPromise", id)) {
       if (made) cancel("placeholder", id, "TSError 1");
-      cancel("coordinator", id, "TSError 1");
-      return false;
+      return giveUp();
     }
-    if (!app.installed) app.placeholder = true;
-    app.attached = true;
-    show(id);
+    _world.attach(id, 4, true);
     return true;
   }
 
   /// The plug-in's own coordinator for the app, as long as it is found.
   bool hasCoordinator(const std::string& id) {
     if (fails("coordinatorForAppWithBundleID", id)) return false;
-    auto known = _known.find(id);
-    if (known == _known.end() || known->second.coordinator.empty()) return false;
-    std::string kind = _updating.count(id) ? "updating" : "initiating";
-    return !fails("creatorIdentifier", id) && known->second.coordinator == kind;
+    auto known = _world.apps.find(id);
+    if (known == _world.apps.end() || known->second.coordinator.empty()) return false;
+    std::string kind = _world.updating.count(id) ? "updating" : "initiating";
+    return known->second.coordinator == kind && !fails("creatorIdentifier", id) && known->second.own;
   }
 
   /// The promise of the package; another one cannot be attached.
@@ -297,27 +325,26 @@ class SyncModel {
   void transfer(const App& app) {
     if (app.transfer == App::Transfer::neverStarts) return;
     progress(app);
-    bool cancelled = app.person == App::Person::cancels || app.person == App::Person::uninstalls;
-    if (cancelled) {
-      endCoordinator(app.id);
-      if (app.person == App::Person::uninstalls) remove(app.id);
-    }
-    bool stops = cancelled && !_unheard.count(app.id) && !hasSetting("device-service-cancel", "no");
+    bool isNews = false;
+    if (app.person == App::Person::cancels) isNews = endCancelled(app.id);
+    if (app.person == App::Person::uninstalls) isNews = uninstall(app.id);
+    bool stops = isNews && !hasSetting("device-service-cancel", "no");
     if (!stops) {
       progress(app);
       if (app.transfer == App::Transfer::stalls) return;
     }
     _plan.enter("assetTransferSucceeded");
     _outstanding.erase(app.id);
+    bool cancelled = _world.cancelled.erase(app.id) != 0;
     if (!stops && app.transfer == App::Transfer::arrives) {
       arrive(app);
     } else {
-      bool installed = !fails("applicationIsInstalled", app.id) && _known[app.id].installed;
+      bool installed = !fails("applicationIsInstalled", app.id) && _world.apps[app.id].installed;
       bool told = installed && !app.isRestore && !cancelled && hasCoordinator(app.id);
       if (told)
         cancel("coordinator", app.id, fails("RVCreateUserPresentableError") ? "none" : "RVUserPresentableError 1");
     }
-    _updating.erase(app.id);
+    _world.updating.erase(app.id);
   }
 
   void arrive(const App& app) {
@@ -335,11 +362,16 @@ class SyncModel {
   void settleInstalls() {
     _plan.enter("coordinatorDidCompleteSuccessfully");
     for (const auto& [id, succeeds] : _installs) {
-      auto& app = _known[id];
-      if (succeeds) app.installed = true;
-      if (succeeds) app.placeholder = false;
-      endCoordinator(id);
-      if (_unheard.count(id) || fails("bundleID", id)) continue;
+      auto& app = _world.apps[id];
+      bool heard = _world.hears(id);
+      if (succeeds) {
+        app.installed = true;
+        app.placeholder = false;
+        app.facts.installType = 4;
+        _world.uninstalled.erase(id);
+      }
+      _world.endCoordinator(id);
+      if (!heard || fails("bundleID", id)) continue;
       bool seemsFine = fails("error", id) || succeeds;
       mark(id, seemsFine ? "INSTALLED" : "FAILED");
     }
@@ -350,45 +382,50 @@ class SyncModel {
     if (app.report == App::Report::succeeded) mark(app.id, "INSTALLED");
     if (app.report != App::Report::failed || app.isRestore) return;
     mark(app.id, "FAILED");
-    if (!fails("uninstallAppWithBundleID", app.id)) remove(app.id);
+    if (!fails("uninstallAppWithBundleID", app.id)) uninstall(app.id);
   }
 
-  void cancelOutstanding() {
+  void endPhase(bool succeeded) {
+    std::vector<std::string> cancelled;
     for (const auto& id : _outstanding) {
-      if (fails("coordinatorForAppWithBundleID", id)) continue;
-      auto known = _known.find(id);
-      if (known != _known.end() && !known->second.coordinator.empty()) cancel("coordinator", id, "TSError 30");
+      if (fails("coordinatorForAppWithBundleID", id) || succeeded) continue;
+      auto known = _world.apps.find(id);
+      if (known != _world.apps.end() && !known->second.coordinator.empty()) cancelled.push_back(id);
     }
+    if (!_outstanding.empty()) {
+      _world.updating.clear();
+      _world.cancelled.clear();
+    }
+    // Heard of after the plug-in has forgotten whom the person cancelled.
+    for (const auto& id : cancelled) cancel("coordinator", id, "TSError 30");
+  }
+
+  void endSync() {
+    if (!_world.lookedUp || fails("CorvaneClearUninstalled")) return;
+    for (const auto& id : *_world.lookedUp) _world.uninstalled.erase(id);
+    _world.lookedUp.reset();
   }
 
   void finish() {
-    for (const auto& [id, app] : _known) {
-      if (app.ownCoordinator && !app.coordinator.empty()) _outcome.open.push_back(id + ' ' + app.coordinator);
-      if (app.installed) _outcome.present[id] = app.coordinator.empty() || !app.attached ? "installed" : "updating";
-      if (!app.installed && app.placeholder) _outcome.present[id] = "placeholder";
+    _outcome.open = open();
+    for (const auto& [id, app] : _world.apps) {
+      if (auto state = app.state(); !state.empty()) _outcome.present[id] = state;
     }
     std::sort(_outcome.cancelled.begin(), _outcome.cancelled.end());
-    if (_hasList) _outcome.marks = _marks;
+    if (_world.hasList) _outcome.marks = _world.marks;
   }
 
   const Scenario& _scenario;
-  FailurePlan _plan;
   Outcome _outcome;
-  std::map<std::string, Known> _known;
-  std::map<std::string, std::string> _marks;
-  bool _hasList = false;
-  std::vector<std::string> _layout;
-  std::vector<std::string> _shown;
   std::set<std::string> _stagedFolder;  // candidates whose files are the host's
-  std::set<std::string> _unheard;
-  std::set<std::string> _updating;
   std::set<std::string> _outstanding;
   std::vector<std::pair<std::string, bool>> _installs;  // and whether it will succeed
 };
 
-class RestoreModel {
+class RestoreModel : DeviceModel {
  public:
-  explicit RestoreModel(const RestoreScenario& scenario) : _scenario(scenario), _plan(scenario.failures) {}
+  RestoreModel(const RestoreScenario& scenario, World& world)
+      : DeviceModel(world, scenario.failures), _scenario(scenario) {}
 
   RestoreOutcome run() {
     bool unmanaged = _plan.next("makeBackupManager", "");
@@ -407,17 +444,17 @@ class RestoreModel {
       _outcome.filedAway = !_plan.next("moveItem", "", restoreLogPath);
     }
     std::sort(_outcome.cancelled.begin(), _outcome.cancelled.end());
-    std::sort(_outcome.open.begin(), _outcome.open.end());
+    _outcome.open = open();
+    for (const auto& [id, app] : _world.apps) {
+      if (auto state = app.state(); !state.empty())
+        _outcome.present[id] = state + ' ' + std::to_string(app.facts.installType);
+    }
     return _outcome;
   }
 
  private:
   bool hasSetting(const std::string& key, const std::string& value) const {
     return std::count(_scenario.settings.begin(), _scenario.settings.end(), std::pair(key, value)) != 0;
-  }
-
-  bool fails(const std::string& operation, const std::string& app = {}, const std::string& path = {}) {
-    return _plan.next(operation, app, path);
   }
 
   void processList() {
@@ -433,12 +470,13 @@ class RestoreModel {
       restore(app, status);
     }
     _plan.enter("coordinatorDidInstallPlaceholder");
-    std::int64_t awaited = static_cast<std::int64_t>(_awaited.size());
+    auto awaited = static_cast<std::int64_t>(_world.awaited.size());
     for (const auto& app : _scenario.apps) {
-      bool told = !app.neverReported && !fails("bundleID", app.id);
-      if (told && !_untold.count(app.id) && _scenario.process != "com.vantor.tsd") _awaited.erase(app.id);
+      bool told = _told.count(app.id) && !app.neverReported && !fails("bundleID", app.id);
+      if (told && !_world.finishedWaiting) _world.awaited.erase(app.id);
     }
-    _outcome.waited = _awaited.empty() ? 0 : 5 * awaited;
+    _world.finishedWaiting = true;
+    _outcome.waited = _world.awaited.empty() ? 0 : 5 * awaited;
   }
 
   void cancel(const std::string& object, const RestoreApp& app) {
@@ -446,23 +484,35 @@ class RestoreModel {
   }
 
   void restore(const RestoreApp& app, int status) {
-    // Parsed from bytes: the file read last is the list of demoted apps.
-    if (fails("propertyListWithData", {}, demotedAppsPath) || app.entry != RestoreApp::Entry::good) return;
-    if (fails("coordinatorForAppWithBundleID", app.id)) return;
-    if (fails("setObserver", app.id)) _untold.insert(app.id);
-    bool made = true;
-    bool attached = false;
-    if (!fails("makePromisedOutOfBandTransfer", app.id) && fails("setUserDataPromise", app.id))
-      return cancel("coordinator", app);
-    made = buildPlaceholder(app);
-    if (made) attached = !fails("setPlaceholderPromise", app.id);
-    if (made && !attached) cancel("placeholder", app);
-    if (!attached || (status == 0 && fails("setAppAssetPromiseResponsibleClient", app.id))) {
-      return cancel("coordinator", app);
+    if (prepare(app, status)) return;
+    // What was set up for it goes, and it is awaited no more, should an earlier restore have begun to.
+    if (_acquired) {
+      cancel("coordinator", app);
+      endCancelled(app.id);
     }
-    _awaited.insert(app.id);
-    _outcome.present[app.id] = status == 0 ? "placeholder 2" : status == 1 ? "placeholder 8" : "placeholder 7";
-    if (status == 0) _outcome.open.push_back(app.id + " restoring");
+    _world.awaited.erase(app.id);
+  }
+
+  bool prepare(const RestoreApp& app, int status) {
+    _acquired = false;
+    // Parsed from bytes: the file read last is the list of demoted apps.
+    if (fails("propertyListWithData", {}, demotedAppsPath) || app.entry != RestoreApp::Entry::good) return false;
+    if (fails("coordinatorForAppWithBundleID", app.id)) return false;
+    auto& known = _world.apps[app.id];
+    if (status == 0 && known.own && known.coordinator == "restoring") return true;  // the store's already
+    if (!known.coordinator.empty()) return false;
+    _acquired = known.own = true;
+    known.coordinator = "restoring";
+    known.observed = !fails("setObserver", app.id);
+    if (!fails("makePromisedOutOfBandTransfer", app.id) && fails("setUserDataPromise", app.id)) return false;
+    if (!buildPlaceholder(app)) return false;
+    if (fails("setPlaceholderPromise", app.id)) return cancel("placeholder", app), false;
+    _world.attach(app.id, status == 0 ? 2 : status == 1 ? 8 : 7, status == 0);
+    _world.awaited.insert(app.id);
+    if (_world.hears(app.id)) _told.insert(app.id);
+    if (status == 0) return !fails("setAppAssetPromiseResponsibleClient", app.id);
+    known.leaveCoordinator();
+    return true;
   }
 
   bool buildPlaceholder(const RestoreApp& app) {
@@ -485,15 +535,86 @@ class RestoreModel {
   }
 
   const RestoreScenario& _scenario;
-  FailurePlan _plan;
   RestoreOutcome _outcome;
-  std::set<std::string> _awaited;
-  std::set<std::string> _untold;  // nobody observes their coordinators
+  bool _acquired = false;       // by the app that is being prepared
+  std::set<std::string> _told;  // whose placeholder the plug-in will hear of
 };
 
 }  // namespace
 
-Outcome predict(const Scenario& scenario) { return SyncModel(scenario).run(); }
-RestoreOutcome predict(const RestoreScenario& scenario) { return RestoreModel(scenario).run(); }
+void World::startAnew() {
+  updating.clear();
+  cancelled.clear();
+  awaited.clear();
+  lookedUp.reset();
+  finishedWaiting = process == "com.vantor.tsd";
+  for (auto& [id, app] : apps) app.observed = false;
+}
+
+void World::clearSyncData() {
+  hasList = false;
+  marks.clear();
+  std::vector<std::string> placeholders;
+  for (const auto& [id, app] : apps) {
+    if (app.placeholder) placeholders.push_back(id);
+  }
+  for (const auto& id : placeholders) {
+    if (hears(id)) cancelled.insert(id);
+    if (hears(id)) awaited.erase(id);
+    remove(id);
+  }
+  uninstalled.clear();
+}
+
+bool World::hears(const std::string& id) const {
+  auto app = apps.find(id);
+  if (app == apps.end() || !app->second.own || app->second.coordinator.empty()) return false;
+  return app->second.observed || process == "com.vantor.tsd";
+}
+
+void World::show(const std::string& id) {
+  if (std::find(shown.begin(), shown.end(), id) == shown.end()) shown.push_back(id);
+}
+
+void World::attach(const std::string& id, std::uint64_t type, bool hasProgress) {
+  auto& app = apps[id];
+  app.attached = true;
+  app.facts.installState = 1;
+  app.facts.installPhase = 0;
+  app.facts.paused = false;
+  app.facts.hasProgress = hasProgress;
+  if (app.installed) return;
+  app.placeholder = true;
+  app.facts.installType = type;
+  show(id);
+}
+
+void World::remove(const std::string& id) {
+  // The home screen keeps the place of an app that has never been there.
+  if (!apps[id].state().empty()) layout.erase(std::remove(layout.begin(), layout.end(), id), layout.end());
+  apps.erase(id);
+  shown.erase(std::remove(shown.begin(), shown.end(), id), shown.end());
+}
+
+void World::endCoordinator(const std::string& id) {
+  auto& app = apps[id];
+  bool shows = app.installed || (app.placeholder && !app.attached);
+  if (!shows) return remove(id);
+  if (app.attached) app.facts.hasProgress = false;
+  app.leaveCoordinator();
+}
+
+void World::App::leaveCoordinator() {
+  coordinator.clear();
+  own = observed = options = initialPromises = asset = attached = false;
+}
+
+std::string World::App::state() const {
+  if (installed) return facts.hasProgress ? "updating" : "installed";
+  return placeholder ? "placeholder" : "";
+}
+
+Outcome predict(const Scenario& scenario, World& world) { return SyncModel(scenario, world).run(); }
+RestoreOutcome predict(const RestoreScenario& scenario, World& world) { return RestoreModel(scenario, world).run(); }
 
 }  // namespace tests

@@ -55,6 +55,7 @@ void writeRestoreLists(PluginRig& rig, const RestoreScenario& scenario) {
   Value demoted = Value::makeDictionary();
   if (!automatic.empty()) demoted.dictionary()->set("AutomaticDowngrades", arrayOf(automatic));
   if (!intentional.empty()) demoted.dictionary()->set("IntentionalDowngrades", arrayOf(intentional));
+  for (const char* earlier : {restoreListPath, restoreLogPath}) rig.device().files().removeItem(earlier);
   if (scenario.hasList) rig.write(restoreListPath, scenario.rawList ? *scenario.rawList : binaryList(list));
   rig.write(demotedAppsPath, scenario.rawDemotedList ? *scenario.rawDemotedList : plist::writeXML(demoted).value());
   rig.device().files().createDirectory("/var/mobile/Library/Logs/MediaServices", true, {});
@@ -69,7 +70,7 @@ RestoreOutcome run(PluginRig& rig, const RestoreScenario& scenario) {
   RestoreOutcome outcome;
   ErrorRef error = platform::makeError("Test", 1, "an error from before the call");
   auto begin = rig.platform().clock.now();
-  EXPECT_TRUE(rig.daemon().reconcileRestoreOfType(scenario.type, &error));
+  outcome.accepted = rig.daemon().reconcileRestoreOfType(scenario.type, &error);
   outcome.waited = std::chrono::duration_cast<std::chrono::seconds>(rig.platform().clock.now() - begin).count();
   rig.deliver();
   outcome.cancelled = cancellationsIn(rig.records());
@@ -89,6 +90,7 @@ std::string RestoreOutcome::text() const {
   for (const auto& each : open) text += "open [" + each + "]; ";
   for (const auto& [app, state] : present) text += app + " is " + state + "; ";
   text += "waited " + std::to_string(waited) + "; ";
+  if (!accepted) text += "not accepted; ";
   if (filedAway) text += "filed away; ";
   if (!error.empty()) text += "error " + error + "; ";
   return text;

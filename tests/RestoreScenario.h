@@ -42,6 +42,7 @@ struct RestoreScenario {
 };
 
 struct RestoreOutcome {
+  bool accepted = true;
   std::vector<std::string> cancelled{};        // as of a sync
   std::vector<std::string> open{};             // as of a sync
   std::map<std::string, std::string> present;  // by identifier: "placeholder 2", the number being the install type

@@ -36,10 +36,13 @@ class SyncPlayer {
 
   Outcome play() {
     for (const auto& [key, value] : _scenario.settings) EXPECT_TRUE(_rig.device().set(key, value));
-    for (const auto& app : _scenario.apps) prepare(app);
+    for (const auto& app : _scenario.apps) {
+      if (!_scenario.continues) prepare(app);
+    }
     _rig.write(lastSyncPath, binaryList(lastSync()));
     _rig.write(restoreStatePath, binaryList(restoreState()));
-    if (hasPreviousList()) _rig.write(todoListPath, binaryList(todoList(&ScenarioApp::previousMark)));
+    if (!_scenario.continues && hasPreviousList())
+      _rig.write(todoListPath, binaryList(todoList(&ScenarioApp::previousMark)));
     _rig.postStartup();
 
     Outcome outcome;
@@ -131,6 +134,7 @@ class SyncPlayer {
 
   static std::vector<std::string> deletedBy(const Value& assets) {
     std::vector<std::string> identifiers;
+    if (!assets.dictionary()) return identifiers;
     const Value& list = (*assets.dictionary())["_Deleted"];
     for (const Value& entry : *list.array()) {
       identifiers.emplace_back(*(*entry.dictionary())["KBBundleIdentifier"].string());
@@ -143,9 +147,7 @@ class SyncPlayer {
     auto assets = _rig.daemon().outstandingAssetTransfers();
     for (const auto& asset : assets) outcome.requested.push_back(asset->identifier());
     _rig.deliver();
-    for (const auto& asset : assets) {
-      if (const App* app = appOf(asset->identifier())) transfer(*app, asset);
-    }
+    transferInAnyOrder(assets);
     _rig.deliver();
     for (const auto& asset : assets) {
       if (const App* app = appOf(asset->identifier())) report(*app, asset);
@@ -160,13 +162,40 @@ class SyncPlayer {
     return nullptr;
   }
 
-  void transfer(const App& app, const TSAssetRef& asset) {
-    asset->setIsDownload(app.isDownload);
-    asset->setIsRestore(app.isRestore);
-    asset->setCompletedAssetParts(app.parts);
-    if (app.transfer == App::Transfer::neverStarts) return;
+  std::size_t choose(std::size_t count) { return _scenario.chooser ? _scenario.chooser(count) : 0; }
+
+  /// All are in flight, and something else may be delivered in between.
+  void transferInAnyOrder(const std::vector<TSAssetRef>& assets) {
+    std::vector<std::pair<TSAssetRef, bool>> inFlight;  // and whether it has begun
+    for (const auto& asset : assets) {
+      inFlight.emplace_back(asset, false);
+      const App* app = appOf(asset->identifier());
+      if (!app) continue;
+      asset->setIsDownload(app->isDownload);
+      asset->setIsRestore(app->isRestore);
+      asset->setCompletedAssetParts(app->parts);
+    }
+    while (!inFlight.empty()) {
+      std::size_t chosen = choose(inFlight.size());
+      auto& [asset, hasBegun] = inFlight[chosen];
+      const App* app = appOf(asset->identifier());
+      if (app && !hasBegun && app->transfer != App::Transfer::neverStarts) {
+        beginTransfer(*app, asset);
+        hasBegun = true;
+      } else {
+        if (app && hasBegun) endTransfer(*app, asset);
+        inFlight.erase(inFlight.begin() + static_cast<std::ptrdiff_t>(chosen));
+      }
+      if (choose(3) == 1) _rig.events().deliverNext();
+    }
+  }
+
+  void beginTransfer(const App& app, const TSAssetRef& asset) {
     _rig.progress(asset, 0.25);
     act(app);
+  }
+
+  void endTransfer(const App& app, const TSAssetRef& asset) {
     if (_rig.transfers().wasCancelled(app.id)) {
       _rig.transferEnded(asset, false, platform::makeError("Daemon", 7, "cancelled"));
       return;
@@ -179,15 +208,15 @@ class SyncPlayer {
   }
 
   void act(const App& app) {
-    ErrorRef error;
-    if (app.person == App::Person::cancels) _rig.device().cancelByPerson(app.id, &error);
-    if (app.person == App::Person::prioritizes) _rig.device().prioritizeByPerson(app.id, &error);
-    if (app.person == App::Person::uninstalls) _rig.device().uninstallByPerson(app.id, &error);
-    EXPECT_FALSE(error) << error->describe();
+    // Somebody else may have been there before.
+    if (app.person == App::Person::cancels) _rig.device().cancelByPerson(app.id);
+    if (app.person == App::Person::prioritizes) _rig.device().prioritizeByPerson(app.id);
+    if (app.person == App::Person::uninstalls) _rig.device().uninstallByPerson(app.id);
     if (app.person != App::Person::nothing) _rig.deliver();
   }
 
   void receive(const App& app, platform::TSAsset& asset) {
+    _rig.device().files().removeItem(packagePath(app));
     if (app.package != App::Package::missing) _rig.receivePackage(app.id, packageOfApp(app));
     if (app.path == App::Path::absolute) asset.setPath(packagePath(app));
     if (app.path == App::Path::relative) asset.setPath("Packages/" + app.id + ".pkg");
@@ -249,19 +278,22 @@ std::string Outcome::text() const {
          items("open", open, quoted) + items("present", present, pair);
 }
 
+std::string cancellationOf(const CallRecord& record) {
+  const auto& arguments = *record.arguments.dictionary();
+  const auto* reason = arguments["reason"].dictionary();
+  std::string what = record.service == "RVPlaceholder"             ? "placeholder"
+                     : record.service == "RVAppInstallCoordinator" ? "coordinator"
+                                                                   : "promise";
+  std::string text = what + ' ' + record.app + ' ';
+  text += reason ? platform::describe((*reason)["domain"]) + ' ' + platform::describe((*reason)["code"]) : "none";
+  if (arguments["client"].integer() != 3) text += " by client " + platform::describe(arguments["client"]);
+  return text;
+}
+
 std::vector<std::string> cancellationsIn(const std::vector<CallRecord>& records) {
   std::vector<std::string> cancellations;
   for (const auto& record : records) {
-    if (record.operation != "cancelForReason") continue;
-    const auto& arguments = *record.arguments.dictionary();
-    const auto* reason = arguments["reason"].dictionary();
-    std::string what = record.service == "RVPlaceholder"             ? "placeholder"
-                       : record.service == "RVAppInstallCoordinator" ? "coordinator"
-                                                                     : "promise";
-    std::string text = what + ' ' + record.app + ' ';
-    text += reason ? platform::describe((*reason)["domain"]) + ' ' + platform::describe((*reason)["code"]) : "none";
-    if (arguments["client"].integer() != 3) text += " by client " + platform::describe(arguments["client"]);
-    cancellations.push_back(std::move(text));
+    if (record.operation == "cancelForReason") cancellations.push_back(cancellationOf(record));
   }
   std::sort(cancellations.begin(), cancellations.end());
   return cancellations;

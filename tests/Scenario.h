@@ -67,6 +67,8 @@ struct ScenarioApp {
 /// One sync on a device of its own.
 struct Scenario {
   std::string name{};
+  /// The device is as the sync or restore before left it: what it had before that one is not laid out again.
+  bool continues = false;
   std::vector<ScenarioApp> apps{};
   std::vector<std::string> layout{};  // the host's icon layout; empty: it sends none
   bool stages = true;                 // the host pushes files
@@ -98,6 +100,8 @@ struct Outcome {
 Outcome run(PluginRig& rig, const Scenario& scenario);
 PluginRig::Options optionsOf(const Scenario& scenario);
 
+/// "coordinator app domain code", with " by client N" behind it when it is not by client 3.
+std::string cancellationOf(const device::CallRecord& record);
 /// The cancellations that the plug-in asked for, sorted.
 std::vector<std::string> cancellationsIn(const std::vector<device::CallRecord>& records);
 std::vector<std::string> openCoordinators(const device::DeviceStatus& status);
