@@ -87,6 +87,7 @@ class PluginRig {
   PluginRig& operator=(const PluginRig&) = delete;
 
   device::LocalDevice& device() { return *_device; }
+  SharedParts& parts() { return _parts; }
   const platform::Platform& platform() { return _device->platform(); }
   device::ManualEventQueue& events() { return *_manualEvents; }
   DaemonTransfers& transfers() { return _transfers; }

@@ -36,12 +36,16 @@ class SharedStore final : public device::Store {
 
 class SharedTree final : public device::FileTree {
  public:
-  explicit SharedTree(device::FileTree& tree) : _tree(tree) {}
-  bool removeItem(std::string_view path, ErrorRef* error) override { return _tree.removeItem(path, error); }
+  explicit SharedTree(const SharedParts& parts) : _parts(parts), _tree(*parts.files) {}
+  bool removeItem(std::string_view path, ErrorRef* error) override {
+    tell("removeItem", path);
+    return _tree.removeItem(path, error);
+  }
   bool createDirectory(std::string_view path, bool intermediates, const Value& attributes, ErrorRef* error) override {
     return _tree.createDirectory(path, intermediates, attributes, error);
   }
   bool moveItem(std::string_view from, std::string_view to, ErrorRef* error) override {
+    tell("moveItem", to);
     return _tree.moveItem(from, to, error);
   }
   bool copyItem(std::string_view from, std::string_view to, ErrorRef* error) override {
@@ -54,8 +58,13 @@ class SharedTree final : public device::FileTree {
   bool createFile(std::string_view path, platform::BytesView contents, const Value& attributes) override {
     return _tree.createFile(path, contents, attributes);
   }
-  std::optional<Bytes> readFile(std::string_view path, ErrorRef* error) override { return _tree.readFile(path, error); }
+  std::optional<Bytes> readFile(std::string_view path, ErrorRef* error) override {
+    auto bytes = _tree.readFile(path, error);
+    if (bytes) tell("readFile", path);
+    return bytes;
+  }
   bool writeAtomically(std::string_view path, platform::BytesView contents, ErrorRef* error) override {
+    tell("writeAtomically", path);
     return _tree.writeAtomically(path, contents, error);
   }
   int utimes(std::string_view path, int& number) override { return _tree.utimes(path, number); }
@@ -71,6 +80,11 @@ class SharedTree final : public device::FileTree {
   bool syncDirectory(std::string_view path, ErrorRef* error) override { return _tree.syncDirectory(path, error); }
 
  private:
+  void tell(std::string_view operation, std::string_view path) const {
+    if (_parts.watch) _parts.watch(operation, path);
+  }
+
+  const SharedParts& _parts;
   device::FileTree& _tree;
 };
 
@@ -82,7 +96,7 @@ void SharedParts::makeInMemory() {
   EXPECT_TRUE(device::makeDeviceParts(*files, *store));
 }
 
-std::unique_ptr<device::FileTree> SharedParts::lendFiles() { return std::make_unique<SharedTree>(*files); }
+std::unique_ptr<device::FileTree> SharedParts::lendFiles() { return std::make_unique<SharedTree>(*this); }
 std::unique_ptr<device::Store> SharedParts::lendStore() { return std::make_unique<SharedStore>(*store, broken); }
 
 }  // namespace tests

@@ -1,6 +1,8 @@
 #pragma once
 
+#include <functional>
 #include <memory>
+#include <string_view>
 
 #include "device/FileTree.h"
 #include "device/Store.h"
@@ -12,6 +14,9 @@ struct SharedParts {
   std::unique_ptr<device::FileTree> files{};
   std::unique_ptr<device::Store> store{};
   bool broken = false;  // the store takes nothing more
+  /// Told of a file operation and its path: after a reading that succeeded, before a removal, a move and a writing.
+  /// From any thread. May be null; set while no thread is at work.
+  std::function<void(std::string_view operation, std::string_view path)> watch{};
 
   /// Those of an empty device.
   void makeInMemory();
