@@ -199,7 +199,8 @@ class Syncs(Folder):
         return {app["id"]: app["outcome"] for app in report["apps"]}
 
     def test_what_is_reported_of_an_asset(self):
-        # (options, outcome, todo mark, state afterwards or None, exit code), of the first app of two
+        # (options, outcome, todo mark, state afterwards or None, exit code), of the first app of two. The rest of a
+        # package that is cancelled may be there before the transfer hears of it.
         table = [
             ([], "INSTALLED", "INSTALLED", "installed", DONE),
             (["--asset", "APP:path=relative"], "INSTALLED", "INSTALLED", "installed", DONE),
@@ -211,7 +212,7 @@ class Syncs(Folder):
             (["--asset", "APP:stall"], "CANCELLED", "install", None, SOME_FAILED),
             (["--asset", "APP:stall", "--end-phase", "success"], "PENDING", "install", "placeholder", SOME_FAILED),
             (["--inject", "transfer:APP@2=fail"], "FAILED", "install", "placeholder", SOME_FAILED),
-            (["--inject", "transfer:APP@2=cancel=APP"], "CANCELLED", "install", None, SOME_FAILED),
+            (["--inject", "transfer:APP@2=cancel=APP"], "CANCELLED", "install|DOWNLOADED", None, SOME_FAILED),
             (["--inject", "setAppAssetPromise:APP=fail"], "FAILED", "FAILED", None, SOME_FAILED),
             (["--inject", "coordinatorDidCompleteSuccessfully:APP=none"], "PENDING", "DOWNLOADED", "installed",
              SOME_FAILED),
@@ -225,7 +226,8 @@ class Syncs(Folder):
                 self.tsd("init", device)
                 report = self.sync(device, "host", *[each.replace("APP", apps[0]) for each in options], code=code)
                 self.assertEqual(self.outcomes(report), {apps[0]: outcome, apps[1]: "INSTALLED"})
-                self.assertEqual(report["todo"][0], {"identifier": apps[0], "operation": mark})
+                self.assertEqual(report["todo"][0]["identifier"], apps[0])
+                self.assertIn(report["todo"][0]["operation"], mark.split("|"))
                 states = {app["id"]: app["state"] for app in self.document("status", device)["apps"]}
                 self.assertEqual(states.get(apps[0]), state)
 
