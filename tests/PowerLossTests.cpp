@@ -9,10 +9,10 @@
 #include <random>
 #include <stdexcept>
 
+#include "device/PowerLog.h"
 #include "platform/OBApplicationWorkspace.h"
 #include "plist/PropertyList.h"
 #include "tests/PluginRig.h"
-#include "tests/PowerLog.h"
 #include "tsd/FileConduit.h"
 
 namespace tests {
@@ -208,7 +208,7 @@ class PowerLoss : public testing::Test {
     }
   }
 
-  void lose(std::size_t count, PowerLog::Rest rest, std::uint64_t seed, Play again) {
+  void lose(std::size_t count, device::PowerLog::Rest rest, std::uint64_t seed, Play again) {
     std::mt19937_64 numbers(seed);
     auto dice = [&numbers](std::size_t below) { return static_cast<std::size_t>(numbers() % below); };
     auto files = _log->filesAfter(count, rest, dice);
@@ -224,7 +224,7 @@ class PowerLoss : public testing::Test {
 
   /// Every seventeenth step, or all of them when the environment says so.
   void loseEverywhere(Play play) {
-    using Rest = PowerLog::Rest;
+    using Rest = device::PowerLog::Rest;
     record(play);
     if (HasFatalFailure()) return;
     const char* chosen = std::getenv("APPSYNC_POWER_LOSS");
@@ -250,7 +250,7 @@ class PowerLoss : public testing::Test {
 
   std::string _folder;
   tsd::Console _console;
-  const std::shared_ptr<PowerLog> _log = std::make_shared<PowerLog>();
+  const std::shared_ptr<device::PowerLog> _log = std::make_shared<device::PowerLog>();
   PluginRig* _rig = nullptr;
   std::size_t _begin = 0, _reconciles = 0, _reconciled = 0;
   std::vector<List> _lists;

@@ -11,11 +11,12 @@
 #include "device/StepWatch.h"
 #include "device/Store.h"
 
-namespace tests {
+namespace device {
 
-/// Every step of a device's life, and what a loss of power after any of them may leave: what was synced, and of the
-/// rest whatever the disk happened to write, in whatever order. Only a move is whole or not at all.
-class PowerLog final : public device::StepWatch {
+/// Writes down every step of a file tree on disk and of a store, and makes in memory what a loss of power after any of
+/// them may leave: what was synced, and of the rest whatever the disk happened to write, in whatever order. Only a move
+/// is whole or not at all. By one thread at a time; keeps all that was written.
+class PowerLog final : public StepWatch {
  public:
   /// Of what was not synced.
   enum class Rest {
@@ -26,27 +27,27 @@ class PowerLog final : public device::StepWatch {
   };
   using Dice = std::function<std::size_t(std::size_t below)>;
 
-  int before(device::Step&) override { return 0; }
-  int after(const device::Step& step) override;
+  int before(Step&) override { return 0; }
+  int after(const Step& step) override;
   /// A store in memory whose changes are steps of this log.
-  std::unique_ptr<device::Store> makeStore();
+  std::unique_ptr<Store> makeStore();
 
   std::size_t size() const { return _steps.size(); }
   /// The two halves of a device after a loss of power that the first `count` steps came before.
-  std::unique_ptr<device::FileTree> filesAfter(std::size_t count, Rest rest, const Dice& dice) const;
-  std::unique_ptr<device::Store> storeAfter(std::size_t count, Rest rest, const Dice& dice) const;
+  std::unique_ptr<FileTree> filesAfter(std::size_t count, Rest rest, const Dice& dice) const;
+  std::unique_ptr<Store> storeAfter(std::size_t count, Rest rest, const Dice& dice) const;
   std::string describe(std::size_t step) const;
 
  private:
   class LoggedStore;
   struct Logged {
-    device::Step::Kind kind;
+    Step::Kind kind;
     std::string path, target;
     platform::Bytes bytes;
-    std::vector<device::StoreRecord> changes;
+    std::vector<StoreRecord> changes;
   };
 
   std::vector<Logged> _steps;
 };
 
-}  // namespace tests
+}  // namespace device

@@ -1,11 +1,10 @@
-#include "tests/PowerLog.h"
+#include "device/PowerLog.h"
 
 #include <set>
 #include <utility>
 
-namespace tests {
+namespace device {
 
-using device::Step;
 using platform::Bytes;
 
 namespace {
@@ -41,7 +40,7 @@ class Replay {
     }
   }
 
-  std::unique_ptr<device::FileTree> left(PowerLog::Rest rest, const PowerLog::Dice& dice) const {
+  std::unique_ptr<FileTree> left(PowerLog::Rest rest, const PowerLog::Dice& dice) const {
     std::set<Place> needed;  // places whose later change is on the disk, and with it every one before
     std::vector<bool> kept(_changes.size());
     for (std::size_t i = _changes.size(); i-- > 0;) {
@@ -56,7 +55,7 @@ class Replay {
       if (!kept[i]) continue;
       for (const auto& entry : _changes[i].entries) directories[entry.place.first][entry.place.second] = entry.node;
     }
-    auto files = device::makeMemoryFileTree();
+    auto files = makeMemoryFileTree();
     build(*files, "", 0, directories, rest, dice);
     return files;
   }
@@ -127,7 +126,7 @@ class Replay {
     return content;
   }
 
-  void build(device::FileTree& files, const std::string& path, int directory,
+  void build(FileTree& files, const std::string& path, int directory,
              const std::map<int, std::map<std::string, int>>& directories, PowerLog::Rest rest,
              const PowerLog::Dice& dice) const {
     auto found = directories.find(directory);
@@ -151,22 +150,22 @@ class Replay {
 
 }  // namespace
 
-class PowerLog::LoggedStore final : public device::Store {
+class PowerLog::LoggedStore final : public Store {
  public:
   explicit LoggedStore(PowerLog& log) : _log(log) {}
-  std::vector<device::StoreRecord> load() override { return _store->load(); }
-  bool commit(const std::vector<device::StoreRecord>& changes, platform::ErrorRef* error) override {
+  std::vector<StoreRecord> load() override { return _store->load(); }
+  bool commit(const std::vector<StoreRecord>& changes, platform::ErrorRef* error) override {
     _log._steps.push_back({Step::Kind::storeCommit, {}, {}, {}, changes});
     return _store->commit(changes, error);
   }
-  bool write(const std::vector<device::StoreRecord>& changes, platform::ErrorRef* error) override {
+  bool write(const std::vector<StoreRecord>& changes, platform::ErrorRef* error) override {
     _log._steps.push_back({Step::Kind::storeWrite, {}, {}, {}, changes});
     return _store->commit(changes, error);
   }
 
  private:
   PowerLog& _log;
-  const std::unique_ptr<device::Store> _store = device::makeMemoryStore();
+  const std::unique_ptr<Store> _store = makeMemoryStore();
 };
 
 int PowerLog::after(const Step& step) {
@@ -174,9 +173,9 @@ int PowerLog::after(const Step& step) {
   return 0;
 }
 
-std::unique_ptr<device::Store> PowerLog::makeStore() { return std::make_unique<LoggedStore>(*this); }
+std::unique_ptr<Store> PowerLog::makeStore() { return std::make_unique<LoggedStore>(*this); }
 
-std::unique_ptr<device::FileTree> PowerLog::filesAfter(std::size_t count, Rest rest, const Dice& dice) const {
+std::unique_ptr<FileTree> PowerLog::filesAfter(std::size_t count, Rest rest, const Dice& dice) const {
   Replay replay;
   for (std::size_t i = 0; i < count; ++i) {
     replay.take(_steps[i].kind, _steps[i].path, _steps[i].target, _steps[i].bytes);
@@ -184,10 +183,10 @@ std::unique_ptr<device::FileTree> PowerLog::filesAfter(std::size_t count, Rest r
   return replay.left(rest, dice);
 }
 
-std::unique_ptr<device::Store> PowerLog::storeAfter(std::size_t count, Rest rest, const Dice& dice) const {
+std::unique_ptr<Store> PowerLog::storeAfter(std::size_t count, Rest rest, const Dice& dice) const {
   std::size_t durable = count;
   while (durable > 0 && _steps[durable - 1].kind != Step::Kind::storeCommit) --durable;
-  auto store = device::makeMemoryStore();
+  auto store = makeMemoryStore();
   for (std::size_t i = 0; i < count; ++i) {
     // Writes stand in the store's own log one behind the other: each needs all before it.
     if (i >= durable && !_steps[i].changes.empty()) {
@@ -208,4 +207,4 @@ std::string PowerLog::describe(std::size_t step) const {
   return text;
 }
 
-}  // namespace tests
+}  // namespace device
