@@ -225,8 +225,11 @@ bool AppRecords::keep(Keep keep, const ChangeSet& changes, platform::ErrorRef* e
   records.reserve(_later.size() + 2 * changes._steps.size());  // records are costly to move
   records.insert(records.end(), _later.begin(), _later.end());
   for (const auto& step : changes._steps) step.encode(_state, records);
-  platform::setError(error, nullptr);
-  if (!(_store.*keep)(records, error)) return false;
+  platform::ErrorRef reason;
+  const bool kept = (_store.*keep)(records, &reason);
+  platform::setError(error, reason);
+  if (!kept && _refused) _refused(reason);
+  if (!kept) return false;
   _later.clear();
   for (const auto& step : changes._steps) {
     if (step.apply) step.apply(_state);

@@ -121,7 +121,10 @@ class ChangeSet {
 /// The guard is never held while anybody is called back or a package is unpacked.
 class AppRecords {
  public:
-  explicit AppRecords(Store& store) : _store(store) {}
+  /// Told why the store refused a change, as callers may pass over that in silence; under the guard. May be null.
+  using Refused = std::function<void(const platform::ErrorRef& reason)>;
+
+  explicit AppRecords(Store& store, Refused refused = nullptr) : _store(store), _refused(std::move(refused)) {}
   AppRecords(const AppRecords&) = delete;
   AppRecords& operator=(const AppRecords&) = delete;
 
@@ -156,6 +159,7 @@ class AppRecords {
   bool keep(Keep keep, const ChangeSet& changes, platform::ErrorRef* error) REQUIRES(mutex);
 
   Store& _store;
+  const Refused _refused;
   DeviceState _state GUARDED_BY(mutex);
   std::vector<StoreRecord> _later GUARDED_BY(mutex);
 };

@@ -46,14 +46,16 @@ bool isAppIdentifier(std::string_view text) {
 }
 
 InstallEngine::InstallEngine(AppRecords& records, FileTree& files, Boundary& boundary, EventQueue& events,
-                             RegistryReports& registry, CoordinatorReports& coordination)
+                             RegistryReports& registry, CoordinatorReports& coordination,
+                             PlaceholderFailed placeholderFailed)
     : _records(records),
       _files(files),
       _boundary(boundary),
       _events(events),
       _registry(registry),
       _coordination(coordination),
-      _containers(files) {}
+      _containers(files),
+      _placeholderFailed(std::move(placeholderFailed)) {}
 
 InstallEngine::~InstallEngine() = default;
 
@@ -184,15 +186,18 @@ std::optional<AppRecord> InstallEngine::writePlaceholder(const PlaceholderRecord
     app.launchProhibited = placeholder.launchProhibited;
     if (auto version = (*info.dictionary())["KBBundleVersion"].string()) app.version = std::string(*version);
   }
-  auto container = _containers.makeFresh(error);
-  if (!container) return std::nullopt;
-  app.container = *container;
-  auto sum = _containers.writePlaceholder(app.container, app.bundle, std::move(info),
-                                          placeholder.configured ? placeholder.iconPath : std::nullopt,
-                                          placeholder.configured ? placeholder.metadata : platform::Value(), error);
-  app.filesSum = sum.value_or(0);
-  if (sum) return app;
-  _containers.remove(app.container);
+  ErrorRef reason;
+  if (auto container = _containers.makeFresh(&reason)) {
+    app.container = *container;
+    auto sum = _containers.writePlaceholder(app.container, app.bundle, std::move(info),
+                                            placeholder.configured ? placeholder.iconPath : std::nullopt,
+                                            placeholder.configured ? placeholder.metadata : platform::Value(), &reason);
+    app.filesSum = sum.value_or(0);
+    if (sum) return app;
+    _containers.remove(app.container);
+  }
+  if (_placeholderFailed) _placeholderFailed(app.id, reason);
+  setError(error, reason);
   return std::nullopt;
 }
 

@@ -36,8 +36,11 @@ struct InstallRequest {
 /// between leaves nothing but files that no record names. Operations from any thread.
 class InstallEngine {
  public:
+  /// Told why an app's placeholder could not be written, as the plug-in passes over that in silence. May be null.
+  using PlaceholderFailed = std::function<void(const std::string& app, const platform::ErrorRef& reason)>;
+
   InstallEngine(AppRecords& records, FileTree& files, Boundary& boundary, EventQueue& events, RegistryReports& registry,
-                CoordinatorReports& coordination);
+                CoordinatorReports& coordination, PlaceholderFailed placeholderFailed);
   ~InstallEngine();
 
   AppRecords& records() { return _records; }
@@ -129,6 +132,7 @@ class InstallEngine {
   RegistryReports& _registry;
   CoordinatorReports& _coordination;
   Containers _containers;
+  const PlaceholderFailed _placeholderFailed;
   std::map<std::string, CoordinatorRef, std::less<>> _open GUARDED_BY(_records.mutex);
   std::uint64_t _nextPromise GUARDED_BY(_records.mutex) = 1;
   bool _tells GUARDED_BY(_records.mutex) = false;  // false while the device is being opened

@@ -90,10 +90,16 @@ class WholeDevice final : public LocalDevice {
         _store(std::move(store)),
         _events(std::move(events)),
         _boundary(&_events->clock()),
-        _records(*_store),
+        _records(*_store,
+                 [failed = options.fileFailed](const ErrorRef& reason) {
+                   if (failed) failed("commit", "device.db", reason ? reason->description() : "no reason given");
+                 }),
         _registryReports(_records, _boundary, *_events, options.changed),
         _coordinatorReports(_boundary, *_events),
-        _engine(_records, *_files, _boundary, *_events, _registryReports, _coordinatorReports),
+        _engine(_records, *_files, _boundary, *_events, _registryReports, _coordinatorReports,
+                [failed = options.fileFailed](const std::string& app, const ErrorRef& reason) {
+                  if (failed) failed("placeholder", app, reason ? reason->description() : "no reason given");
+                }),
         _process(_boundary, *_files, options.mainBundleIdentifier),
         _fileSystem(_boundary, *_files, options.fileFailed),
         _propertyLists(_boundary),
