@@ -325,8 +325,9 @@ static bool checkIsDevice(const std::string& folder, ErrorRef* error) {
 std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_ptr<EventQueue> events,
                                         DeviceOptions options, ErrorRef* error) {
   if (!checkIsDevice(folder, error)) return nullptr;
-  auto files = openDiskFileTree(folder + treeName, error);
-  auto store = files ? openDatabaseStore(folder + databaseName, error) : nullptr;
+  auto steps = InjectedSteps::of(options.rules);
+  auto files = openDiskFileTree(folder + treeName, error, steps);
+  auto store = files ? openDatabaseStore(folder + databaseName, error, steps) : nullptr;
   if (!store) return nullptr;
   return LocalDevice::open(std::move(files), std::move(store), std::move(events), std::move(options), error);
 }

@@ -149,6 +149,7 @@ class Part:
         while high - low > 1:
             middle = (low + high) // 2
             low, high = (middle, high) if self.kill(middle) else (low, middle)
+        require(low > 20, f"a {self.name} of only {low} steps")
         return low
 
     def kill(self, step):
