@@ -2,7 +2,7 @@
 # presets of CMakePresets.json, each in build/<preset>.
 
 .DEFAULT_GOAL := help
-.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate fuzz bench deb format clean packages \
+.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate mutants fuzz bench deb format clean packages \
         check-packages fuzz-packages deb-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
@@ -65,6 +65,9 @@ power-loss: build-all ## power lost after every step of a sync and a restore
 
 simulate: build-all ## random lives of a device against the model: make simulate SEEDS=10000
 	@.ci/simulate build/release $(or $(SEEDS),10000)
+
+mutants: packages ## faults planted in a copy of the sources, each of which the tests have to find
+	@python3 tests/mutants.py build/mutants
 
 fuzz: fuzz-packages ## looks for inputs that break something: make fuzz RUNS=1000000 TARGETS=xml_list
 	@$(call PRESET,fuzz,$(addprefix fuzz_,$(or $(TARGETS),$(notdir $(wildcard fuzz/seeds/*)))))
