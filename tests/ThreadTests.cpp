@@ -145,6 +145,9 @@ class EditWatch {
 
   static void beginEditing() { edits = true; }
   std::size_t disturbed() const { return _disturbed; }
+  void awaitEdit() const {
+    for (int i = 0; i < 10000 && _underWay == 0; ++i) std::this_thread::yield();
+  }
 
  private:
   void see(std::string_view operation, std::string_view path) {
@@ -179,7 +182,9 @@ TEST(Threads, EditsReconciliationAndClearingExcludeOneAnother) {
     }
     for (int i = 0; thread == 4 && i < 200; ++i) {
       stage(rig, apps);
+      if (i % 5 != 0) watch.awaitEdit();  // there is a list
       rig.reconcileSync();
+      if (i % 5 == 4) watch.awaitEdit();
       if (i % 5 == 4) rig.daemon().clearSyncData();
     }
     if (thread == 4) reconciling = false;
