@@ -43,7 +43,8 @@ la_ssize_t PackageSource::read(struct archive* archive, void* data, const void**
   auto& self = *static_cast<PackageSource*>(data);
   std::optional<platform::Bytes> chunk;
   try {
-    chunk = self._reader->read(chunkBytes, &self._error);
+    // No more than there is: what is asked for is set aside, and cleared, each time.
+    chunk = self._reader->read(std::min<std::uint64_t>(chunkBytes, self._size - self._position), &self._error);
   } catch (const std::bad_alloc&) {
     // Nothing may be thrown through libarchive.
   }

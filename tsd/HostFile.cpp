@@ -68,7 +68,8 @@ HostFile::~HostFile() {
 
 std::optional<platform::Bytes> HostFile::read(std::size_t count, platform::ErrorRef* error) {
   platform::setError(error, nullptr);
-  platform::Bytes bytes(count, '\0');
+  // No more than there can be, as all of it is cleared first.
+  platform::Bytes bytes(static_cast<std::size_t>(std::min<std::uint64_t>(count, _size + 1)), '\0');
   ssize_t got;
   do {
     got = ::read(_descriptor, bytes.data(), bytes.size());
