@@ -230,8 +230,7 @@ AppOutcome SyncRun::outcomeOf(const std::string& id, const std::string& mark) co
   using End = TransferQueue::End;
   AppOutcome outcome{id, "", "", "", ""};
   auto app = _parts.session.device().app(id);
-  bool requested =
-      std::any_of(_assets.begin(), _assets.end(), [&](const auto& each) { return each->identifier() == id; });
+  bool requested = _requested.count(id) != 0;
   auto result = _parts.queue.result(id);
   auto be = [&](const char* word, const std::string& reason) {
     outcome.outcome = word;
