@@ -63,10 +63,9 @@ std::optional<std::string> Containers::makeFresh(platform::ErrorRef* error) {
   return std::nullopt;
 }
 
-bool Containers::writeNew(const std::string& path, platform::BytesView content, bool durable,
-                          platform::ErrorRef* error) {
+bool Containers::writeNew(const std::string& path, platform::BytesView content, platform::ErrorRef* error) {
   auto writer = _files.createNew(path, false, error);
-  return writer && writer->write(content, error) && writer->close(durable, error);
+  return writer && writer->write(content, error) && writer->close(false, error);
 }
 
 std::optional<std::uint64_t> Containers::writePlaceholder(const std::string& container, const std::string& bundle,
@@ -78,7 +77,7 @@ std::optional<std::uint64_t> Containers::writePlaceholder(const std::string& con
   FilesSum sum;
   auto write = [&](const std::string& path, const std::optional<platform::Bytes>& content) {
     sum.add(content);
-    return content && writeNew(path, *content, false, error);
+    return content && writeNew(path, *content, error);
   };
   std::optional<platform::Bytes> icon;
   if (iconPath) {
@@ -103,21 +102,21 @@ std::uint64_t Containers::placeholderSum(const std::string& container, const std
   return sum.value();
 }
 
-bool Containers::writeMetadata(const std::string& container, const platform::Value& metadata, bool durable,
+bool Containers::writeMetadata(const std::string& container, const platform::Value& metadata,
                                platform::ErrorRef* error) {
   auto bytes = bytesOfMetadata(metadata, error);
-  return bytes && writeNew(container + '/' + std::string(storeMetadataName), *bytes, durable, error);
+  return bytes && writeNew(container + '/' + std::string(storeMetadataName), *bytes, error);
 }
 
 bool Containers::copyMetadata(const std::string& from, const std::string& to, platform::ErrorRef* error) {
   auto name = '/' + std::string(storeMetadataName);
   if (!_files.fileExists(from + name)) return true;
   auto bytes = _files.readFile(from + name, error);
-  return bytes && writeNew(to + name, *bytes, true, error);
+  return bytes && writeNew(to + name, *bytes, error);
 }
 
 bool Containers::sync(const std::string& container, platform::ErrorRef* error) {
-  return _files.syncDirectory(container, error) && _files.syncDirectory(containersDirectory, error);
+  return _files.syncItem(container, error);
 }
 
 void Containers::remove(const std::string& container) {

@@ -34,11 +34,11 @@ class Containers {
   /// That checksum of the files as they are now; never 0. Another one tells that a loss of power took some of them.
   std::uint64_t placeholderSum(const std::string& container, const std::string& bundle);
   /// A dictionary, written as XML.
-  bool writeMetadata(const std::string& container, const platform::Value& metadata, bool durable,
+  bool writeMetadata(const std::string& container, const platform::Value& metadata,
                      platform::ErrorRef* error = nullptr);
   /// Takes over another container's metadata file; one that has none counts as done.
   bool copyMetadata(const std::string& from, const std::string& to, platform::ErrorRef* error = nullptr);
-  /// Makes the container itself durable, after all that is in it.
+  /// Makes the container durable, with all that is in it.
   bool sync(const std::string& container, platform::ErrorRef* error = nullptr);
 
   /// What cannot be removed now is a leftover.
@@ -46,7 +46,7 @@ class Containers {
   void removeAllBut(const std::set<std::string>& containers);
 
  private:
-  bool writeNew(const std::string& path, platform::BytesView content, bool durable, platform::ErrorRef* error);
+  bool writeNew(const std::string& path, platform::BytesView content, platform::ErrorRef* error);
 
   FileTree& _files;
 };

@@ -6,8 +6,14 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <atomic>
 #include <cerrno>
+#include <functional>
+#include <map>
+#include <mutex>
 #include <new>
+#include <system_error>
+#include <thread>
 
 #include "device/DevicePath.h"
 
@@ -15,6 +21,7 @@ namespace device {
 
 using platform::Bytes;
 using platform::BytesView;
+using platform::Durability;
 using platform::ErrorRef;
 using platform::FileAttributes;
 using platform::Value;
@@ -23,22 +30,38 @@ namespace {
 
 constexpr std::size_t chunkSize = 128 * 1024;
 
-/// -1 for a name that is absent or unknown here, which leaves the owner as it is.
-uid_t userNamed(const Value& name) {
-  char space[4096];
-  passwd entry;
-  passwd* found = nullptr;
+/// The number that the system's `find` knows a name by; -1 for one that is absent or unknown here, which leaves the
+/// owner as it is. Asking the system reads its files every time, so answers are kept: an owner's number stays the same
+/// while a process runs.
+template <class Find>
+std::uint32_t ownerNumber(const Value& name, Find&& find) {
+  static std::mutex mutex;
+  static std::map<std::string, std::uint32_t, std::less<>> known;
   auto text = name.string();
-  if (text) ::getpwnam_r(std::string(*text).c_str(), &entry, space, sizeof space, &found);
-  return found ? found->pw_uid : static_cast<uid_t>(-1);
+  if (!text) return static_cast<std::uint32_t>(-1);
+  std::lock_guard lock(mutex);
+  auto place = known.find(*text);
+  if (place == known.end()) place = known.emplace(*text, find(std::string(*text).c_str())).first;
+  return place->second;
+}
+
+uid_t userNamed(const Value& name) {
+  return ownerNumber(name, [](const char* text) {
+    char space[4096];
+    passwd entry;
+    passwd* found = nullptr;
+    ::getpwnam_r(text, &entry, space, sizeof space, &found);
+    return found ? found->pw_uid : static_cast<uid_t>(-1);
+  });
 }
 gid_t groupNamed(const Value& name) {
-  char space[4096];
-  group entry;
-  group* found = nullptr;
-  auto text = name.string();
-  if (text) ::getgrnam_r(std::string(*text).c_str(), &entry, space, sizeof space, &found);
-  return found ? found->gr_gid : static_cast<gid_t>(-1);
+  return ownerNumber(name, [](const char* text) {
+    char space[4096];
+    group entry;
+    group* found = nullptr;
+    ::getgrnam_r(text, &entry, space, sizeof space, &found);
+    return found ? found->gr_gid : static_cast<gid_t>(-1);
+  });
 }
 
 void applyAttributes(const DiskPlace& place, const Value& attributes) {
@@ -143,6 +166,38 @@ int copyContents(int from, const FileInWriting& to) {
   return 0;
 }
 
+/// A flush is mostly waiting, and a disk writes out in one go what is asked for at the same time.
+constexpr std::size_t flushesAtOnce = 8;
+
+/// Calls `flush` with each index below `count`, on up to `atOnce` threads. The first error number, after which no more
+/// are begun.
+int flushAll(std::size_t count, std::size_t atOnce, const std::function<int(std::size_t index)>& flush) {
+  std::atomic<std::size_t> next{0};
+  std::atomic<int> failure{0};
+  auto work = [&] {
+    for (std::size_t i; failure == 0 && (i = next++) < count;) {
+      int number;
+      try {
+        number = flush(i);
+      } catch (const std::bad_alloc&) {
+        number = ENOMEM;
+      }
+      int none = 0;
+      if (number != 0) failure.compare_exchange_strong(none, number);
+    }
+  };
+  {
+    std::vector<std::jthread> others;
+    try {
+      while (others.size() + 1 < std::min(count, atOnce)) others.emplace_back(work);
+    } catch (const std::system_error&) {
+      // As many as there are will do.
+    }
+    work();
+  }
+  return failure;
+}
+
 }  // namespace
 
 bool DiskFileTree::removeItem(std::string_view path, ErrorRef* error) {
@@ -233,11 +288,17 @@ std::optional<Bytes> DiskFileTree::readFile(std::string_view path, ErrorRef* err
   return contents;
 }
 
-bool DiskFileTree::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error) {
+bool DiskFileTree::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error, Durability durability) {
   DiskPlace place;
   int failure = find(path, place);
-  if (failure == 0) failure = place.replaceFile([&](const FileInWriting& file) { return writeWhole(file, contents); });
-  if (failure == 0) failure = place.syncDirectory();
+  if (failure == 0) {
+    failure = place.replaceFile([&](const FileInWriting& file) {
+      int failure = writeWhole(file, contents);
+      // Before the rename, so that the new content is whole wherever the new name is.
+      return failure == 0 && durability == Durability::lasting ? syncFile(file) : failure;
+    });
+  }
+  if (failure == 0 && durability == Durability::lasting) failure = place.syncDirectory();
   return answerFileOperation(failure, path, error);
 }
 
@@ -288,12 +349,45 @@ std::unique_ptr<FileReader> DiskFileTree::openForReading(std::string_view path, 
   return std::make_unique<DiskFileReader>(std::move(file), path);
 }
 
-bool DiskFileTree::syncDirectory(std::string_view path, ErrorRef* error) {
+int DiskFileTree::flushDirectory(std::string_view path) const {
   DiskPlace place;
   FileDescriptor directory;
-  int failure = find(path, place);
-  if (failure == 0) failure = place.openDirectory(directory);
-  if (failure == 0) failure = device::syncDirectory(directory.get(), path, _watch.get());
+  if (int failure = find(path, place)) return failure;
+  if (int failure = place.openDirectory(directory)) return failure;
+  return device::syncDirectory(directory.get(), path, _watch.get());
+}
+
+int DiskFileTree::flushFile(std::string_view path) const {
+  FileDescriptor file;
+  if (int failure = openFile(path, file)) return failure;
+  return syncFile({file.get(), path, _watch.get()});
+}
+
+bool DiskFileTree::syncDirectory(std::string_view path, ErrorRef* error) {
+  return answerFileOperation(flushDirectory(path), path, error);
+}
+
+bool DiskFileTree::syncItem(std::string_view path, ErrorRef* error) {
+  auto attributes = attributesOfItem(path, error);
+  if (!attributes) return false;
+  struct Item {
+    std::string path;
+    bool isDirectory;
+  };
+  std::vector<Item> items{{std::string(path), attributes->isDirectory}};
+  for (std::size_t i = 0; i < items.size(); ++i) {
+    if (!items[i].isDirectory) continue;
+    std::string directory = path == "/" && i == 0 ? "" : items[i].path;
+    auto entries = list(items[i].path, error);
+    if (!entries) return false;
+    for (const auto& entry : *entries) items.push_back({directory + '/' + entry.name, entry.isDirectory});
+  }
+  auto slash = path.rfind('/');
+  items.push_back({std::string(slash == 0 ? "/" : path.substr(0, slash)), true});
+  // Whoever watches the steps wants the same order every time.
+  int failure = flushAll(items.size(), _watch ? 1 : flushesAtOnce, [&](std::size_t i) {
+    return items[i].isDirectory ? flushDirectory(items[i].path) : flushFile(items[i].path);
+  });
   return answerFileOperation(failure, path, error);
 }
 

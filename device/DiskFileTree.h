@@ -25,13 +25,15 @@ class DiskFileTree final : public FileTree {
   std::optional<platform::FileAttributes> attributesOfItem(std::string_view path, platform::ErrorRef* error) override;
   bool createFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes) override;
   std::optional<platform::Bytes> readFile(std::string_view path, platform::ErrorRef* error) override;
-  bool writeAtomically(std::string_view path, platform::BytesView contents, platform::ErrorRef* error) override;
+  bool writeAtomically(std::string_view path, platform::BytesView contents, platform::ErrorRef* error,
+                       platform::Durability durability) override;
   int utimes(std::string_view path, int& errorNumber) override;
 
   std::optional<std::vector<Entry>> list(std::string_view path, platform::ErrorRef* error) override;
   std::unique_ptr<FileWriter> createNew(std::string_view path, bool executable, platform::ErrorRef* error) override;
   std::unique_ptr<FileReader> openForReading(std::string_view path, platform::ErrorRef* error) override;
   bool syncDirectory(std::string_view path, platform::ErrorRef* error) override;
+  bool syncItem(std::string_view path, platform::ErrorRef* error) override;
 
  private:
   int find(std::string_view path, DiskPlace& place) const { return find(path, false, place); }
@@ -40,6 +42,8 @@ class DiskFileTree final : public FileTree {
   }
   int makeDirectory(std::string_view path, bool intermediates, const platform::Value& attributes) const;
   int openFile(std::string_view path, FileDescriptor& file) const;
+  int flushDirectory(std::string_view path) const;
+  int flushFile(std::string_view path) const;
 
   const FileDescriptor _root;
   const std::shared_ptr<StepWatch> _watch;

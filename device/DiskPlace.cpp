@@ -2,7 +2,9 @@
 
 #include <dirent.h>
 #include <fcntl.h>
+#include <linux/openat2.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 
 #include <atomic>
 #include <cerrno>
@@ -32,6 +34,15 @@ int openDirectoryAt(int parent, const char* name, int flags, FileDescriptor& dir
   if (failure == ENOTDIR && ::fstatat(parent, name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISLNK(status.st_mode))
     return ELOOP;
   return failure;
+}
+
+/// The directory that a path below `root` leads to, in one call. Nothing where the system has no such call, and when it
+/// fails: the walk, name by name, tells why.
+FileDescriptor openBelow(const FileDescriptor& root, const std::string& path) {
+  struct open_how how {};
+  how.flags = O_PATH | O_DIRECTORY | O_CLOEXEC;
+  how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS;
+  return FileDescriptor(static_cast<int>(::syscall(SYS_openat2, root.get(), path.c_str(), &how, sizeof how)));
 }
 
 /// A name that nothing has yet in any directory, as far as this process knows.
@@ -153,11 +164,13 @@ int DiskPlace::find(const FileDescriptor& root, std::string_view path, bool make
                     DiskPlace& place) {
   std::vector<std::string_view> names;
   if (int failure = splitDevicePath(path, names)) return failure;
-  if (int failure = openDirectoryAt(root.get(), ".", O_PATH, place._directory)) return failure;
   place._path = path;
   place._watch = watch;
   place._isRoot = names.empty();
   place._name = names.empty() ? "." : names.back();
+  place._directory = openBelow(root, names.size() < 2 ? "." : std::string(place.directoryPath().substr(1)));
+  if (place._directory.isOpen()) return 0;
+  if (int failure = openDirectoryAt(root.get(), ".", O_PATH, place._directory)) return failure;
   for (std::size_t i = 0; i + 1 < names.size(); ++i) {
     std::string name(names[i]);
     FileDescriptor next;
@@ -269,7 +282,6 @@ int DiskPlace::replaceFile(const std::function<int(const FileInWriting& file)>& 
   if (!file.isOpen()) return failure;
   FileInWriting writing{file.get(), path, _watch};
   if (failure == 0) failure = fill(writing);
-  if (failure == 0) failure = syncFile(writing);
   if (failure == 0) {
     failure = takeStep(_watch, {Step::Kind::move, path, _path}, [&](Step&) {
       return ::renameat(directory(), temporary.c_str(), directory(), name()) == 0 ? 0 : errno;

@@ -53,8 +53,9 @@ class DiskPlace {
   /// Sets its times to now.
   int touch() const;
 
-  /// Puts a new file there, in place of an older one: filled under a temporary name in the same directory, flushed,
-  /// renamed. On failure nothing has changed and the temporary file is gone.
+  /// Puts a new file there, in place of an older one: filled under a temporary name in the same directory, then
+  /// renamed. What is to be flushed before that, `fill` flushes. On failure nothing has changed and the temporary file
+  /// is gone.
   int replaceFile(const std::function<int(const FileInWriting& file)>& fill) const;
   /// With everything in it. A link, or whatever else it is, goes itself.
   int remove() const;

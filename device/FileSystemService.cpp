@@ -84,9 +84,10 @@ std::optional<Bytes> FileSystemService::readFile(std::string_view path, ErrorRef
              [&](ErrorRef* reason) { return _files.readFile(path, reason); });
 }
 
-bool FileSystemService::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error) {
+bool FileSystemService::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error,
+                                        platform::Durability durability) {
   return run("writeAtomically", path, error, {{"path", path}, {"contents", CallArgument::BytesCount{contents.size()}}},
-             [&](ErrorRef* reason) { return _files.writeAtomically(path, contents, reason); });
+             [&](ErrorRef* reason) { return _files.writeAtomically(path, contents, reason, durability); });
 }
 
 int FileSystemService::utimes(std::string_view path, int& errorNumber) {

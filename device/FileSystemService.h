@@ -30,7 +30,8 @@ class FileSystemService final : public platform::FileSystem {
   std::optional<platform::FileAttributes> attributesOfItem(std::string_view path, platform::ErrorRef* error) override;
   bool createFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes) override;
   std::optional<platform::Bytes> readFile(std::string_view path, platform::ErrorRef* error) override;
-  bool writeAtomically(std::string_view path, platform::BytesView contents, platform::ErrorRef* error) override;
+  bool writeAtomically(std::string_view path, platform::BytesView contents, platform::ErrorRef* error,
+                       platform::Durability durability) override;
   int utimes(std::string_view path, int& errorNumber) override;
 
  private:

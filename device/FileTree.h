@@ -57,6 +57,8 @@ class FileTree : public platform::FileSystem {
   virtual std::unique_ptr<FileReader> openForReading(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
   /// Makes the directory's entries durable.
   virtual bool syncDirectory(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
+  /// Makes a file's content durable, or all that is in a directory, and its entry in the directory that it is in.
+  virtual bool syncItem(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
 };
 
 /// The prefix of the names of temporary files that `writeAtomically` makes; leftovers are removed when a device is

@@ -106,7 +106,7 @@ std::optional<AppRecord> InstallEngine::unpack(const InstallRequest& request, Er
   }
   bool done = true;
   if (!metadata.isAbsent())
-    done = _containers.writeMetadata(app.container, metadata, true, error);
+    done = _containers.writeMetadata(app.container, metadata, error);
   else if (!previous.empty())
     done = _containers.copyMetadata(previous, app.container, error);
   if (!done || !_containers.sync(app.container, error)) return giveUp();

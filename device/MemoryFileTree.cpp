@@ -208,7 +208,7 @@ std::optional<FileAttributes> MemoryFileTree::attributesOfItem(std::string_view 
 }
 
 bool MemoryFileTree::createFile(std::string_view path, BytesView contents, const Value&) {
-  return writeAtomically(path, contents, nullptr);
+  return writeAtomically(path, contents, nullptr, platform::Durability::fleeting);
 }
 
 std::optional<Bytes> MemoryFileTree::readFile(std::string_view path, ErrorRef* error) {
@@ -220,7 +220,7 @@ std::optional<Bytes> MemoryFileTree::readFile(std::string_view path, ErrorRef* e
   return file->contents;
 }
 
-bool MemoryFileTree::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error) {
+bool MemoryFileTree::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error, platform::Durability) {
   std::lock_guard lock(*_root->guard);
   return answerFileOperation(replaceFile(path, contents, false), path, error);
 }
@@ -270,6 +270,10 @@ bool MemoryFileTree::syncDirectory(std::string_view path, ErrorRef* error) {
   int failure = findItem(path, directory);
   if (failure == 0 && !directory->isDirectory) failure = ENOTDIR;
   return answerFileOperation(failure, path, error);
+}
+
+bool MemoryFileTree::syncItem(std::string_view path, ErrorRef* error) {
+  return attributesOfItem(path, error).has_value();
 }
 
 std::unique_ptr<FileTree> makeMemoryFileTree() { return std::make_unique<MemoryFileTree>(); }

@@ -21,13 +21,15 @@ class MemoryFileTree final : public FileTree {
   std::optional<platform::FileAttributes> attributesOfItem(std::string_view path, platform::ErrorRef* error) override;
   bool createFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes) override;
   std::optional<platform::Bytes> readFile(std::string_view path, platform::ErrorRef* error) override;
-  bool writeAtomically(std::string_view path, platform::BytesView contents, platform::ErrorRef* error) override;
+  bool writeAtomically(std::string_view path, platform::BytesView contents, platform::ErrorRef* error,
+                       platform::Durability durability) override;
   int utimes(std::string_view path, int& errorNumber) override;
 
   std::optional<std::vector<Entry>> list(std::string_view path, platform::ErrorRef* error) override;
   std::unique_ptr<FileWriter> createNew(std::string_view path, bool executable, platform::ErrorRef* error) override;
   std::unique_ptr<FileReader> openForReading(std::string_view path, platform::ErrorRef* error) override;
   bool syncDirectory(std::string_view path, platform::ErrorRef* error) override;
+  bool syncItem(std::string_view path, platform::ErrorRef* error) override;
 
  private:
   struct Node;

@@ -123,9 +123,10 @@ std::optional<Bytes> OverlayFileTree::readFile(std::string_view path, ErrorRef* 
   return treeOf(path).readFile(path, error);
 }
 
-bool OverlayFileTree::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error) {
+bool OverlayFileTree::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error,
+                                      platform::Durability durability) {
   Lock lock(_guard);
-  return makeWay(path, error) && _above->writeAtomically(path, contents, error);
+  return makeWay(path, error) && _above->writeAtomically(path, contents, error, durability);
 }
 
 int OverlayFileTree::utimes(std::string_view path, int& errorNumber) {
@@ -154,6 +155,11 @@ std::unique_ptr<FileReader> OverlayFileTree::openForReading(std::string_view pat
 bool OverlayFileTree::syncDirectory(std::string_view path, ErrorRef* error) {
   Lock lock(_guard);
   return treeOf(path).syncDirectory(path, error);
+}
+
+bool OverlayFileTree::syncItem(std::string_view path, ErrorRef* error) {
+  // What was changed is in memory; the rest is as it was.
+  return attributesOfItem(path, error).has_value();
 }
 
 }  // namespace device

@@ -6,7 +6,6 @@
 #include <exception>
 #include <memory>
 #include <unordered_map>
-#include <vector>
 
 #include "device/PackageSource.h"
 #include "device/ServiceErrors.h"
@@ -49,7 +48,7 @@ class Unpacking {
       : _files(files), _source(files), _packagePath(packagePath), _directory(directory), _limits(limits) {}
 
   std::optional<UnpackedPackage> run(platform::ErrorRef* error) {
-    if (!_source.open(_packagePath, &_reason) || !unpackEntries() || !readManifest() || !syncDirectories()) {
+    if (!_source.open(_packagePath, &_reason) || !unpackEntries() || !readManifest()) {
       platform::setError(error, packageError("package " + shown(_packagePath) + ": " +
                                                  (_reason ? _reason->description() : std::string("unreadable")),
                                              _reason));
@@ -142,9 +141,7 @@ class Unpacking {
       return true;
     }
     if (!hasRoom()) return false;
-    if (!_files.createDirectory(_directory + '/' + name, false, {}, &_reason)) return false;
-    _directories.push_back(name);
-    return true;
+    return _files.createDirectory(_directory + '/' + name, false, {}, &_reason);
   }
 
   /// Folders count even if the archive does not list them: one long name brings many of them.
@@ -177,7 +174,7 @@ class Unpacking {
       _result.bytes += size;
       if (!writer->write({static_cast<const char*>(data), size}, &_reason)) return false;
     }
-    return writer->close(true, &_reason);
+    return writer->close(false, &_reason);
   }
 
   bool readManifest() {
@@ -199,13 +196,6 @@ class Unpacking {
     return true;
   }
 
-  bool syncDirectories() {
-    for (auto name = _directories.rbegin(); name != _directories.rend(); ++name) {
-      if (!_files.syncDirectory(_directory + '/' + *name, &_reason)) return false;
-    }
-    return true;
-  }
-
   struct Seen {
     std::string name;
     bool isDirectory;
@@ -217,7 +207,6 @@ class Unpacking {
   std::string _directory;
   PackageLimits _limits;
   std::unordered_map<std::string, Seen> _seen;  // by name without case
-  std::vector<std::string> _directories;        // a directory stands after those around it
   std::string _last;                            // name of the entry met last
   UnpackedPackage _result;
   platform::ErrorRef _reason;

@@ -29,7 +29,7 @@ struct UnpackedPackage {
 };
 
 /// Unpacks a package, a zip archive with one "<Name>.app" folder at its top, into a directory that exists and is
-/// empty. On true all that is in it is on disk, but for its own entries. Nothing, with an error of the domain "Package"
+/// empty. It is not flushed. Nothing, with an error of the domain "Package"
 /// that names the package and the entry, when it is anything else than plain files and folders below that one folder,
 /// when two names differ in case only, or when a limit is passed; what has been written so far stays then, for the
 /// caller to remove.

@@ -39,7 +39,8 @@ bool AppsClient::_makeIconFromBundlePath(const Platform& platform, const std::op
     sayError(platform, "Couldn't finalize image");
     return false;
   }
-  if (!platform.fileSystem.writeAtomically(saveTo, data)) {
+  // Icons are drawn anew by each sync.
+  if (!platform.fileSystem.writeAtomically(saveTo, data, nullptr, Durability::fleeting)) {
     sayError(platform, "Couldn't save image file to %{public}@", saveTo);
     return false;
   }

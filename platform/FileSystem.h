@@ -19,8 +19,14 @@ struct FileAttributes {
   std::uint64_t size = 0;  // bytes; 0 for a directory
 };
 
-/// File operations. Paths are absolute. Every operation from any thread; each is by itself atomic towards the others
-/// only where it says so. Anything but regular files and directories is refused unopened.
+/// What a loss of power may do to a file that was written.
+enum class Durability : std::uint8_t {
+  lasting,   // on disk when the operation returns; the file has the old content or the new afterwards
+  fleeting,  // it may take the file, or any part of it: for what is made again before it is used again
+};
+
+/// File operations. Paths are absolute. Every operation from any thread; each is by itself atomic towards the others,
+/// and on disk when it returns, only where it says so. Anything but regular files and directories is refused unopened.
 class FileSystem {
  public:
   virtual ~FileSystem() = default;
@@ -31,7 +37,7 @@ class FileSystem {
   /// otherwise. `attributes` is a dictionary or absent; an implementation applies what it may.
   virtual bool createDirectory(std::string_view path, bool withIntermediateDirectories, const Value& attributes,
                                ErrorRef* error = nullptr) = 0;
-  /// Atomic. Something at the destination is a failure.
+  /// Atomic, and on disk when it returns. Something at the destination is a failure.
   virtual bool moveItem(std::string_view from, std::string_view to, ErrorRef* error = nullptr) = 0;
   /// A file; an older file at the destination is replaced.
   virtual bool copyItem(std::string_view from, std::string_view to, ErrorRef* error = nullptr) = 0;
@@ -41,9 +47,9 @@ class FileSystem {
   virtual bool createFile(std::string_view path, BytesView contents, const Value& attributes) = 0;
   /// The whole file, bypassing the cache.
   virtual std::optional<Bytes> readFile(std::string_view path, ErrorRef* error = nullptr) = 0;
-  /// A temporary file, then a rename: a reader, and the device after a loss of power, sees the old content or the new,
-  /// never a part. On true the new content is on disk.
-  virtual bool writeAtomically(std::string_view path, BytesView contents, ErrorRef* error = nullptr) = 0;
+  /// A temporary file, then a rename: a reader sees the old content or the new, never a part.
+  virtual bool writeAtomically(std::string_view path, BytesView contents, ErrorRef* error = nullptr,
+                               Durability durability = Durability::lasting) = 0;
   /// Access and modification times become now. 0, or -1 with the error number stored.
   virtual int utimes(std::string_view path, int& errorNumber) = 0;
 };

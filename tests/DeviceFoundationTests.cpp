@@ -318,7 +318,7 @@ TEST(FileSystemService, tellsOfFailuresNobodyLooksAt) {
   FileSystemService service(boundary, *files, [&](auto operation, auto path, auto reason) {
     told += std::string(operation) + " " + std::string(path) + ": " + std::string(reason) + "\n";
   });
-  service.writeAtomically("/f", "x", nullptr);
+  service.writeAtomically("/f", "x", nullptr, platform::Durability::lasting);
   service.removeItem("/none", nullptr);
   service.readFile("/none", nullptr);
   EXPECT_EQ(told, "");
@@ -331,7 +331,7 @@ TEST(FileSystemService, tellsOfFailuresNobodyLooksAt) {
   EXPECT_EQ(error->domain(), "Injection");
   EXPECT_FALSE(files->fileExists("/d"));
   EXPECT_FALSE(service.copyItem("/f", "/g", nullptr));
-  EXPECT_FALSE(service.writeAtomically("/none/f", "x", nullptr));
+  EXPECT_FALSE(service.writeAtomically("/none/f", "x", nullptr, platform::Durability::lasting));
   EXPECT_EQ(told,
             "utimes /f: Input/output error\n"
             "createDirectory /d: injected at FileSystem.createDirectory\n"

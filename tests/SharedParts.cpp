@@ -63,9 +63,10 @@ class SharedTree final : public device::FileTree {
     if (bytes) tell("readFile", path);
     return bytes;
   }
-  bool writeAtomically(std::string_view path, platform::BytesView contents, ErrorRef* error) override {
+  bool writeAtomically(std::string_view path, platform::BytesView contents, ErrorRef* error,
+                       platform::Durability durability) override {
     tell("writeAtomically", path);
-    return _tree.writeAtomically(path, contents, error);
+    return _tree.writeAtomically(path, contents, error, durability);
   }
   int utimes(std::string_view path, int& number) override { return _tree.utimes(path, number); }
   std::optional<std::vector<Entry>> list(std::string_view path, ErrorRef* error) override {
@@ -78,6 +79,7 @@ class SharedTree final : public device::FileTree {
     return _tree.openForReading(path, error);
   }
   bool syncDirectory(std::string_view path, ErrorRef* error) override { return _tree.syncDirectory(path, error); }
+  bool syncItem(std::string_view path, ErrorRef* error) override { return _tree.syncItem(path, error); }
 
  private:
   void tell(std::string_view operation, std::string_view path) const {

@@ -152,7 +152,7 @@ TransferQueue::Result TransferQueue::send(Transfer& transfer, HostFile& package,
   auto target = files.createNew(path, false, &error);
   if (!target) return fail(transfer, End::failed, transferError(path + ": " + textOf(error), error));
   Result sent = sendChunks(transfer, package, *target);
-  if (sent.end == End::arrived && (!target->close(true, &error) || !files.syncDirectory(packagesDirectory, &error))) {
+  if (sent.end == End::arrived && (!target->close(false, &error) || !files.syncItem(path, &error))) {
     sent = {End::failed, transferError(path + ": " + textOf(error), error), sent.bytes};
   }
   target.reset();
