@@ -140,7 +140,7 @@ std::optional<platform::Bytes> MemoryFiles::readFile(std::string_view path, Erro
   return item->contents;
 }
 
-bool MemoryFiles::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error) {
+bool MemoryFiles::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error, platform::Durability) {
   std::lock_guard lock(_mutex);
   return answer(write(path, contents), path, error);
 }

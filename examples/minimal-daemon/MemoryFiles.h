@@ -21,8 +21,8 @@ class MemoryFiles final : public platform::FileSystem {
                                                            platform::ErrorRef* error = nullptr) override;
   bool createFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes) override;
   std::optional<platform::Bytes> readFile(std::string_view path, platform::ErrorRef* error = nullptr) override;
-  bool writeAtomically(std::string_view path, platform::BytesView contents,
-                       platform::ErrorRef* error = nullptr) override;
+  bool writeAtomically(std::string_view path, platform::BytesView contents, platform::ErrorRef* error = nullptr,
+                       platform::Durability durability = platform::Durability::lasting) override;
   int utimes(std::string_view path, int& errorNumber) override;
 
  private:
