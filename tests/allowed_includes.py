@@ -38,7 +38,7 @@ LIBRARIES = {
 ONCE = ["nlohmann/", "CLI/"]
 
 STANDARD = re.compile(r"[a-z_0-9]+")
-SYSTEM_HEADER = re.compile(r"(sys/)?[a-z_0-9]+\.h")
+SYSTEM_HEADER = re.compile(r"((sys|linux)/)?[a-z_0-9]+\.h")
 INCLUDE = re.compile(r'^\s*#\s*include\s*([<"])([^>"]+)[>"]')
 
 
