@@ -261,12 +261,12 @@ std::optional<FileAttributes> DiskFileTree::attributesOfItem(std::string_view pa
   return FileAttributes{isDirectory, isDirectory ? 0 : static_cast<std::uint64_t>(status.st_size)};
 }
 
-bool DiskFileTree::createFile(std::string_view path, BytesView contents, const Value& attributes) {
+bool DiskFileTree::putFile(std::string_view path, BytesView contents, const Value& attributes, ErrorRef* error) {
   DiskPlace place;
-  if (find(path, place) != 0) return false;
-  if (place.replaceFile([&](const FileInWriting& file) { return writeWhole(file, contents); }) != 0) return false;
-  applyAttributes(place, attributes);
-  return true;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.replaceFile([&](const FileInWriting& file) { return writeWhole(file, contents); });
+  if (failure == 0) applyAttributes(place, attributes);
+  return answerFileOperation(failure, path, error);
 }
 
 int DiskFileTree::openFile(std::string_view path, FileDescriptor& file) const {

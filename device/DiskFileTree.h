@@ -23,7 +23,11 @@ class DiskFileTree final : public FileTree {
   bool copyItem(std::string_view from, std::string_view to, platform::ErrorRef* error) override;
   bool fileExists(std::string_view path, bool* isDirectory) override;
   std::optional<platform::FileAttributes> attributesOfItem(std::string_view path, platform::ErrorRef* error) override;
-  bool createFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes) override;
+  bool createFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes) override {
+    return putFile(path, contents, attributes, nullptr);
+  }
+  bool putFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes,
+               platform::ErrorRef* error) override;
   std::optional<platform::Bytes> readFile(std::string_view path, platform::ErrorRef* error) override;
   bool writeAtomically(std::string_view path, platform::BytesView contents, platform::ErrorRef* error,
                        platform::Durability durability) override;

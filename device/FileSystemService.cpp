@@ -76,7 +76,7 @@ std::optional<FileAttributes> FileSystemService::attributesOfItem(std::string_vi
 bool FileSystemService::createFile(std::string_view path, BytesView contents, const Value& attributes) {
   return run("createFile", path, nullptr,
              {{"path", path}, {"contents", CallArgument::BytesCount{contents.size()}}, {"attributes", attributes}},
-             [&](ErrorRef*) { return _files.createFile(path, contents, attributes); });
+             [&](ErrorRef* reason) { return _files.putFile(path, contents, attributes, reason); });
 }
 
 std::optional<Bytes> FileSystemService::readFile(std::string_view path, ErrorRef* error) {

@@ -49,6 +49,12 @@ class FileTree : public platform::FileSystem {
     std::uint64_t size;
   };
 
+  /// What `createFile` does, with the reason of a failure where it is known.
+  virtual bool putFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes,
+                       platform::ErrorRef* error) {
+    platform::setError(error, nullptr);
+    return createFile(path, contents, attributes);
+  }
   /// The directory's items by name, sorted; nothing on failure.
   virtual std::optional<std::vector<Entry>> list(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
   /// A new file (something there is a failure); mode is the permission bits, of which only owner execute is kept apart.
