@@ -2,7 +2,7 @@
 # presets of CMakePresets.json, each in build/<preset>.
 
 .DEFAULT_GOAL := help
-.PHONY: help build build-all demo test check asan tsan clang debug sweep simulate mutants fuzz bench deb format clean packages \
+.PHONY: help build build-all demo test check asan tsan tsan-clang clang debug sweep simulate mutants fuzz bench deb format clean packages \
         check-packages fuzz-packages deb-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
@@ -44,6 +44,10 @@ asan: packages ## all tests with the address and undefined-behaviour sanitizers
 tsan: packages ## the threaded tests with the thread sanitizer
 	@$(call PRESET,tsan,tsd ApplicationSync plugin_tests device_service_tests device_foundation_tests contract_tests)
 	@.ci/threaded-tests build/tsan
+
+tsan-clang: check-packages ## the same with clang's
+	@$(call PRESET,tsan-clang,tsd ApplicationSync plugin_tests device_service_tests device_foundation_tests contract_tests)
+	@.ci/threaded-tests build/tsan-clang
 
 clang: check-packages ## a build with clang, whose thread-safety analysis may find nothing
 	@$(call PRESET,clang)

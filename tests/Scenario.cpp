@@ -62,15 +62,16 @@ class SyncPlayer {
  private:
   using App = ScenarioApp;
 
+  /// Where anything may be injected, the store or the person may have been faster.
   void prepare(const App& app) {
-    ErrorRef error;
-    if (app.before == App::Before::installed || app.lost) _rig.install(app.id, "1.0");
-    if (app.lost) {
-      EXPECT_TRUE(_rig.device().uninstallByPerson(app.id));
+    bool prepared = true;
+    if (app.before == App::Before::installed || app.lost) {
+      const std::string package = _rig.receivePackage(app.id, packageOf(app.id, "1.0"));
+      prepared = _rig.device().installFromPackage(package);
     }
-    if (app.before == App::Before::placeholder) {
-      EXPECT_TRUE(_rig.device().beginStoreInstall(app.id, app.store, &error)) << error->describe();
-    }
+    if (app.lost) prepared = _rig.device().uninstallByPerson(app.id) && prepared;
+    if (app.before == App::Before::placeholder) prepared = _rig.device().beginStoreInstall(app.id, app.store);
+    EXPECT_TRUE(prepared || !_scenario.rules.empty()) << app.id;
     _rig.deliver();
   }
 
