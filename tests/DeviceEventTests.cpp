@@ -226,4 +226,29 @@ TEST(NotificationService, keepsStatesAndCallsObserversOnItsLane) {
   EXPECT_EQ(*heard, "a@notification b@notification a@notification ");
 }
 
+TEST(ManualEventQueue, servesSeveralThreads) {
+  auto queue = makeManualEventQueue();
+  std::atomic<int> ran{0};
+  std::atomic<bool> inRegistry{false};
+  std::vector<std::thread> threads;
+  for (int i = 0; i < 4; ++i) {
+    threads.emplace_back([&, i] {
+      std::mutex mutex;
+      std::condition_variable changed;
+      for (int n = 0; n < 100; ++n) {
+        queue->post(Lane::registry, [&] {
+          EXPECT_FALSE(inRegistry.exchange(true)) << "two events of one lane at once";
+          ++ran;
+          inRegistry = false;
+        });
+        std::unique_lock lock(mutex);
+        if (i % 2) queue->clock().waitUntil(lock, changed, queue->clock().now() + 1s, [&] { return n % 3 == 0; });
+      }
+      queue->drain();
+    });
+  }
+  for (auto& thread : threads) thread.join();
+  EXPECT_EQ(ran, 400);
+}
+
 }  // namespace

@@ -305,5 +305,22 @@ TEST(Threads, TheObjectGoesWhileServicesCallBack) {
   }
 }
 
+TEST(Threads, TheObjectGoesOnTheThreadThatDeliversItsLastAnswer) {
+  PluginRig rig;
+  rig.install("app.0", "1");
+  std::weak_ptr<platform::TSClient> object = rig.client();
+  // The removal's completion holds the object until it has been delivered.
+  rig.daemon().assetInstallFailed(platform::TSAsset::downloadAssetWithIdentifier("app.0", "Application", {}), nullptr);
+  rig.forget();
+  rig.deliver();
+  EXPECT_TRUE(object.expired());
+  const auto& records = rig.records();
+  auto gone = std::find_if(records.rbegin(), records.rend(), [](const device::CallRecord& record) {
+    return record.service == "OBApplicationWorkspace" && record.operation == "removeObserver";
+  });
+  ASSERT_NE(gone, records.rend());
+  EXPECT_EQ(gone->thread, "coordination");
+}
+
 }  // namespace
 }  // namespace tests
