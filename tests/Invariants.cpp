@@ -33,7 +33,9 @@ constexpr Allowed table[] = {
     {"outstandingAssetTransfers", "coordinator TSError 1,placeholder TSError 1,promise TSError 30", "FAILED"},
     {"reconcileRestoreOfType", "coordinator TSError 29,placeholder TSError 29,promise TSError 29", ""},
     {"assetTransferUpdatedProgress", "promise TSError 30", ""},
-    {"assetTransferSucceeded", "coordinator RVUserPresentableError 1,coordinator none,promise TSError 30",
+    // The service makes the reason; what is injected there is passed on.
+    {"assetTransferSucceeded",
+     "coordinator RVUserPresentableError 1,coordinator none,coordinator Injection 1,promise TSError 30",
      "DOWNLOADED,SENT"},
     {"assetTransferEndedWithSuccess", "coordinator TSError 30", ""},
     {"coordinatorDidCompleteSuccessfully", "", "INSTALLED,FAILED"},
