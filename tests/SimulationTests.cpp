@@ -266,8 +266,9 @@ class Life {
       if (!app.operation.empty()) staged.push_back(app.id + ' ' + "Name of " + app.id);
     }
     std::vector<std::string> entries;
-    const Value list = _rig.readList(todoListPath);
-    for (const Value& entry : list.array() ? *list.array() : *Value::makeArray().array()) {
+    Value list = _rig.readList(todoListPath);
+    if (!list.array()) list = Value::makeArray();
+    for (const Value& entry : *list.array()) {
       const auto& fields = *entry.dictionary();
       entries.push_back(std::string(*fields["identifier"].string()) + ' ' + std::string(*fields["name"].string()));
     }
