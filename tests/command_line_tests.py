@@ -312,7 +312,9 @@ class Syncs(Folder):
         whole = json.loads(pathlib.Path("whole").read_text())
         for events in (killed, whole):
             names = {(each["pid"], each["tid"]): each["args"]["name"] for each in events if each["ph"] == "M"}
-            self.assertLessEqual({"daemon", "coordination", "transfer-1", *apps}, set(names.values()))
+            # Which of the transfers took a package is theirs to settle.
+            self.assertLessEqual({"daemon", "coordination", *apps}, set(names.values()))
+            self.assertTrue(any(name.startswith("transfer-") for name in names.values()), names)
             slices, begun = collections.defaultdict(list), collections.defaultdict(list)
             for event in events:
                 track, time = names[event["pid"], event["tid"]], event["ts"]
