@@ -22,6 +22,11 @@ struct CloseDirectory {
 };
 using Directory = std::unique_ptr<DIR, CloseDirectory>;
 
+/// The host is to know at once that a device takes no more; a name that no device takes concerns its file only.
+bool isAboutName(const platform::ErrorRef& error) {
+  return error && (error->code() == EINVAL || error->code() == ENAMETOOLONG || error->code() == EILSEQ);
+}
+
 /// The names in a directory, sorted.
 std::vector<std::string> namesIn(DIR* directory, const std::string& path) {
   std::vector<std::string> names;
@@ -81,6 +86,7 @@ void FileConduit::pushDirectory(const Level& level) {
   platform::ErrorRef error;
   if (!_files.createDirectory(level.devicePath, true, {}, &error)) {
     if (level.depth == 0) throw CommandError("the staging directory: " + textOf(error));
+    if (!isAboutName(error)) throw CommandError(level.hostPath + ": " + textOf(error));
     refuse(level.hostPath, textOf(error));
     return;
   }
@@ -126,7 +132,8 @@ platform::ErrorRef FileConduit::copy(HostFile& file, const std::string& hostPath
   }
   platform::ErrorRef error;
   auto writer = _files.createNew(devicePath, false, &error);
-  if (!writer) return error;
+  if (!writer && isAboutName(error)) return error;
+  if (!writer) throw CommandError(hostPath + ": " + textOf(error));
   while (true) {
     auto bytes = file.read(chunkSize, &error);
     if (!bytes) throw CommandError(hostPath + ": " + textOf(error));

@@ -48,7 +48,7 @@ class FileConduit {
 
   void pushDirectory(const Level& level);
   void pushItem(const Level& level, const std::string& name);
-  /// Absent when all went well, else why the device refuses a file of that name. Throws when the copying itself fails.
+  /// Absent when all went well, else why no file of the device can have that name. Throws when anything else fails.
   platform::ErrorRef copy(HostFile& file, const std::string& hostPath, std::string_view devicePath, bool durable);
   void refuse(const std::string& hostPath, const std::string& why);
 
