@@ -244,9 +244,10 @@ void AppRecords::commitLater(ChangeSet&& changes) {
   }
 }
 
-void AppRecords::flush() {
+bool AppRecords::flush(platform::ErrorRef* error) {
+  platform::setError(error, nullptr);
   platform::Mutex::Lock lock(mutex);
-  if (!_later.empty()) commit({});
+  return _later.empty() || commit({}, error);
 }
 
 void AppRecords::setFraction(std::string_view app, double fraction) {

@@ -147,7 +147,7 @@ class AppRecords {
   /// In memory at once, in the store with the next commit: what may be lost with the process.
   void commitLater(ChangeSet&& changes) REQUIRES(mutex);
   /// Writes what `commitLater` kept back.
-  void flush() EXCLUDES(mutex);
+  bool flush(platform::ErrorRef* error = nullptr) EXCLUDES(mutex);
   /// How far a transfer has come. In memory only; goes to the store with the app's next change.
   void setFraction(std::string_view app, double fraction) REQUIRES(mutex);
   /// The apps that were put or removed since this was last asked; for whoever keeps a view of them up to date.

@@ -125,8 +125,7 @@ class WholeDevice final : public LocalDevice {
 
   ~WholeDevice() override {
     _events->stop();
-    _engine.flush();
-    _records.flush();
+    WholeDevice::flush(nullptr);
   }
 
   bool load(ErrorRef* error) {
@@ -202,11 +201,18 @@ class WholeDevice final : public LocalDevice {
     return yes ? "wanted" : "declined";
   }
 
+  bool flush(ErrorRef* error) override {
+    _engine.flush();
+    return _records.flush(error);
+  }
+
   void keepNotificationState(const std::string& name, std::uint64_t state) {
     ChangeSet changes;
     changes.setNotificationState(name, state);
     Lock lock(_records.mutex);
-    _records.commit(std::move(changes));
+    // Everybody has it already, so what the store refuses now is for its next commit.
+    _records.commitLater(std::move(changes));
+    _records.commit({});
   }
 
   /// Somebody else does something in the middle of a call. What cannot be done at that moment is not.

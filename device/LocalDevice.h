@@ -146,6 +146,10 @@ class LocalDevice {
                                   platform::ErrorRef* error = nullptr) = 0;
   /// An app that is simply there, from a package: what a device has before the first sync.
   virtual bool installFromPackage(std::string_view packagePath, platform::ErrorRef* error = nullptr) = 0;
+
+  /// Stores what is in memory only: how far transfers have come, and the state of notifications where the store refused
+  /// it before. False with an error when it refuses still. A device that goes does the same, silently.
+  virtual bool flush(platform::ErrorRef* error = nullptr) = 0;
 };
 
 /// Makes an empty tree and an empty store those of an empty device.

@@ -10,6 +10,7 @@ ExitCode runBackup(const CommandContext& context, const DeviceOnlyOptions& optio
   Daemon daemon(session.device(), session.loadPlugin());
   daemon.postStartupNotification();
   daemon.prepareForBackup();
+  session.settle();
   if (context.options.json) {
     auto document = startDocument(context.options.command);
     document.dictionary()->set("result", "done");

@@ -24,7 +24,7 @@ ExitCode runClear(const CommandContext& context, const DeviceOnlyOptions& option
   daemon.postStartupNotification();
   auto before = appsOn(session.device());
   daemon.clearSyncData();
-  session.device().events().drain();
+  session.settle();
   auto after = appsOn(session.device());
   std::vector<std::string> removed;
   for (const auto& id : before) {

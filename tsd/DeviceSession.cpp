@@ -36,6 +36,12 @@ void DeviceSession::unloadPlugin() {
   _device->events().drain();
 }
 
+void DeviceSession::settle() {
+  _device->events().drain();
+  platform::ErrorRef error;
+  if (!_device->flush(&error)) throw CommandError("not everything could be stored: " + textOf(error));
+}
+
 device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
   device::DeviceOptions options;
   options.mainBundleIdentifier = setup.mainBundleIdentifier;

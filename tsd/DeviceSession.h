@@ -50,6 +50,9 @@ class DeviceSession {
   platform::TSClient& loadPlugin(const StopSignal& stop, CountdownClock::Tick tick = nullptr);
   /// Lets the plug-in's object go, and everything run that was posted for it.
   void unloadPlugin();
+  /// Everything that was posted runs, and what the device has in memory only is stored. Throws a `CommandError` when
+  /// the store refuses.
+  void settle();
 
  private:
   platform::TSClient& makeClient(const platform::Platform& platform);

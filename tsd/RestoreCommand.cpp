@@ -109,12 +109,14 @@ class Restore {
   Value document(ExitCode code) const;
   std::string text(ExitCode code) const;
   std::vector<std::string> missing() const;
+  std::string problem() const;  // what a person is to be told, if anything
   bool restoresApps() const { return _options.type == 2 || _options.type == 3; }
 
   const CommandContext& _context;
   const RestoreOptions& _options;
   RestoreList _list;
   platform::ErrorRef _declined;
+  platform::ErrorRef _unstored;  // why the device could not store everything
 };
 
 ExitCode Restore::run() {
@@ -131,6 +133,7 @@ ExitCode Restore::run() {
     StopSignal::Subscription told(stop, [this] { _context.console.message("stopping; a second signal ends at once"); });
     reconcile(session, stop, progress);
     session.device().events().drain();
+    session.device().flush(&_unstored);
     look(session);
     for (const auto& app : _list.apps) {
       progress.ended(app.id, app.state.empty() ? "missing" : app.state, "", !app.state.empty());
@@ -139,8 +142,7 @@ ExitCode Restore::run() {
   }
   stop.letFinish();
   ExitCode result = code(stop.requested());
-  if (!_list.problem.empty()) _context.console.message(_list.problem);
-  if (_declined) _context.console.message("the backup service declined: " + textOf(_declined));
+  if (auto text = problem(); !text.empty()) _context.console.message(text);
   if (_context.options.json)
     writeDocument(document(result));
   else
@@ -175,6 +177,11 @@ void Restore::look(DeviceSession& session) {
   }
 }
 
+std::string Restore::problem() const {
+  if (_unstored) return "not everything could be stored: " + textOf(_unstored);
+  return _declined ? "the backup service declined: " + textOf(_declined) : _list.problem;
+}
+
 std::vector<std::string> Restore::missing() const {
   std::vector<std::string> ids;
   for (const auto& app : _list.apps) {
@@ -185,6 +192,7 @@ std::vector<std::string> Restore::missing() const {
 
 ExitCode Restore::code(bool stopped) const {
   if (stopped) return ExitCode::cancelled;
+  if (_unstored) return ExitCode::failed;
   if (!restoresApps()) return ExitCode::done;
   if (!_list.problem.empty()) return ExitCode::failed;
   return missing().empty() ? ExitCode::done : ExitCode::deadline;
@@ -206,7 +214,7 @@ Value Restore::document(ExitCode code) const {
   }
   entries.set("apps", apps);
   entries.set("missing", arrayOf(missing()));
-  std::string message = _declined ? "the backup service declined: " + textOf(_declined) : _list.problem;
+  std::string message = problem();
   if (!message.empty()) {
     Value error = Value::makeDictionary();
     if (code != ExitCode::done) error.dictionary()->set("exitCode", static_cast<int>(code));

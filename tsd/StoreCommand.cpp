@@ -45,8 +45,8 @@ ExitCode runStore(const CommandContext& context, const StoreOptions& options) {
     if (!device.beginStoreInstall(options.app, options.install, &error)) {
       throw CommandError(textOf(error));
     }
-    device.events().drain();
   }
+  session.settle();
   auto app = device.app(options.app);
   if (context.options.json) {
     auto document = startDocument(context.options.command);

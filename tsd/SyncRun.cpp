@@ -48,6 +48,9 @@ SyncReport SyncRun::run() {
   if (!_deadlinePassed) {
     _parts.session.device().events().drain();
     removeLeftPackages();
+    ErrorRef error;
+    if (!_parts.session.device().flush(&error) && _report.message.empty())
+      _report.message = "not everything could be stored: " + textOf(error);
   }
   fillReport();
   _parts.progress.finish();
@@ -163,7 +166,9 @@ void SyncRun::removeLeftPackages() {
   std::set<std::string> open;
   for (const auto& coordinator : _parts.session.device().status().coordinators) open.insert(coordinator.app + ".pkg");
   for (const auto& entry : *entries) {
-    if (!open.count(entry.name)) files.removeItem(std::string(packagesDirectory) + "/" + entry.name);
+    ErrorRef error;
+    if (!open.count(entry.name) && !files.removeItem(std::string(packagesDirectory) + "/" + entry.name, &error))
+      _parts.context.console.message("a package was left: " + textOf(error));
   }
 }
 

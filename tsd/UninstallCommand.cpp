@@ -11,7 +11,7 @@ ExitCode runUninstall(const CommandContext& context, const UninstallOptions& opt
   if (!session.device().uninstallByPerson(options.app, &error)) {
     throw CommandError(textOf(error));
   }
-  session.device().events().drain();
+  session.settle();
   if (context.options.json) {
     auto document = startDocument(context.options.command);
     document.dictionary()->set("result", "done");
