@@ -2,8 +2,8 @@
 # presets of CMakePresets.json, each in build/<preset>.
 
 .DEFAULT_GOAL := help
-.PHONY: help build build-all demo test check asan tsan tsan-clang clang debug sweep simulate mutants fuzz bench deb format clean packages \
-        check-packages fuzz-packages deb-packages
+.PHONY: help build build-all demo test check asan tsan tsan-clang clang debug sweep kill-sweep error-sweep full-disk \
+        power-loss simulate mutants fuzz bench deb format clean packages check-packages fuzz-packages deb-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
 SEEDS ?=
@@ -63,6 +63,9 @@ kill-sweep: build ## tsd killed before and after every step of a sync and a rest
 
 error-sweep: build ## every step of a sync and a restore failed in every way, once and for ever
 	@python3 tests/kill_sweep.py build/release/bin/tsd error
+
+full-disk: build ## a sync and a restore on disks that really are full, page by page; needs the right to mount
+	@python3 tests/kill_sweep.py build/release/bin/tsd full
 
 power-loss: build-all ## power lost after every step of a sync and a restore
 	@cd build/release && APPSYNC_POWER_LOSS=all bin/power_loss_tests --gtest_brief=1
