@@ -27,7 +27,8 @@ import subprocess
 import sys
 import tempfile
 
-DONE, FAILED, SOME_FAILED, DEADLINE = 0, 1, 3, 5
+from tsd_folder import DEADLINE, DONE, FAILED, SOME_FAILED, tree_of
+
 KILLED = -9
 
 TODO_LIST = "var/mobile/Library/ApplicationSync/HarluneStuff/ApplicationsSync.plist"
@@ -54,12 +55,6 @@ def require(holds, what):
 
 def mount(*arguments):
     subprocess.run(["mount", *arguments], check=True)
-
-
-def tree_of(folder):
-    """Every path below a folder: the file's content, nothing for a folder."""
-    return {str(path.relative_to(folder)): path.read_bytes() if path.is_file() else None
-            for path in sorted(pathlib.Path(folder).rglob("*"))}
 
 
 class Device:
