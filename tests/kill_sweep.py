@@ -161,7 +161,8 @@ class Part:
 
     def check_disk(self, device, list_before, calls):
         """What holds whenever the process has ended, however it did."""
-        self.check_list(device.todo_list(), list_before, [json.loads(line) for line in calls.read_text().splitlines()])
+        lines = calls.read_text().split("\n")[:-1]  # death may have come in the middle of the last one
+        self.check_list(device.todo_list(), list_before, [json.loads(line) for line in lines])
         now = device.apps()
         for app, (record, content) in now.items():
             known = [apps[app][1] for apps in (self.old_apps, self.new_apps) if app in apps]
