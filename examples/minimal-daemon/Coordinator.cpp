@@ -67,6 +67,7 @@ bool Coordinator::setAppAssetPromise(const std::shared_ptr<platform::RVPromisedT
 
 bool Coordinator::setPlaceholderPromise(const std::shared_ptr<platform::RVPlaceholder>& placeholder, ErrorRef* error) {
   auto ours = std::dynamic_pointer_cast<Placeholder>(placeholder);
+  auto changing = _service.changing();
   {
     std::lock_guard lock(_mutex);
     bool isGood = ours && ours->app == app && !ours->isCancelled() && !_placeholder;

@@ -91,6 +91,7 @@ void InstallService::packageBegan(const std::shared_ptr<Coordinator>& coordinato
 }
 
 void InstallService::packageArrived(const std::shared_ptr<Coordinator>& coordinator) {
+  auto lock = changing();
   if (auto known = _registry.find(coordinator->app)) {
     OBApplicationProxy shown = *known;
     shown.installProgressSync = platform::OBInstallProgress{active, installing};
@@ -129,17 +130,20 @@ ErrorRef InstallService::unpack(Coordinator& coordinator) {
 }
 
 void InstallService::install(const std::shared_ptr<Coordinator>& coordinator) {
-  {
-    std::lock_guard lock(_mutex);
-    auto open = _open.find(coordinator->app);
-    if (open == _open.end() || open->second != coordinator) return;  // cancelled meanwhile
-  }
+  auto lock = changing();
+  if (openCoordinator(coordinator->app) != coordinator) return;  // cancelled meanwhile
   ErrorRef failure = unpack(*coordinator);
   if (!coordinator->end(failure)) return;
   forget(*coordinator);
   if (failure) showNothingOfInstall(coordinator->app);
   _registry.reportInstalls();
   tell(coordinator, [coordinator](Delegate& delegate) { delegate.coordinatorDidCompleteSuccessfully(coordinator); });
+}
+
+std::shared_ptr<Coordinator> InstallService::openCoordinator(std::string_view app) {
+  std::lock_guard lock(_mutex);
+  auto open = _open.find(app);
+  return open == _open.end() ? nullptr : open->second;
 }
 
 void InstallService::forget(const Coordinator& coordinator) {
@@ -159,6 +163,12 @@ void InstallService::showNothingOfInstall(const std::string& app) {
 }
 
 bool InstallService::cancel(const std::shared_ptr<Coordinator>& coordinator, const ErrorRef& reason, Client client) {
+  auto lock = changing();
+  return endByCancelling(coordinator, reason, client);
+}
+
+bool InstallService::endByCancelling(const std::shared_ptr<Coordinator>& coordinator, const ErrorRef& reason,
+                                     Client client) {
   auto failure = reason ? reason : platform::makeError("TinyInstalls", 7, coordinator->app + ": cancelled");
   if (!coordinator->end(failure)) return false;
   forget(*coordinator);
@@ -202,14 +212,9 @@ std::shared_ptr<platform::RVAppInstallCoordinator> InstallService::coordinatorFo
 
 bool InstallService::uninstall(std::string_view id) {
   std::string app(id);
+  auto lock = changing();
   if (!_registry.find(app)) return false;
-  std::shared_ptr<Coordinator> coordinator;
-  {
-    std::lock_guard lock(_mutex);
-    auto open = _open.find(app);
-    if (open != _open.end()) coordinator = open->second;
-  }
-  if (coordinator) cancel(coordinator, nullptr, 0);
+  if (auto coordinator = openCoordinator(app)) endByCancelling(coordinator, nullptr, 0);
   _registry.remove(app);
   _files.removeItem(containerOf(app));
   _installer.note(app);

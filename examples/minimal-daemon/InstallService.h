@@ -23,7 +23,10 @@ class InstallService final : public platform::InstallCoordination {
  public:
   InstallService(EventQueue& queue, MemoryFiles& files, Registry& registry, InstallerService& installer);
 
-  // What coordinators tell.
+  /// Held over a change of an install and of what the registry shows of it, so that the two agree.
+  std::unique_lock<std::mutex> changing() { return std::unique_lock(_changes); }
+
+  // What coordinators tell; of a placeholder while they hold `changing()`.
   void placeholderAttached(const std::shared_ptr<Coordinator>& coordinator, Placeholder& placeholder);
   void packageBegan(const std::shared_ptr<Coordinator>& coordinator);
   void packageArrived(const std::shared_ptr<Coordinator>& coordinator);
@@ -63,6 +66,10 @@ class InstallService final : public platform::InstallCoordination {
   void tell(const std::shared_ptr<Coordinator>& coordinator, std::function<void(Delegate&)> callback);
   void install(const std::shared_ptr<Coordinator>& coordinator);
   platform::ErrorRef unpack(Coordinator& coordinator);
+  /// With _changes held.
+  bool endByCancelling(const std::shared_ptr<Coordinator>& coordinator, const platform::ErrorRef& reason,
+                       platform::RVClientIdentifier client);
+  std::shared_ptr<Coordinator> openCoordinator(std::string_view app);
   void forget(const Coordinator& coordinator);
   void showNothingOfInstall(const std::string& app);
   bool uninstall(std::string_view app);
@@ -71,6 +78,7 @@ class InstallService final : public platform::InstallCoordination {
   MemoryFiles& _files;
   Registry& _registry;
   InstallerService& _installer;
+  std::mutex _changes;  // before _mutex
   std::mutex _mutex;
   // Guarded by _mutex.
   std::map<std::string, std::shared_ptr<Coordinator>, std::less<>> _open;
