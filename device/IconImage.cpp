@@ -1,8 +1,11 @@
 #include "device/IconImage.h"
 
+#include <png.h>
+
+#include <cstddef>
 #include <cstdint>
 #include <cstring>
-#include <new>
+#include <vector>
 
 namespace device {
 
@@ -39,13 +42,14 @@ cairo_status_t readBytes(void* source, unsigned char* data, unsigned int length)
   return CAIRO_STATUS_SUCCESS;
 }
 
-cairo_status_t writeBytes(void* target, const unsigned char* data, unsigned int length) {
-  try {
-    static_cast<platform::Bytes*>(target)->append(reinterpret_cast<const char*>(data), length);
-    return CAIRO_STATUS_SUCCESS;
-  } catch (const std::bad_alloc&) {
-    return CAIRO_STATUS_NO_MEMORY;
+/// A pixel as PNG has it: red, green, blue, alpha, the colours not multiplied by the alpha.
+void takeApart(std::uint32_t pixel, unsigned char* out) {
+  const std::uint32_t alpha = pixel >> 24;
+  for (int channel = 0; channel < 3; ++channel) {
+    const std::uint32_t colour = pixel >> (16 - 8 * channel) & 0xff;
+    out[channel] = static_cast<unsigned char>(alpha == 0 ? 0 : (colour * 255 + alpha / 2) / alpha);
   }
+  out[3] = static_cast<unsigned char>(alpha);
 }
 
 void traceRoundedSquare(cairo_t* context, double side) {
@@ -70,10 +74,13 @@ std::shared_ptr<const IconImage> IconImage::fromPNG(platform::BytesView png, int
     Context context(cairo_create(target.get()), &cairo_destroy);
     traceRoundedSquare(context.get(), size);
     cairo_clip(context.get());
-    cairo_scale(context.get(), double(size) / cairo_image_surface_get_width(source.get()),
-                double(size) / cairo_image_surface_get_height(source.get()));
+    const double across = double(size) / cairo_image_surface_get_width(source.get());
+    const double down = double(size) / cairo_image_surface_get_height(source.get());
+    cairo_scale(context.get(), across, down);
     cairo_set_source_surface(context.get(), source.get(), 0, 0);
-    cairo_pattern_set_filter(cairo_get_source(context.get()), CAIRO_FILTER_GOOD);
+    // From half the size on, a pixel and its neighbours are all that counts, which takes a third of the time.
+    const bool needsAll = across < 0.5 || down < 0.5;
+    cairo_pattern_set_filter(cairo_get_source(context.get()), needsAll ? CAIRO_FILTER_GOOD : CAIRO_FILTER_BILINEAR);
     cairo_pattern_set_extend(cairo_get_source(context.get()), CAIRO_EXTEND_PAD);
     cairo_paint(context.get());
     if (cairo_status(context.get()) != CAIRO_STATUS_SUCCESS) return nullptr;
@@ -83,7 +90,30 @@ std::shared_ptr<const IconImage> IconImage::fromPNG(platform::BytesView png, int
 }
 
 bool IconImage::encodePNG(platform::Bytes& out) const {
-  return cairo_surface_write_to_png_stream(_surface.get(), &writeBytes, &out) == CAIRO_STATUS_SUCCESS;
+  cairo_surface_flush(_surface.get());
+  const int side = cairo_image_surface_get_width(_surface.get());
+  const int stride = cairo_image_surface_get_stride(_surface.get());
+  const unsigned char* pixels = cairo_image_surface_get_data(_surface.get());
+  if (!pixels) return false;
+  std::vector<unsigned char> rows(std::size_t{4} * side * side);
+  for (int y = 0; y < side; ++y) {
+    for (int x = 0; x < side; ++x) {
+      std::uint32_t pixel = 0;
+      std::memcpy(&pixel, pixels + std::ptrdiff_t{stride} * y + std::ptrdiff_t{4} * x, 4);
+      takeApart(pixel, &rows[std::size_t{4} * (std::size_t(side) * y + x)]);
+    }
+  }
+  png_image image{};
+  image.version = PNG_IMAGE_VERSION;
+  image.width = image.height = side;
+  image.format = PNG_FORMAT_RGBA;
+  image.flags = PNG_IMAGE_FLAG_FAST;  // several times as fast, and a few percent larger
+  png_alloc_size_t size = PNG_IMAGE_PNG_SIZE_MAX(image);
+  const std::size_t before = out.size();
+  out.resize(before + size);
+  const bool encoded = png_image_write_to_memory(&image, out.data() + before, &size, 0, rows.data(), 0, nullptr);
+  out.resize(before + (encoded ? size : 0));
+  return encoded;
 }
 
 }  // namespace device
