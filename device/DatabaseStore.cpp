@@ -141,6 +141,9 @@ class DatabaseStore final : public Store {
     if (error) {
       int code = _database ? sqlite3_extended_errcode(_database.get()) : SQLITE_NOMEM;
       std::string reason(text.empty() && _database ? sqlite3_errmsg(_database.get()) : text);
+      if (text.empty() && _database && (code & 0xff) == SQLITE_CANTOPEN) {
+        if (int number = sqlite3_system_errno(_database.get())) reason += ": " + textOfErrorNumber(number);
+      }
       *error = platform::makeError("Store", text.empty() ? code : SQLITE_NOTADB, _path + ": " + reason);
     }
     return false;
