@@ -276,6 +276,8 @@ bool InstallEngine::finishStoreInstall(std::string_view id, std::string_view pac
     }
   }
   if (!request.packagePath.empty()) return install(coordinator, request, error);
+  // A placeholder's files need not last; those of an app do.
+  if (app->isPlaceholder && !_containers.sync(app->container, error)) return false;
   std::string abandoned;
   Lock lock(_records.mutex);
   if (coordinator && coordinator->state.ended)

@@ -143,6 +143,14 @@ class PowerLoss : public testing::Test {
     rig.deliver();
   }
 
+  void installByStore(PluginRig& rig) {
+    for (const std::string app : {"com.example.bought", "com.example.tarnwell"}) {
+      rig.device().beginStoreInstall(app, {});
+      EXPECT_TRUE(rig.device().finishStoreInstall(app, "")) << app;
+    }
+    rig.deliver();
+  }
+
   void record(Play play) {
     ErrorRef error;
     auto files = device::openDiskFileTree(_folder + "/fs", &error, _log);
@@ -260,6 +268,8 @@ class PowerLoss : public testing::Test {
 TEST_F(PowerLoss, DuringASyncLosesNothing) { loseEverywhere(&PowerLoss::sync); }
 
 TEST_F(PowerLoss, DuringARestoreLosesNothing) { loseEverywhere(&PowerLoss::restore); }
+
+TEST_F(PowerLoss, DuringAnInstallByTheStoreLosesNothing) { loseEverywhere(&PowerLoss::installByStore); }
 
 }  // namespace
 }  // namespace tests
