@@ -33,6 +33,12 @@ std::optional<platform::Bytes> bytesOfMetadata(const platform::Value& metadata, 
   return bytes ? bytes : plist::writeBinary(metadata, error);
 }
 
+/// What stands for the metadata in the checksum: they may be changed while the app is a placeholder, and as whole as
+/// they were when they can be read.
+std::optional<platform::Bytes> traceOfMetadata(bool isThere) {
+  return isThere ? std::optional<platform::Bytes>("metadata") : std::nullopt;
+}
+
 /// A checksum over contents in their order; FNV-1a.
 class FilesSum {
  public:
@@ -88,9 +94,8 @@ std::optional<std::uint64_t> Containers::writePlaceholder(const std::string& con
   }
   if (!write(directory + '/' + std::string(iconName), icon) && icon) return std::nullopt;
   if (!write(directory + "/Info.plist", plist::writeBinary(info, error))) return std::nullopt;
-  auto metadataBytes = metadata.isAbsent() ? std::nullopt : bytesOfMetadata(metadata, error);
-  if (!write(container + '/' + std::string(storeMetadataName), metadataBytes) && !metadata.isAbsent())
-    return std::nullopt;
+  sum.add(traceOfMetadata(!metadata.isAbsent()));
+  if (!metadata.isAbsent() && !writeMetadata(container, metadata, error)) return std::nullopt;
   return sum.value();
 }
 
@@ -98,7 +103,11 @@ std::uint64_t Containers::placeholderSum(const std::string& container, const std
   FilesSum sum;
   sum.add(_files.readFile(container + '/' + bundle + '/' + std::string(iconName)));
   sum.add(_files.readFile(container + '/' + bundle + "/Info.plist"));
-  sum.add(_files.readFile(container + '/' + std::string(storeMetadataName)));
+  auto metadata = _files.readFile(container + '/' + std::string(storeMetadataName));
+  if (metadata && plist::read(*metadata).isAbsent())
+    sum.add(metadata);  // torn
+  else
+    sum.add(traceOfMetadata(metadata.has_value()));
   return sum.value();
 }
 

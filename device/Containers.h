@@ -28,6 +28,7 @@ class Containers {
   /// Fills a fresh container with a placeholder's bundle. `iconPath` is copied as the bundle's icon and `info` names it
   /// then; an icon that cannot be read is left out. Absent metadata: no metadata file. Nothing is flushed: what a loss
   /// of power takes of a placeholder, the next sync brings again. Answers a checksum of the files, nothing on failure.
+  /// Metadata that are changed later do not change it.
   std::optional<std::uint64_t> writePlaceholder(const std::string& container, const std::string& bundle,
                                                 platform::Value info, const std::optional<std::string>& iconPath,
                                                 const platform::Value& metadata, platform::ErrorRef* error = nullptr);

@@ -138,7 +138,7 @@ Value valueOfApp(const AppRecord& app) {
   setFlag(entries, "launchProhibited", app.launchProhibited);
   setNumber(entries, "installType", app.installType);
   setNumber(entries, "staticUsage", app.staticUsage);
-  setNumber(entries, "filesSum", app.filesSum);
+  setNumber(entries, "placeholderSum", app.filesSum);
   setNumber(entries, "homeOrder", app.homeOrder);
   if (app.progress) {
     auto progress = Value::makeDictionary();
@@ -166,7 +166,7 @@ std::optional<AppRecord> appOfValue(const std::string& id, const Value& value) {
   app.launchProhibited = flag(*entries, "launchProhibited");
   app.installType = number(*entries, "installType");
   app.staticUsage = number(*entries, "staticUsage");
-  app.filesSum = number(*entries, "filesSum");
+  app.filesSum = number(*entries, "placeholderSum");
   app.homeOrder = number(*entries, "homeOrder");
   if (const auto* progress = (*entries)["progress"].dictionary()) {
     app.progress = InstallProgressRecord{number(*progress, "state"), number(*progress, "phase"),

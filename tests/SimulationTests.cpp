@@ -162,6 +162,7 @@ RestoreScenario randomRestore(Dice& dice, std::size_t count) {
     app.hasRights = !dice.oneIn(3);
     app.neverReported = dice.oneIn(10);
     if (dice.oneIn(2)) app.metadata.emplace_back("title", "Title of " + app.id);
+    if (dice.oneIn(3)) app.metadata.emplace_back("is-auto-download", true);
     ids.push_back(app.id);
     scenario.apps.push_back(std::move(app));
   }
@@ -296,9 +297,10 @@ class Life {
     if (_dice.oneIn(8)) {
       _rig.daemon().clearSyncData();
       _rig.deliver();
-      look();
       _world.clearSyncData();
     }
+    if (_dice.oneIn(4)) _rig.daemon().prepareForBackup();
+    look();
     std::size_t how = _dice.below(4);
     if (how < 2) return;  // the same object
     letObjectGo([&] { how == 2 ? _rig.unload() : _rig.reopen(); });
