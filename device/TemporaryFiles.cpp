@@ -15,10 +15,10 @@ std::size_t removeTemporaryFiles(FileTree& files) {
     if (!entries) continue;
     for (const auto& entry : *entries) {
       std::string path = directory + '/' + entry.name;
-      if (entry.isDirectory)
-        directories.push_back(std::move(path));
-      else if (entry.name.compare(0, temporaryFilePrefix.size(), temporaryFilePrefix) == 0)
+      if (entry.name.compare(0, temporaryFilePrefix.size(), temporaryFilePrefix) == 0)
         removed += files.removeItem(path);
+      else if (entry.isDirectory)
+        directories.push_back(std::move(path));
     }
   }
   return removed;

@@ -40,6 +40,14 @@ void DeviceSession::settle() {
   _device->events().drain();
   platform::ErrorRef error;
   if (!_device->flush(&error)) throw CommandError("not everything could be stored: " + textOf(error));
+  std::lock_guard lock(_mutex);
+  if (!_complaint.empty()) throw CommandError("not everything could be done: " + _complaint);
+}
+
+void DeviceSession::complain(const std::string& text) {
+  _context.console.message(text);
+  std::lock_guard lock(_mutex);
+  if (_complaint.empty()) _complaint = text;
 }
 
 device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
@@ -49,7 +57,7 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
   options.changed = setup.changed;
   options.rules = _context.options.rules;
   options.fileFailed = [this](std::string_view operation, std::string_view path, std::string_view reason) {
-    _context.console.message(std::string(path) + ": " + std::string(operation) + " failed: " + std::string(reason));
+    complain(std::string(path) + ": " + std::string(operation) + " failed: " + std::string(reason));
   };
   KeptRun* kept = setup.use == DeviceUse::kept ? &*_context.kept : nullptr;
   if (_log || kept) {

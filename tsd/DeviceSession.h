@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <string>
 
@@ -51,12 +52,14 @@ class DeviceSession {
   /// Lets the plug-in's object go, and everything run that was posted for it.
   void unloadPlugin();
   /// Everything that was posted runs, and what the device has in memory only is stored. Throws a `CommandError` when
-  /// the store refuses.
+  /// the store refuses, or a file operation has failed, which the plug-in may have passed over in silence.
   void settle();
 
  private:
   platform::TSClient& makeClient(const platform::Platform& platform);
   device::DeviceOptions deviceOptions(const Setup& setup);
+  /// From any thread.
+  void complain(const std::string& text);
 
   const CommandContext& _context;
   std::optional<PluginLoader> _loader;
@@ -68,6 +71,8 @@ class DeviceSession {
   std::optional<CountdownClock> _clock;
   std::optional<platform::Platform> _platform;  // the device's with that clock
   std::shared_ptr<platform::TSClient> _client;
+  std::mutex _mutex;
+  std::string _complaint;  // the first one; guarded by _mutex
 };
 
 }  // namespace tsd
