@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
-"""Kills `tsd`, or makes the disk fail, at every single step of a sync and a restore, and looks at what is left.
+"""Kills `tsd`, or makes the disk fail, at every single step of a command, and looks at what is left.
 
-usage: kill_sweep.py TSD kill|error|full [--every N] [--second N] [--only sync|restore]
+usage: kill_sweep.py TSD kill|error|full [--every N] [--second N] [--only COMMAND]
 
 kill   The process dies before and after each step, and again in the recovery (--second N: at every N-th step of it).
 error  Each step fails, once and from then on: no space, input/output error, permission denied, a short write.
@@ -121,26 +121,27 @@ class Program:
         return run
 
 
-class Part:
-    """A command that is tried: on a device that has had an earlier sync, and two apps besides."""
+class Command:
+    """A command that is tried: on a device that has had an earlier sync, and a few apps besides."""
 
-    def __init__(self, tsd, name, host):
-        self.tsd, self.name, self.host = tsd, name, host
-        self.folder = tsd.folder / name
-        self.before = Device(tsd.folder / "base")
+    def __init__(self, tsd, base, name, *arguments, host=None):
+        self.tsd, self.name, self.arguments = tsd, name, arguments
+        self.host = host and tsd.folder / host
+        self.folder = tsd.folder / "commands" / name
+        self.before = Device(tsd.folder / base)
         self.old_apps, self.old_list = self.before.apps(), self.before.todo_list()
         clean = self.before.copy_to(self.folder / "clean")
-        self.code = self.command(clean, codes=(DONE, SOME_FAILED)).returncode
+        self.code = self.run(clean, codes=(DONE, SOME_FAILED)).returncode
         self.new_apps, self.after = clean.apps(), clean.picture(tsd)
-        self.host_list = plistlib.loads((host / "ApplicationsSync.plist").read_bytes())
         self.bystanders = self.others()
 
-    def command(self, device, *more, codes):
-        return self.tsd.run(self.name, device.folder, self.host, "--progress", "none", *more, codes=codes)
+    def run(self, device, *more, codes):
+        arguments = [self.host, "--progress", "none"] if self.host else self.arguments
+        return self.tsd.run(self.name, device.folder, *arguments, *more, codes=codes)
 
     def others(self):
         """Everything that no run has any business with."""
-        return [tree_of(self.tsd.folder / "canary"), tree_of(self.host)]
+        return [tree_of(self.tsd.folder / folder) for folder in ("canary", "host", "restored")]
 
     def steps(self):
         """How many steps a run takes."""
@@ -150,19 +151,20 @@ class Part:
         while high - low > 1:
             middle = (low + high) // 2
             low, high = (middle, high) if self.kill(middle) else (low, middle)
-        require(low > 20, f"a {self.name} of only {low} steps")
+        require(low > 5, f"a {self.name} of only {low} steps")
         return low
 
     def kill(self, step):
         device = self.before.copy_to(self.folder / "count")
-        run = self.command(device, "--inject", f"step@{step}=kill", codes=(KILLED, self.code))
+        run = self.run(device, "--inject", f"step@{step}=kill", codes=(KILLED, self.code))
         shutil.rmtree(device.folder)
         return run.returncode == KILLED
 
     def check_disk(self, device, list_before, calls):
         """What holds whenever the process has ended, however it did."""
         lines = calls.read_text().split("\n")[:-1]  # death may have come in the middle of the last one
-        self.check_list(device.todo_list(), list_before, [json.loads(line) for line in lines])
+        if self.host:
+            self.check_list(device.todo_list(), list_before, [json.loads(line) for line in lines])
         now = device.apps()
         for app, (record, content) in now.items():
             known = [apps[app][1] for apps in (self.old_apps, self.new_apps) if app in apps]
@@ -190,7 +192,8 @@ class Part:
         if todo is None:
             return require(begun and not taken, "the todo list is gone")
         require(begun, "the todo list has changed")
-        require([entry["identifier"] for entry in todo] == [entry["identifier"] for entry in self.host_list],
+        host_list = plistlib.loads((self.host / "ApplicationsSync.plist").read_bytes())
+        require([entry["identifier"] for entry in todo] == [entry["identifier"] for entry in host_list],
                 "the todo list is none that was written")
         for entry in todo:
             mark = acknowledged.get(entry["identifier"], "install")
@@ -203,7 +206,9 @@ class Part:
                 for name in sorted(now.keys() | after.keys()) if now.get(name) != after.get(name)]
 
     def check_recovered(self, device, excused=lambda picture: picture):
-        self.command(device, codes=(self.code,))
+        # What is done already can be asked for once more of a host only.
+        if self.host or self.differences(device, excused):
+            self.run(device, codes=(self.code,))
         wrong = self.differences(device, excused)
         require(not wrong, "run again, it differs: " + "; ".join(wrong[:3]))
         everything = device.everything()
@@ -215,7 +220,7 @@ class Part:
         calls = self.folder / (device.folder.name + ".calls")
         list_before = device.todo_list()
         injections = [word for rule in rules for word in ("--inject", rule)]
-        run = self.command(device, "--calls", calls, *injections, codes=codes)
+        run = self.run(device, "--calls", calls, *injections, codes=codes)
         self.check_disk(device, list_before, calls)
         calls.unlink()
         return run
@@ -234,7 +239,7 @@ class Part:
         told = any(text in run.stderr + run.stdout for text in texts)
         wrong = self.differences(device)
         require(not wrong or told, f"not a word about {texts}, but {'; '.join(wrong[:3])}")
-        bad = any(line.startswith(("status", "todo")) for line in wrong)
+        bad = any(line.startswith(("status", "todo")) for line in wrong) if self.host else wrong
         require(not bad or run.returncode != DONE, f"all is said to be well, but {'; '.join(wrong[:3])}")
         # An app that comes later stands behind the others. A placeholder that lacks the icon is kept as it is.
         iconless = re.findall(r"/([^/]+)\.app/Icon\.png: createFile failed", run.stderr)
@@ -312,7 +317,8 @@ class Part:
 
 
 def make_base(tsd):
-    """A device with an app to be updated, one to be removed and one of an earlier sync; what the host wants next."""
+    """A device with an app to be updated, one to be removed and one of an earlier sync; what the host wants next. And
+    what has become of it after a restore, with an install of the store's under way."""
     tsd.run("sample", "earlier", "--apps", 1, "--seed", 7, "--package-size", 20000)
     tsd.run("sample", "host", "--demo", "--apps", 5, "--package-size", 20000)
     tsd.run("sample", "restored", "--apps", 3, "--seed", 3, "--package-size", 1000)
@@ -321,6 +327,9 @@ def make_base(tsd):
         tsd.run("store", "base", package.stem)
         tsd.run("store", "base", package.stem, "--finish", "--package", package)
     tsd.run("sync", "base", "earlier", "--progress", "none")
+    shutil.copytree(tsd.folder / "base", tsd.folder / "later")
+    tsd.run("restore", "later", "restored", "--progress", "none")
+    tsd.run("store", "later", "com.example.bought")
     (tsd.folder / "canary/var/mobile").mkdir(parents=True)
     (tsd.folder / "canary/var/mobile/sings").write_text("while nobody touches it")
 
@@ -331,14 +340,19 @@ def main():
     options.add_argument("mode", choices=["kill", "error", "full"])
     options.add_argument("--every", type=int, default=1, metavar="N", help="only every N-th step")
     options.add_argument("--second", type=int, default=50, metavar="N", help="a second kill at every N-th step")
-    options.add_argument("--only", choices=["sync", "restore"])
+    options.add_argument("--only", choices=["sync", "restore", "store", "uninstall", "backup", "clear"])
     chosen = options.parse_args()
     with tempfile.TemporaryDirectory() as folder:
         tsd = Program(os.path.abspath(chosen.program), pathlib.Path(folder))
         make_base(tsd)
-        parts = [Part(tsd, name, tsd.folder / host) for name, host in (("sync", "host"), ("restore", "restored"))
-                 if chosen.only in (None, name)]
-        good = [part.sweep(chosen.mode, chosen.every, chosen.second) for part in parts]
+        commands = [Command(tsd, "base", "sync", host="host"),
+                    Command(tsd, "base", "restore", host="restored"),
+                    Command(tsd, "later", "store", "com.example.bought", "--finish"),
+                    Command(tsd, "later", "uninstall", "com.example.quillwick"),
+                    Command(tsd, "later", "backup"),
+                    Command(tsd, "later", "clear")]
+        good = [command.sweep(chosen.mode, chosen.every, chosen.second) for command in commands
+                if chosen.only in (None, command.name)]
     return 0 if all(good) else 1
 
 
