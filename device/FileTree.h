@@ -67,8 +67,8 @@ class FileTree : public platform::FileSystem {
   virtual bool syncItem(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
 };
 
-/// The prefix of the names of temporary files that `writeAtomically` makes; leftovers are removed when a device is
-/// opened.
+/// The prefix of the names that `writeAtomically` and the removal of a directory use on the way; leftovers are removed
+/// when a device is opened.
 constexpr std::string_view temporaryFilePrefix = ".applicationsync-";
 
 /// Below `root`, an existing folder of the host. Null with an error when it cannot be opened. `watch`, if there is one,

@@ -217,11 +217,12 @@ TEST_P(FileTrees, keepAnOpenFileAsItWasOpened) {
   EXPECT_EQ(reader->read(4), "");
 }
 
-TEST_P(FileTrees, loseTheTemporaryFilesOfAnInterruptedWrite) {
+TEST_P(FileTrees, loseWhatAnInterruptedOperationLeft) {
   auto whole = picture(*_files);
   for (std::string directory : {"", "/d", "/d/s"})
     _files->createFile(directory + "/" + std::string(temporaryFilePrefix) + "1-1", "half", {});
-  EXPECT_EQ(removeTemporaryFiles(*_files), 3u);
+  _files->createDirectory("/d/" + std::string(temporaryFilePrefix) + "1-2/s", true, {});
+  EXPECT_EQ(removeTemporaryFiles(*_files), 4u);
   EXPECT_EQ(picture(*_files), whole);
 }
 
