@@ -58,16 +58,16 @@ debug: packages ## a build for a debugger
 sweep: build-all ## every call of every scenario failed once, all of them
 	@cd build/release && APPSYNC_SWEEP=all bin/plugin_tests --gtest_filter='*Sweep*' --gtest_brief=1
 
-kill-sweep: build ## tsd killed before and after every step of a sync and a restore, and again in the recovery
+kill-sweep: build ## tsd killed before and after every step of what it does to a device, and again in the recovery
 	@python3 tests/kill_sweep.py build/release/bin/tsd kill
 
-error-sweep: build ## every step of a sync and a restore failed in every way, once and for ever
+error-sweep: build ## every step of what tsd does to a device failed in every way, once and for ever
 	@python3 tests/kill_sweep.py build/release/bin/tsd error
 
-full-disk: build ## a sync and a restore on disks that really are full, page by page; needs the right to mount
+full-disk: build ## the same on disks that really are full, page by page; needs the right to mount them
 	@python3 tests/kill_sweep.py build/release/bin/tsd full
 
-power-loss: build-all ## power lost after every step of a sync and a restore
+power-loss: build-all ## power lost after every step of a sync, a restore and an install by the store
 	@cd build/release && APPSYNC_POWER_LOSS=all bin/power_loss_tests --gtest_brief=1
 
 simulate: build-all ## random lives of a device against the model: make simulate SEEDS=10000

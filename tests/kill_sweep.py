@@ -228,8 +228,9 @@ class Command:
     def try_kill(self, device, first, second=None):
         """Answers how often the process died."""
         kills = 0
+        codes = (KILLED, self.code) if self.host else (KILLED, DONE, FAILED)  # what is done already may be refused
         for rule in (first, second) if second else (first,):
-            kills += self.interrupt(device, [rule], (KILLED, self.code)).returncode == KILLED
+            kills += self.interrupt(device, [rule], codes).returncode == KILLED
         self.check_recovered(device)
         return kills
 
