@@ -63,6 +63,8 @@ struct AppStatus {
   double progress = 0;      // 0…1 of a running install
   std::string lastOutcome;  // "", "INSTALLED", "FAILED", "CANCELED"
   std::string lastReason;   // text of the failure, if any
+
+  bool operator==(const AppStatus&) const = default;
 };
 struct CoordinatorStatus {
   std::string app;
@@ -72,6 +74,8 @@ struct CoordinatorStatus {
   bool promisesPackage = false;     // somebody is to deliver the package
   std::uint64_t packageClient = 0;  // who, where that is not the coordinator's own client; else 0
   double fraction = 0;              // of the package that has come
+
+  bool operator==(const CoordinatorStatus&) const = default;
 };
 /// The canonical state of a device: the same for two devices that differ only in container names.
 struct DeviceStatus {
@@ -82,6 +86,8 @@ struct DeviceStatus {
   /// in `home` alone.
   std::vector<std::vector<std::string>> pages;
   std::uint64_t syncing = 0;  // state of the home screen's sync notification
+
+  bool operator==(const DeviceStatus&) const = default;
 };
 
 /// What the owner of a device chooses when it is opened.

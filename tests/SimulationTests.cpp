@@ -303,7 +303,9 @@ class Life {
     look();
     std::size_t how = _dice.below(4);
     if (how < 2) return;  // the same object
+    auto before = _rig.device().status();
     letObjectGo([&] { how == 2 ? _rig.unload() : _rig.reopen(); });
+    EXPECT_TRUE(_rig.device().status() == before) << "the device is another one when it is opened again";
     if (how == 2) _rig.load();
     _world.startAnew();
   }
