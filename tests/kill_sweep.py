@@ -129,7 +129,7 @@ class Command:
         self.host = host and tsd.folder / host
         self.folder = tsd.folder / "commands" / name
         self.before = Device(tsd.folder / base)
-        self.old_apps, self.old_list = self.before.apps(), self.before.todo_list()
+        self.old_apps = self.before.apps()
         clean = self.before.copy_to(self.folder / "clean")
         self.code = self.run(clean, codes=(DONE, SOME_FAILED)).returncode
         self.new_apps, self.after = clean.apps(), clean.picture(tsd)
