@@ -78,7 +78,9 @@ bool isDeviceStore(Store& store, ErrorRef* error) {
     if (record.key == "version" && record.value.unsignedInteger() == storeVersion) return true;
     return fail(error, localDeviceError(LocalDeviceError::notADevice, "the device is one of another version"));
   }
-  return fail(error, localDeviceError(LocalDeviceError::notADevice, "the store is none of a device"));
+  bool isEmpty = store.load().empty();
+  return fail(error, localDeviceError(LocalDeviceError::notADevice,
+                                      isEmpty ? "the device was never finished" : "the store is none of a device"));
 }
 
 /// The parts of a device in the order in which they stand on each other.
@@ -285,14 +287,42 @@ std::unique_ptr<LocalDevice> LocalDevice::open(std::unique_ptr<FileTree> files, 
   return device;
 }
 
+/// The record comes last: without it nothing is a device.
+static bool fillDeviceParts(FileTree& files, Store& store, ErrorRef* error) {
+  return makeDirectories(files, error) && syncDirectories(files, error) &&
+         store.commit({{"device", "version", storeVersion}}, error);
+}
+
 bool makeDeviceParts(FileTree& files, Store& store, ErrorRef* error) {
   setError(error, nullptr);
   auto items = files.list("/", error);
   if (!items) return false;
   if (!items->empty() || !store.load().empty())
     return fail(error, localDeviceError(LocalDeviceError::notEmpty, "what is to become a device is not empty"));
-  return makeDirectories(files, error) && syncDirectories(files, error) &&
-         store.commit({{"device", "version", storeVersion}}, error);
+  return fillDeviceParts(files, store, error);
+}
+
+/// Whether a folder holds no more than a `createDevice` that did not come to its end: directories, and a store without
+/// a record. It is only read.
+static bool isUnfinished(const std::string& folder) {
+  namespace fs = std::filesystem;
+  const std::string database = folder + databaseName;
+  std::error_code failure;
+  for (fs::directory_iterator entry(folder, failure), end; !failure && entry != end; entry.increment(failure)) {
+    const std::string name = entry->path().filename().string();
+    const std::string path = folder + '/' + name;
+    bool isOurs = path == folder + treeName || path.compare(0, database.size(), database) == 0;
+    if (!isOurs && name != lockName) return false;
+  }
+  fs::recursive_directory_iterator entry(folder + treeName, failure), end;
+  for (; !failure && entry != end; entry.increment(failure)) {
+    if (!entry->is_directory() || entry->is_symlink()) return false;
+  }
+  if (failure) return false;
+  // A journal like this one is there only until the store's file has been made.
+  if (!fs::exists(database, failure) || fs::exists(database + "-journal", failure)) return true;
+  auto store = copyDatabaseStore(database);
+  return store && store->load().empty();
 }
 
 bool createDevice(const std::string& folder, ErrorRef* error) {
@@ -308,13 +338,13 @@ bool createDevice(const std::string& folder, ErrorRef* error) {
     if (!fs::is_directory(folder, failure)) return refuse(LocalDeviceError::notEmpty, "not a folder");
     bool isEmpty = fs::is_empty(folder, failure);
     if (failure) return refuse(LocalDeviceError::failed, failure.message());
-    if (!isEmpty) return refuse(LocalDeviceError::notEmpty, "the folder is not empty");
+    if (!isEmpty && !isUnfinished(folder)) return refuse(LocalDeviceError::notEmpty, "the folder is not empty");
   }
   fs::create_directories(folder + treeName, failure);
   if (failure) return refuse(LocalDeviceError::failed, failure.message());
   auto files = openDiskFileTree(folder + treeName, error);
   auto store = files ? openDatabaseStore(folder + databaseName, error) : nullptr;
-  return store && makeDeviceParts(*files, *store, error);
+  return store && fillDeviceParts(*files, *store, error);
 }
 
 /// False with an error that says what is there instead.

@@ -161,7 +161,11 @@ class LocalDevice {
 /// Makes an empty tree and an empty store those of an empty device.
 bool makeDeviceParts(FileTree& files, Store& store, platform::ErrorRef* error = nullptr);
 
-/// A device on a folder: `fs/` and `device.db`. `create` makes an empty one in a folder that is not there or is empty.
+/// A file in a device's folder that is its users', to keep it to one process at a time.
+constexpr std::string_view lockName = "lock";
+
+/// A device on a folder: `fs/` and `device.db`. `create` makes an empty one in a folder that is not there, or is empty,
+/// or holds what an earlier `create` left that did not come to its end.
 bool createDevice(const std::string& folder, platform::ErrorRef* error = nullptr);
 std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_ptr<EventQueue> events,
                                         DeviceOptions options, platform::ErrorRef* error = nullptr);

@@ -10,6 +10,7 @@
 #include <fstream>
 #include <iterator>
 
+#include "device/LocalDevice.h"
 #include "tsd/CommandError.h"
 #include "tsd/Console.h"
 
@@ -52,7 +53,7 @@ std::string contentOf(int descriptor) {
 
 DeviceLock::DeviceLock(const std::string& folder, Use use) : _use(use) {
   checkIsDevice(folder);
-  std::string path = folder + "/lock";
+  std::string path = folder + "/" + std::string(device::lockName);
   bool changes = use == Use::change;
   _descriptor = ::open(path.c_str(), (changes ? O_RDWR | O_CREAT : O_RDONLY) | O_CLOEXEC | O_NOFOLLOW, 0644);
   if (_descriptor < 0 && !changes && errno == ENOENT) return;
