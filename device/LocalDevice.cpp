@@ -312,11 +312,11 @@ static bool isUnfinished(const std::string& folder) {
     const std::string name = entry->path().filename().string();
     const std::string path = folder + '/' + name;
     bool isOurs = path == folder + treeName || path.compare(0, database.size(), database) == 0;
-    if (!isOurs && name != lockName) return false;
+    if ((!isOurs && name != lockName) || entry->is_symlink(failure)) return false;
   }
   fs::recursive_directory_iterator entry(folder + treeName, failure), end;
   for (; !failure && entry != end; entry.increment(failure)) {
-    if (!entry->is_directory() || entry->is_symlink()) return false;
+    if (entry->symlink_status(failure).type() != fs::file_type::directory) return false;
   }
   if (failure) return false;
   // A journal like this one is there only until the store's file has been made.

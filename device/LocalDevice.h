@@ -154,7 +154,7 @@ class LocalDevice {
   virtual bool installFromPackage(std::string_view packagePath, platform::ErrorRef* error = nullptr) = 0;
 
   /// Stores what is in memory only: how far transfers have come, and the state of notifications where the store refused
-  /// it before. False with an error when it refuses still. A device that goes does the same, silently.
+  /// it before. False with an error when it refuses still. A device that goes does the same.
   virtual bool flush(platform::ErrorRef* error = nullptr) = 0;
 };
 

@@ -67,12 +67,12 @@ class DeviceSession {
   std::optional<LineFile> _log;
   std::optional<LineFile> _calls;
   std::optional<TraceFile> _trace;
+  std::mutex _mutex;
+  std::string _complaint;  // the first one; guarded by _mutex. Outlives the device, which may have one as it goes
   std::unique_ptr<device::LocalDevice> _device;
   std::optional<CountdownClock> _clock;
   std::optional<platform::Platform> _platform;  // the device's with that clock
   std::shared_ptr<platform::TSClient> _client;
-  std::mutex _mutex;
-  std::string _complaint;  // the first one; guarded by _mutex
 };
 
 }  // namespace tsd

@@ -109,7 +109,7 @@ class Restore {
   Value document(ExitCode code) const;
   std::string text(ExitCode code) const;
   std::vector<std::string> missing() const;
-  std::string problem() const;  // what a person is to be told, if anything
+  std::string problem() const;  // the gravest one; empty: none
   bool restoresApps() const { return _options.type == 2 || _options.type == 3; }
 
   const CommandContext& _context;
@@ -142,7 +142,9 @@ ExitCode Restore::run() {
   }
   stop.letFinish();
   ExitCode result = code(stop.requested());
-  if (auto text = problem(); !text.empty()) _context.console.message(text);
+  if (!_list.problem.empty()) _context.console.message(_list.problem);
+  if (_declined) _context.console.message("the backup service declined: " + textOf(_declined));
+  if (_unstored) _context.console.message("not everything could be stored: " + textOf(_unstored));
   if (_context.options.json)
     writeDocument(document(result));
   else
