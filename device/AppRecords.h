@@ -146,7 +146,7 @@ class AppRecords {
   bool write(ChangeSet&& changes, platform::ErrorRef* error = nullptr) REQUIRES(mutex);
   /// In memory at once, in the store with the next commit: what may be lost with the process.
   void commitLater(ChangeSet&& changes) REQUIRES(mutex);
-  /// Writes what `commitLater` kept back.
+  /// Writes what `commitLater` kept back. False with an error when the store refuses; it is kept back then as before.
   bool flush(platform::ErrorRef* error = nullptr) EXCLUDES(mutex);
   /// How far a transfer has come. In memory only; goes to the store with the app's next change.
   void setFraction(std::string_view app, double fraction) REQUIRES(mutex);

@@ -78,7 +78,7 @@ std::shared_ptr<const IconImage> IconImage::fromPNG(platform::BytesView png, int
     const double down = double(size) / cairo_image_surface_get_height(source.get());
     cairo_scale(context.get(), across, down);
     cairo_set_source_surface(context.get(), source.get(), 0, 0);
-    // From half the size on, a pixel and its neighbours are all that counts, which takes a third of the time.
+    // From half the size on, a pixel and its neighbours are all that counts, which takes a quarter of the time.
     const bool needsAll = across < 0.5 || down < 0.5;
     cairo_pattern_set_filter(cairo_get_source(context.get()), needsAll ? CAIRO_FILTER_GOOD : CAIRO_FILTER_BILINEAR);
     cairo_pattern_set_extend(cairo_get_source(context.get()), CAIRO_EXTEND_PAD);
