@@ -3,10 +3,11 @@
 
 .DEFAULT_GOAL := help
 .PHONY: help build build-all demo test check asan tsan tsan-clang clang debug sweep kill-sweep error-sweep full-disk \
-        power-loss simulate mutants fuzz bench deb format clean packages check-packages fuzz-packages deb-packages
+        power-loss simulate mutants fuzz bench deb interface format clean packages check-packages fuzz-packages deb-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
 SEEDS ?=
+unexport SEEDS
 PROCESSORS := $(shell nproc 2>/dev/null || echo 2)
 CTEST := ctest --output-on-failure --no-tests=error --timeout 1800 -j $(PROCESSORS)
 WITH_SEEDS = $(if $(SEEDS),APPSYNC_SEEDS=$(SEEDS))
@@ -30,11 +31,12 @@ demo: build ## a whole life of a device, from the first sync to a restore, in a 
 test: build-all ## all tests (SEEDS=N: that many random scenarios)
 	@cd build/release && $(WITH_SEEDS) $(CTEST)
 
-check: check-packages ## format, sizes, includes, spelling, documents, clang-tidy, clang's thread-safety analysis
+check: check-packages ## format, sizes, includes, spelling, documents, interface, clang-tidy, thread safety, state
 	@mkdir -p build
 	@cmake --preset clang >build/clang.configured
 	@.ci/check build/clang
 	@cmake --build --preset clang
+	@python3 tests/library_state.py build/clang/*/libapplicationsync-*.a build/clang/bin/libApplicationSync.so
 
 asan: packages ## all tests with the address and undefined-behaviour sanitizers
 	@$(call PRESET,asan)
@@ -73,8 +75,10 @@ power-loss: build-all ## power lost after every step of a sync, a restore and an
 simulate: build-all ## random lives of a device against the model: make simulate SEEDS=10000
 	@.ci/simulate build/release $(or $(SEEDS),10000)
 
-mutants: packages ## faults planted in a copy of the sources, each of which the tests have to find
+mutants: packages ## faults planted in a copy of the sources, for the tests to find: COUNT=100 SEED=1 AREA=plugin
 	@python3 tests/mutants.py build/mutants
+	@python3 tests/random_mutants.py build/mutants --area $(or $(AREA),plugin) --count $(or $(COUNT),100) \
+	  --seed $(or $(SEED),1)
 
 fuzz: fuzz-packages ## looks for inputs that break something: make fuzz RUNS=1000000 TARGETS=xml_list
 	@$(call PRESET,fuzz,$(addprefix fuzz_,$(or $(TARGETS),$(notdir $(wildcard fuzz/seeds/*)))))
@@ -88,6 +92,9 @@ deb: deb-packages ## Debian packages of the plug-in, its headers and the program
 	@rm -rf build/package/packages
 	@cd build/package && cpack -B packages >cpack.log || { cat cpack.log; exit 1; }
 	@packaging/check build/package
+
+interface: check-packages ## writes down anew what hosts are compiled against, for a raised pluginInterfaceVersion
+	@.ci/interface write
 
 format: check-packages ## puts every source file into the common format
 	@git ls-files -z '*.h' '*.cpp' | xargs -0 clang-format -i

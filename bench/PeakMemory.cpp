@@ -11,7 +11,7 @@
 #include "bench/Phone.h"
 #include "bench/TemporaryFolder.h"
 #include "bench/TodoList.h"
-#include "core/Paths.h"
+#include "platform/DevicePaths.h"
 #include "plist/PropertyList.h"
 
 namespace bench {
@@ -31,7 +31,7 @@ double memory(const std::string& name) {
   throw std::runtime_error("the kernel does not tell " + name);
 }
 
-std::string listFile(const std::string& folder) { return folder + "/fs" + std::string(appsync::todoListPath); }
+std::string listFile(const std::string& folder) { return folder + "/fs" + std::string(platform::todoListPath); }
 
 /// As the plug-in does it when an app was installed.
 void markEntry(Phone& phone, const std::string& identifier) {
@@ -39,7 +39,7 @@ void markEntry(Phone& phone, const std::string& identifier) {
 }
 
 void addKeys(Phone& phone) {
-  auto path = std::string(appsync::todoListPath);
+  auto path = std::string(platform::todoListPath);
   Value list = plist::read(phone.device().files().readFile(path).value());
   for (std::size_t at = 0; at < list.array()->size(); ++at) list.array()->dictionary(at)->set("state", "asked for");
   phone.write(path, plist::writeBinary(list).value());

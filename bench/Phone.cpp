@@ -6,7 +6,8 @@
 
 #include "bench/TodoList.h"
 #include "core/AppsClient.h"
-#include "core/Paths.h"
+#include "platform/DeviceNames.h"
+#include "platform/DevicePaths.h"
 #include "platform/NotificationCenter.h"
 #include "plist/PropertyList.h"
 
@@ -32,7 +33,7 @@ Phone::~Phone() {
 
 void Phone::start() {
   _plugin = appsync::AppsClient::init(platform());
-  platform().notifications.notify_post(std::string(appsync::startupNotificationName));
+  platform().notifications.notify_post(std::string(platform::startupNotificationName));
   _device->events().drain();
 }
 
@@ -44,17 +45,17 @@ void Phone::write(const std::string& path, const Bytes& content) {
 
 void Phone::stageApps(std::size_t count) {
   const Value list = makeTodoList(count);
-  write(std::string(appsync::todoListPath), plist::writeBinary(list).value());
+  write(std::string(platform::todoListPath), plist::writeBinary(list).value());
   for (const Value& element : *list.array()) {
     const auto& entry = *element.dictionary();
-    std::string folder = std::string(appsync::workArea) + '/' + std::string(*entry["identifier"].string());
+    std::string folder = std::string(platform::workArea) + '/' + std::string(*entry["identifier"].string());
     Value manifest = Value::makeDictionary(), metadata = Value::makeDictionary();
     manifest.dictionary()->set("KBBundleIdentifier", entry["identifier"]);
     manifest.dictionary()->set("KBBundleVersion", entry["version"]);
     manifest.dictionary()->set("KBBundleDisplayName", entry["name"]);
     metadata.dictionary()->set("itemName", entry["name"]);
     write(folder + "/Info.plist", plist::writeBinary(manifest).value());
-    write(folder + '/' + std::string(appsync::storeMetadataFileName), plist::writeBinary(metadata).value());
+    write(folder + '/' + std::string(platform::storeMetadataFileName), plist::writeBinary(metadata).value());
   }
 }
 

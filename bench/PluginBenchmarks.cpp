@@ -5,8 +5,8 @@
 #include "bench/Benchmarks.h"
 #include "bench/Phone.h"
 #include "bench/TodoList.h"
-#include "core/Paths.h"
 #include "core/Say.h"
+#include "platform/DevicePaths.h"
 #include "plist/PropertyList.h"
 
 // What the plug-in and the device in memory cost beside the codec.
@@ -44,7 +44,7 @@ void askManyPhones(benchmark::State& state) {
 void markEntry(benchmark::State& state) {
   Phone phone;
   auto list = makeTodoList(listSize());
-  phone.write(std::string(appsync::todoListPath), plist::writeBinary(list).value());
+  phone.write(std::string(platform::todoListPath), plist::writeBinary(list).value());
   const auto& last = *(*list.array())[listSize() - 1].dictionary();
   auto asset = platform::TSAsset::downloadAssetWithIdentifier(*last["identifier"].string(), "Application", {});
   for (auto _ : state) phone.plugin().assetInstallSucceeded(asset);

@@ -58,7 +58,7 @@ class Bench:
     def host(self, apps, size):
         host = self.folder / f"host-{apps}-{size}"
         if not host.exists():
-            self.run(self.tsd, "sample", host, "--apps", apps, "--package-size", size, "--seed", SEED)
+            self.run(self.tsd, "sample", host, "--apps", apps, "--package-size", size, "--files", 3, "--seed", SEED)
         return host
 
     def device(self):

@@ -13,6 +13,18 @@ namespace {
 thread_local int callsOfThisThread = 0;
 }
 
+Value dictionaryOf(std::size_t keys) {
+  Value value = Value::makeDictionary();
+  auto& entries = *value.dictionary();
+  for (std::size_t number = 0; number < keys; ++number) {
+    const std::string key = "key " + std::to_string(number);
+    if (number % 3 == 0) entries.set(key, "größer");
+    if (number % 3 == 1) entries.set(key, number);
+    if (number % 3 == 2) entries.set(key, dictionaryOf(number % 12));
+  }
+  return value;
+}
+
 InsideCall::InsideCall() { ++callsOfThisThread; }
 InsideCall::~InsideCall() { --callsOfThisThread; }
 bool InsideCall::isOpen() { return callsOfThisThread > 0; }
@@ -87,12 +99,12 @@ CoordinatorRef Fixture::coordinator(Kind kind, const std::string& app) {
 
 std::shared_ptr<platform::RVPlaceholder> Fixture::placeholder(const std::string& app) {
   auto result = coordination().makeAppPlaceholder("Maps", app, 4, 3);
-  auto manifest = Value::makeDictionary();
+  Value manifest = dictionaryOf(40);
   manifest.dictionary()->set("Genre", "Travel");
   auto attributes = coordination().makePlaceholderAttributesWithInfoPlistDictionary(manifest);
   attributes->setBundleVersion("2");
   EXPECT_TRUE(result->setPlaceholderAttributes(attributes));
-  EXPECT_TRUE(result->setMetadata(nullptr));
+  EXPECT_TRUE(result->setMetadata(platform().installer.makeStoreMetadata(dictionaryOf(25))));
   EXPECT_TRUE(result->setConfigurationCompleteWithError());
   return result;
 }

@@ -30,6 +30,9 @@ constexpr auto anyKind = Kind::RVAppInstallCoordinator;
 constexpr auto initiating = Kind::RVInitiatingAppInstallCoordinator;
 constexpr auto updating = Kind::RVUpdatingAppInstallCoordinator;
 
+/// So many keys, of which nobody reads any: strings, numbers and containers.
+Value dictionaryOf(std::size_t keys);
+
 /// What callbacks wrote down, from whichever thread.
 class Notes {
  public:

@@ -1,13 +1,14 @@
 #include "coordination/CoordinatedInstall.h"
 
-#include "coordination/CancellationReason.h"
-#include "coordination/TransactionStep.h"
+#include "core/CancellationReason.h"
+#include "core/Names.h"
 #include "core/PathCheck.h"
-#include "core/Paths.h"
 #include "core/PropertyListFile.h"
 #include "core/Say.h"
+#include "core/TransactionStep.h"
 #include "platform/FileSystem.h"
 #include "platform/Installer.h"
+#include "platform/OBNumbers.h"
 
 namespace appsync {
 
@@ -16,13 +17,15 @@ using namespace platform;
 constexpr std::uint64_t installTargetType = 1;
 
 bool AppsClient::prepareAppForInstallUsingCoordination(const TSAssetRef& asset, bool existingApp) {
-  return CoordinatedInstall(*this, *asset, existingApp).run();
+  return contained(_platform, "prepareAppForInstallUsingCoordination",
+                   [&] { return CoordinatedInstall(*this, *asset, existingApp).run(); });
 }
 
 AppsClient::CoordinatedInstall::CoordinatedInstall(AppsClient& client, const TSAsset& asset, bool existingApp)
     : _client(client),
       _platform(client._platform),
       _existingApp(existingApp),
+      _cancellationReason(cancellationReason(CancellationCode::installPreparationFailed)),
       _bundleIdentifier(asset.identifier()),
       _prettyName(asset.prettyName()),
       _version(stringOf(entryOf(asset.variantOptions(), "Version"))),
@@ -40,12 +43,12 @@ bool AppsClient::CoordinatedInstall::run() {
       "processing app install for bundle '%{public}@', title %{public}@ assetplist %{public}@, version %{public}@ with "
       "install coordination",
       _bundleIdentifier, _prettyName, _manifest, _version);
-  beginStep(_platform.transactionLog, TransactionStep::install, _bundleIdentifier,
-            _existingApp ? "Update app" : "Install App");
-  const bool prepared = prepare();
+  StepScope transaction(_platform, TransactionStep::install, _bundleIdentifier,
+                        _existingApp ? "Update app" : "Install App", "Install app");
+  const bool prepared = contained(_platform, "prepareAppForInstallUsingCoordination", [this] { return prepare(); });
   say(_platform, "processing app install for bundle %{public}@ finished with status %d error %{public}@",
       _bundleIdentifier, prepared, _lastError);
-  endStep(_platform.transactionLog, TransactionStep::install, prepared, _bundleIdentifier, "Install app");
+  transaction.end(prepared);
   if (!prepared) cancel();
   return prepared;
 }
@@ -67,7 +70,9 @@ bool AppsClient::CoordinatedInstall::prepare() {
   _placeholder = _client._placeHolderForBundleIdentifier(_bundleIdentifier, _prettyName.value_or(_bundleIdentifier),
                                                          installType::sync);
   configurePlaceholder(iconSize);
-  return attachPlaceholder();
+  return step([&](ErrorRef* failed) { return _coordinator->setPlaceholderPromise(_placeholder, failed); },
+              "Error %{public}@ adding placeholder promise to coordinator for '%{public}@'",
+              "added placeholder promise to coordinator for %{public}@");
 }
 
 bool AppsClient::CoordinatedInstall::setInstallOptions() {
@@ -82,16 +87,9 @@ bool AppsClient::CoordinatedInstall::setInstallOptions() {
     options->setObInstallType(installType::sync);
     options->setInstallTargetType(installTargetType);
   }
-  ErrorRef error;
-  const bool set = _coordinator->setInstallOptions(options, &error);
-  note(error);
-  if (!set) {
-    sayError(_platform, "Error %{public}@ setting install options on coordinator for '%{public}@'", error,
-             _bundleIdentifier);
-    return false;
-  }
-  say(_platform, "set install options on coordinator for %{public}@", _bundleIdentifier);
-  return true;
+  return step([&](ErrorRef* error) { return _coordinator->setInstallOptions(options, error); },
+              "Error %{public}@ setting install options on coordinator for '%{public}@'",
+              "set install options on coordinator for %{public}@");
 }
 
 bool AppsClient::CoordinatedInstall::setInitialZDRAssetPromises() {
@@ -99,15 +97,9 @@ bool AppsClient::CoordinatedInstall::setInitialZDRAssetPromises() {
     say(_platform, "coordinator for %{public}@ has an ZDR app asset promise", _bundleIdentifier);
     return true;
   }
-  ErrorRef error;
-  const bool set = _coordinator->setInitialZDRAssetPromises({}, &error);
-  note(error);
-  if (!set) {
-    sayError(_platform, "Error %{public}@ setting ZDR asset promise for '%{public}@'", error, _bundleIdentifier);
-    return false;
-  }
-  say(_platform, "set ZDR asset promise to install coordinator for %{public}@", _bundleIdentifier);
-  return true;
+  return step([&](ErrorRef* error) { return _coordinator->setInitialZDRAssetPromises({}, error); },
+              "Error %{public}@ setting ZDR asset promise for '%{public}@'",
+              "set ZDR asset promise to install coordinator for %{public}@");
 }
 
 bool AppsClient::CoordinatedInstall::addAppAssetPromise() {
@@ -126,7 +118,7 @@ std::uint64_t AppsClient::CoordinatedInstall::stageIcon() {
 }
 
 std::uint64_t AppsClient::CoordinatedInstall::copyIcon(const std::string& source) {
-  beginStep(_platform.transactionLog, TransactionStep::copyIcon, _bundleIdentifier, "Copying icon");
+  StepScope transaction(_platform, TransactionStep::copyIcon, _bundleIdentifier, "Copying icon", "Copying icon");
   std::uint64_t size = 0;
   ErrorRef error;
   const bool copied = _platform.fileSystem.copyItem(source, _iconPath, &error);
@@ -142,7 +134,7 @@ std::uint64_t AppsClient::CoordinatedInstall::copyIcon(const std::string& source
   say(_platform, "Copied icon from %{public}@ to %{public}@ with error %{public}@ for '%{public}@', sizeOnDisk:%llu",
       source, _iconPath, error, _bundleIdentifier, size);
   // The step tells that copying was tried; its outcome is in the message.
-  endStep(_platform.transactionLog, TransactionStep::copyIcon, true, _bundleIdentifier, "Copying icon");
+  transaction.end(true);
   return size;
 }
 
@@ -152,7 +144,15 @@ void AppsClient::CoordinatedInstall::configurePlaceholder(std::uint64_t iconSize
       !_client._createIconPromiseForBundleIdentifier(_bundleIdentifier, _iconPath, iconSize, _placeholder, true)) {
     return;
   }
-  if (setAttributes() && setMetadata()) closeConfiguration();
+  if (!setAttributes()) return;
+  if (!step([&](ErrorRef* error) { return _placeholder->setMetadata(_storeMetadata, error); },
+            "Error %{public}@ setting store metadata on placeholder for '%{public}@'",
+            "set store metadata on placeholder for %{public}@")) {
+    return;
+  }
+  step([&](ErrorRef* error) { return _placeholder->setConfigurationCompleteWithError(error); },
+       "Error %{public}@ setting placeholder configuration as complete for '%{public}@'",
+       "set placeholder configuration as complete for %{public}@");
 }
 
 bool AppsClient::CoordinatedInstall::setAttributes() {
@@ -161,66 +161,20 @@ bool AppsClient::CoordinatedInstall::setAttributes() {
     attributes->setLaunchProhibited(_launchProhibited);
     attributes->setBundleVersion(_version);
   }
-  ErrorRef error;
-  const bool set = _placeholder->setPlaceholderAttributes(attributes, &error);
-  note(error);
-  if (!set) {
-    sayError(_platform, "Error %{public}@ setting attributes on placeholder for '%{public}@'", error,
-             _bundleIdentifier);
-    return false;
-  }
-  say(_platform, "set %{public}@ attributes on placeholder for %{public}@", attributes, _bundleIdentifier);
-  return true;
-}
-
-bool AppsClient::CoordinatedInstall::setMetadata() {
-  ErrorRef error;
-  const bool set = _placeholder->setMetadata(_storeMetadata, &error);
-  note(error);
-  if (!set) {
-    sayError(_platform, "Error %{public}@ setting store metadata on placeholder for '%{public}@'", error,
-             _bundleIdentifier);
-    return false;
-  }
-  say(_platform, "set store metadata on placeholder for %{public}@", _bundleIdentifier);
-  return true;
-}
-
-void AppsClient::CoordinatedInstall::closeConfiguration() {
-  ErrorRef error;
-  const bool closed = _placeholder->setConfigurationCompleteWithError(&error);
-  note(error);
-  if (closed) {
-    say(_platform, "set placeholder configuration as complete for %{public}@", _bundleIdentifier);
-  } else {
-    sayError(_platform, "Error %{public}@ setting placeholder configuration as complete for '%{public}@'", error,
-             _bundleIdentifier);
-  }
-}
-
-bool AppsClient::CoordinatedInstall::attachPlaceholder() {
-  ErrorRef error;
-  const bool attached = _coordinator->setPlaceholderPromise(_placeholder, &error);
-  note(error);
-  if (!attached) {
-    sayError(_platform, "Error %{public}@ adding placeholder promise to coordinator for '%{public}@'", error,
-             _bundleIdentifier);
-    _cancelsPlaceholder = true;
-    return false;
-  }
-  say(_platform, "added placeholder promise to coordinator for %{public}@", _bundleIdentifier);
-  return true;
+  return step([&](ErrorRef* error) { return _placeholder->setPlaceholderAttributes(attributes, error); },
+              "Error %{public}@ setting attributes on placeholder for '%{public}@'",
+              "set %{public}@ attributes on placeholder for %{public}@", attributes);
 }
 
 void AppsClient::CoordinatedInstall::cancel() {
-  const ErrorRef reason = cancellationReason(CancellationCode::installPreparationFailed);
-  if (_placeholder && _cancelsPlaceholder) {
+  // A placeholder of a preparation that failed was not attached; the coordinator's end would not reach it.
+  if (_placeholder) {
     say(_platform, "Cancelling placeholder for appBundleIdentifier:%{public}@", _bundleIdentifier);
-    _placeholder->cancelForReason(reason, RVClientSync);
+    contained(_platform, "cancelForReason", [&] { _placeholder->cancelForReason(_cancellationReason, RVClientSync); });
   }
   if (_coordinator) {
     say(_platform, "Cancelling coordinator for appBundleIdentifier:%{public}@", _bundleIdentifier);
-    _coordinator->cancelForReason(reason, RVClientSync);
+    contained(_platform, "cancelForReason", [&] { _coordinator->cancelForReason(_cancellationReason, RVClientSync); });
   }
 }
 

@@ -4,8 +4,11 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
+#include <type_traits>
 
 #include "core/AppsClient.h"
+#include "core/ServiceCall.h"
 
 namespace appsync {
 
@@ -14,7 +17,7 @@ class AppsClient::CoordinatedInstall {
  public:
   CoordinatedInstall(AppsClient& client, const platform::TSAsset& asset, bool existingApp);
 
-  /// Prepares the coordinator, or cancels what was set up.
+  /// Prepares the coordinator, or cancels what was set up. An exception on the way is a failure like any other.
   bool run();
 
  private:
@@ -29,17 +32,24 @@ class AppsClient::CoordinatedInstall {
   /// What fails in here leaves the placeholder as it is then; it is attached all the same.
   void configurePlaceholder(std::uint64_t iconSize);
   bool setAttributes();
-  bool setMetadata();
-  void closeConfiguration();
-  bool attachPlaceholder();
   void cancel();
 
+  /// `callAndTell` about this app; the error is noted.
+  template <class Call, class... Shown>
+  bool step(Call&& call, platform::MessageFormat<ErrorRef, std::string_view> failed,
+            platform::MessageFormat<std::type_identity_t<Shown>..., std::string_view> done, const Shown&... shown) {
+    ErrorRef error;
+    const bool succeeded = callAndTell(_platform, _bundleIdentifier, error, call, failed, done, shown...);
+    note(error);
+    return succeeded;
+  }
   /// Keeps the error that a call answered, if it did, as the last one of this preparation.
   void note(const ErrorRef& error);
 
   AppsClient& _client;
   const Platform& _platform;
   const bool _existingApp;
+  const ErrorRef _cancellationReason;  // made beforehand: what fails for want of memory is to be cancelled too
 
   const std::string _bundleIdentifier;
   const std::optional<std::string> _prettyName;
@@ -53,7 +63,6 @@ class AppsClient::CoordinatedInstall {
   CoordinatorRef _coordinator;
   PlaceholderRef _placeholder;
   std::shared_ptr<platform::CVStoreMetadata> _storeMetadata;
-  bool _cancelsPlaceholder = false;
   ErrorRef _lastError;
 };
 

@@ -1,5 +1,5 @@
-#include "coordination/CancellationReason.h"
 #include "core/AppsClient.h"
+#include "core/CancellationReason.h"
 #include "core/Say.h"
 
 namespace appsync {
@@ -51,13 +51,15 @@ void AppsClient::transferCompleteForApp(const TSAssetRef& asset, const ErrorRef&
 
 void AppsClient::assetSyncFinishedWithStatus(bool status, const StringSet& outstandingItems) {
   for (const auto& identifier : outstandingItems.members()) {
-    // Whoever made the coordinator: the package it waits for will not come.
-    auto coordinator = _platform.installCoordination.coordinatorForAppWithBundleID(
-        RVCoordinatorKind::RVAppInstallCoordinator, identifier, RVClientSync, false);
-    if (!coordinator || status) continue;
-    const ErrorRef reason = cancellationReason(CancellationCode::packageUnavailable);
-    say(_platform, "Cancelling coordinator with error %{public}@ for %{public}@", reason, identifier);
-    coordinator->cancelForReason(reason, RVClientSync);
+    contained(_platform, "assetSyncFinishedWithStatus", [&] {
+      // Whoever made the coordinator: the package it waits for will not come.
+      auto coordinator = _platform.installCoordination.coordinatorForAppWithBundleID(
+          RVCoordinatorKind::RVAppInstallCoordinator, identifier, RVClientSync, false);
+      if (!coordinator || status) return;
+      const ErrorRef reason = cancellationReason(CancellationCode::packageUnavailable);
+      say(_platform, "Cancelling coordinator with error %{public}@ for %{public}@", reason, identifier);
+      coordinator->cancelForReason(reason, RVClientSync);
+    });
   }
 }
 

@@ -1,6 +1,6 @@
-#include "coordination/TransactionStep.h"
 #include "core/AppsClient.h"
 #include "core/Say.h"
+#include "core/TransactionStep.h"
 
 namespace appsync {
 
@@ -8,7 +8,8 @@ using namespace platform;
 
 CoordinatorRef AppsClient::_initiatingOrUpdatingAppInstallCoordinatorForBundleIdentifier(
     std::string_view bundleIdentifier, bool existingApp, bool createIfNotExisting, ErrorRef* error) {
-  beginStep(_platform.transactionLog, TransactionStep::createCoordinator, bundleIdentifier, "Create coordinator");
+  StepScope transaction(_platform, TransactionStep::createCoordinator, bundleIdentifier, "Create coordinator",
+                        "Finished creating coordinator");
   const auto kind = existingApp ? RVCoordinatorKind::RVUpdatingAppInstallCoordinator
                                 : RVCoordinatorKind::RVInitiatingAppInstallCoordinator;
   const char* word = existingApp ? "updating" : "initiating";
@@ -32,8 +33,7 @@ CoordinatorRef AppsClient::_initiatingOrUpdatingAppInstallCoordinatorForBundleId
     }
   }
   setError(error, serviceError);
-  endStep(_platform.transactionLog, TransactionStep::createCoordinator, coordinator != nullptr, bundleIdentifier,
-          "Finished creating coordinator");
+  transaction.end(coordinator != nullptr);
   return coordinator;
 }
 

@@ -1,7 +1,8 @@
 #include "core/AppsClient.h"
-#include "core/Paths.h"
 #include "core/Say.h"
+#include "platform/DeviceNames.h"
 #include "platform/TSDeviceService.h"
+#include "platform/TodoOperation.h"
 
 namespace appsync {
 
@@ -30,9 +31,8 @@ void AppsClient::coordinatorDidCompleteSuccessfully(const CoordinatorRef& coordi
   const auto bundleIdentifier = coordinator->bundleID();
   const ErrorRef error = coordinator->error();
   say(_platform, "coordinatorDidCompleteSuccessfully for %{public}@ with error %{public}@", bundleIdentifier, error);
-  if (!bundleIdentifier) return;
-  changeAssetID(*bundleIdentifier, error ? operation::failed : operation::installed);
-  cleanRestoreStateForIdentifier(*bundleIdentifier);
+  changeAssetID(bundleIdentifier, error ? todo::failed : todo::installed);
+  cleanRestoreStateForIdentifier(bundleIdentifier);
 } catch (...) {
   swallowException(_platform, "coordinatorDidCompleteSuccessfully");
 }
@@ -64,10 +64,10 @@ void AppsClient::coordinatorCanceledWithReason(const CoordinatorRef& coordinator
   const auto bundleIdentifier = coordinator->bundleID();
   if (!bundleIdentifier) return;
   bool alreadyCancelled = false;
-  {
+  contained(_platform, "coordinatorCanceledWithReason", [&] {
     SerialQueue::Block block(_accessQueue);
     alreadyCancelled = !_userCancelledApps.insert(*bundleIdentifier);
-  }
+  });
   {
     SerialQueue::Block block(_restoreQueue);
     if (_stopAwaitingPlaceholder(*bundleIdentifier)) {

@@ -1,7 +1,7 @@
-#include "coordination/CancellationReason.h"
-#include "coordination/TransactionStep.h"
 #include "core/AppsClient.h"
+#include "core/CancellationReason.h"
 #include "core/Say.h"
+#include "core/TransactionStep.h"
 
 namespace appsync {
 
@@ -74,11 +74,11 @@ std::shared_ptr<RVPromisedOutOfBandTransfer> AppsClient::_userDataPromiseForBund
 
 PlaceholderRef AppsClient::_placeHolderForBundleIdentifier(std::string_view bundleIdentifier, std::string_view name,
                                                            std::uint64_t installType) {
-  beginStep(_platform.transactionLog, TransactionStep::createPlaceholder, bundleIdentifier, "Create placeholder");
+  StepScope transaction(_platform, TransactionStep::createPlaceholder, bundleIdentifier, "Create placeholder",
+                        "Finished creating placeholder");
   auto placeholder =
       _platform.installCoordination.makeAppPlaceholder(name, bundleIdentifier, installType, RVClientSync);
-  endStep(_platform.transactionLog, TransactionStep::createPlaceholder, placeholder != nullptr, bundleIdentifier,
-          "Finished creating placeholder");
+  transaction.end(placeholder != nullptr);
   say(_platform, "Created placeholder %{public}@ for '%{public}@' of type %lu", placeholder, bundleIdentifier,
       installType);
   return placeholder;

@@ -140,10 +140,15 @@ class AppsClient final : public platform::TSClient,
 
   /// The array in the property list at the path; absent when there is none.
   static Value _loadPlist(const Platform& platform, std::string_view path, ErrorRef* error = nullptr);
-  /// Sets the operation of the identifier's first entry in the todo list.
-  void changeAssetID(std::string_view identifier, std::string_view toDo) EXCLUDES(_listFilesQueue);
+  /// Sets the operation of the identifier's first entry in the todo list. Without an identifier no entry is meant.
+  void changeAssetID(std::optional<std::string_view> identifier, std::string_view toDo) EXCLUDES(_listFilesQueue);
   /// The items in home-screen order, then the others. Those that the home screen named leave the dictionary.
   static std::vector<std::shared_ptr<const Candidate>> _orderTheItems(const Platform& platform, Candidates& items);
+
+  // ---- Preparation (core/SyncPreparation.cpp) ----
+
+  /// The array of what `installedAssets` answers.
+  Value _deletions() EXCLUDES(_transferStateGuard);
 
   // ---- Reconciliation (core/Reconcile.cpp) ----
 
@@ -154,13 +159,10 @@ class AppsClient final : public platform::TSClient,
 
   // ---- Outstanding transfers (transfer/OutstandingTransfers.cpp) ----
 
-  Candidates _placeholderCandidates();
-  void _addRequests(const Value& todoList, Candidates& idsWeWant, StringSet& requestedIDs);
-  void _removeInProgress(Candidates& idsWeWant);
-  bool _isWanted(const Candidate& candidate, bool installationAllowed, const StringSet& systemAppPlaceholders,
-                 const StringSet& requestedIDs);
-  TSAssetRef _makeAsset(const Candidate& candidate);
-  bool _prepareTransfer(const TSAssetRef& asset);
+  class OutstandingTransfers;
+  /// False when the app counted as one already (did not count as one).
+  bool _addUpdatingApp(std::string_view identifier) EXCLUDES(_accessQueue);
+  bool _removeUpdatingApp(std::string_view identifier) EXCLUDES(_accessQueue);
 
   // ---- Transfer completion, outcomes, restore state (transfer/) ----
 
@@ -170,8 +172,9 @@ class AppsClient final : public platform::TSClient,
   /// The stored value; absent when any level of it is missing.
   Value _restoreStatePropertyForKey(std::string_view key, std::string_view identifier,
                                     const std::optional<std::string>& version);
-  /// Removes the app's records of all versions.
-  void cleanRestoreStateForIdentifier(std::string_view identifier) EXCLUDES(_listFilesQueue);
+  /// Removes the app's records of all versions, and with the last record the file; a file that is no property list goes
+  /// too. Without an identifier no record is meant.
+  void cleanRestoreStateForIdentifier(std::optional<std::string_view> identifier) EXCLUDES(_listFilesQueue);
 
   // ---- AppInstallUsingCoordination ----
   // Acquisition (coordination/CoordinatorAcquisition.cpp)
@@ -200,7 +203,9 @@ class AppsClient final : public platform::TSClient,
   // Preparing an install (coordination/CoordinatedInstall.cpp)
 
   class CoordinatedInstall;
-  /// True when the app's coordinator holds a placeholder promise; otherwise everything was cancelled.
+  /// True when the app's coordinator holds a placeholder promise. Otherwise the plug-in's coordinator for the app, had
+  /// it got one, is cancelled, and so is a placeholder that could not be attached; files in the placeholder's directory
+  /// stay. Throws nothing.
   bool prepareAppForInstallUsingCoordination(const TSAssetRef& asset, bool existingApp);
 
   // Progress, completion, end of the phase (coordination/CoordinatedTransfer.cpp)
@@ -222,6 +227,7 @@ class AppsClient final : public platform::TSClient,
   // ---- Restore from a backup (restore/) ----
 
   bool _processHarluneRestoreInfo();
+  bool _restoreAppsOfFile();
   bool _restoreAppsOfList(const platform::Dictionary& list);
   static Value _loadDemotedAppsPlist(const Platform& platform, std::string_view path, ErrorRef* error = nullptr);
 
@@ -233,6 +239,8 @@ class AppsClient final : public platform::TSClient,
     std::optional<BytesView> sinfData;
     std::optional<BytesView> iconData;
   };
+  /// True when the app is prepared, or was before. Otherwise what was set up is cancelled and the app not awaited.
+  /// Throws nothing.
   bool prepareAppForRestoreUsingCoordination(const RestoreInput& input, std::uint64_t demotionStatus);
   bool _prepareDemotedAppForRestoreWithBundleId(const RestoreInput& input, std::uint64_t demotionStatus);
   bool _prepareNonDemotedAppForRestoreWithBundleId(const RestoreInput& input);
@@ -284,7 +292,9 @@ class AppsClient final : public platform::TSClient,
   /// Written on `_restoreQueue` only; atomic so that a waiter reads a whole number outside it.
   std::atomic<std::int64_t> _restoringPlaceholderCount{0};
 
-  /// Guards the two fields that the daemon's overlapping calls share; held for the field alone.
+  /// False after an `installedAssets` that failed: the apps of the last sync are to be looked through once more.
+  bool _deletionsReported GUARDED_BY(_transferStateGuard) = true;
+  /// Guards the three fields that the daemon's calls share; held for the field alone.
   platform::Mutex _transferStateGuard;
   /// The work area, the todo list in it and the restore state are read, changed and replaced on this queue, so that no
   /// edit is lost and none that began on an old list lands on a new one.

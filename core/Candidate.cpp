@@ -15,7 +15,7 @@ std::string Candidate::describe() const {
   auto text = [&](const char* key, const std::optional<std::string>& value) {
     if (value) fields.set(key, *value);
   };
-  text("KBBundleIdentifier", bundleIdentifier);
+  fields.set("KBBundleIdentifier", bundleIdentifier);
   text("KBBundleVersion", bundleVersion);
   text("Container", container);
   text("Path", path);
@@ -28,17 +28,19 @@ std::string Candidate::describe() const {
 }
 
 void Candidates::set(std::string_view identifier, CandidateRef candidate) {
+  _candidates.insert_or_assign(std::string(identifier), std::move(candidate));
   _order.insert(identifier);
-  _candidates[std::string(identifier)] = std::move(candidate);
 }
 
 CandidateRef Candidates::find(std::string_view identifier) const {
-  auto found = _candidates.find(std::string(identifier));
+  auto found = _candidates.find(identifier);
   return found == _candidates.end() ? nullptr : found->second;
 }
 
 bool Candidates::erase(std::string_view identifier) {
-  _candidates.erase(std::string(identifier));
+  auto found = _candidates.find(identifier);
+  if (found == _candidates.end()) return false;
+  _candidates.erase(found);
   return _order.erase(identifier);
 }
 

@@ -4,16 +4,16 @@
 #include <optional>
 #include <string>
 #include <string_view>
-#include <unordered_map>
 #include <vector>
 
 #include "platform/StringSet.h"
+#include "platform/TextTable.h"
 
 namespace appsync {
 
 /// An app whose package the host may have to send. Immutable once it is made.
 struct Candidate {
-  std::optional<std::string> bundleIdentifier;
+  std::string bundleIdentifier;
   std::optional<std::string> bundleVersion;
   std::optional<std::string> container;  // directory of the store metadata and the artwork
   std::optional<std::string> path;       // directory of the bundle
@@ -44,7 +44,7 @@ class Candidates {
 
  private:
   platform::StringSet _order;
-  std::unordered_map<std::string, CandidateRef> _candidates;
+  platform::TextMap<CandidateRef> _candidates;
 };
 
 }  // namespace appsync

@@ -1,9 +1,10 @@
 #include <new>
 
 #include "core/AppsClient.h"
-#include "core/Paths.h"
+#include "core/Names.h"
 #include "core/Say.h"
 #include "platform/DPProfileConnection.h"
+#include "platform/DeviceNames.h"
 #include "platform/InstallTransactionLog.h"
 #include "platform/Process.h"
 #include "platform/SystemLog.h"

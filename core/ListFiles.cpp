@@ -1,12 +1,11 @@
 #include <cstddef>
-#include <memory>
 #include <utility>
 
 #include "core/AppsClient.h"
 #include "core/Candidate.h"
-#include "core/Paths.h"
 #include "core/PropertyListFile.h"
 #include "core/Say.h"
+#include "platform/DevicePaths.h"
 #include "platform/FileSystem.h"
 #include "platform/HomeScreen.h"
 #include "platform/Process.h"
@@ -17,21 +16,11 @@ namespace appsync {
 using namespace platform;
 
 Value AppsClient::_loadPlist(const Platform& platform, std::string_view path, ErrorRef* error) {
-  auto bytes = platform.fileSystem.readFile(path, error);
-  if (!bytes || bytes->empty()) return {};
-  Value root = platform.propertyLists.propertyListWithData(std::move(*bytes), error);
-  if (root.isAbsent()) {
-    sayError(platform, "couldn't parse todo list");
-    return {};
-  }
-  if (!root.array()) {
-    sayError(platform, "todo list is not an array");
-    return {};
-  }
-  return root;
+  return readList(platform, path, Value::Kind::array, "couldn't parse todo list", "todo list is not an array", error);
 }
 
-static Dictionary* firstEntry(Array& todoList, std::string_view identifier) {
+static Dictionary* firstEntry(Array& todoList, std::optional<std::string_view> identifier) {
+  if (!identifier) return nullptr;
   for (std::size_t i = 0; i < todoList.size(); ++i) {
     Dictionary* entry = todoList.dictionary(i);
     if (entry && (*entry)["identifier"].string() == identifier) return entry;
@@ -39,7 +28,7 @@ static Dictionary* firstEntry(Array& todoList, std::string_view identifier) {
   return nullptr;
 }
 
-void AppsClient::changeAssetID(std::string_view identifier, std::string_view toDo) {
+void AppsClient::changeAssetID(std::optional<std::string_view> identifier, std::string_view toDo) {
   SerialQueue::Block block(_listFilesQueue);
   Value todoList = _loadPlist(_platform, todoListPath);
   if (!todoList.array()) return;
@@ -50,18 +39,30 @@ void AppsClient::changeAssetID(std::string_view identifier, std::string_view toD
   writePropertyList(_platform, todoList, PropertyListFormat::binary, todoListPath);
 }
 
+/// A buffer of the home screen's, given back in the end.
+struct LentBuffer {
+  explicit LentBuffer(const Platform& platform) : platform(platform) {}
+  ~LentBuffer() {
+    if (bytes) contained(platform, "deallocateMemory", [this] { platform.process.deallocateMemory(bytes, length); });
+  }
+  LentBuffer(const LentBuffer&) = delete;
+  LentBuffer& operator=(const LentBuffer&) = delete;
+
+  const Platform& platform;
+  void* bytes = nullptr;
+  std::size_t length = 0;
+};
+
 /// The home screen's order; absent when it has none. Keeps a copy in the sort-order file.
 static Value readIconOrder(const Platform& platform) {
-  void* buffer = nullptr;
-  std::size_t length = 0;
-  platform.homeScreen.PNGetFlattenedIconState(platform.homeScreen.PNSPanelloBlockableServerPort(), 1, &buffer, &length);
-  if (!buffer) {
+  LentBuffer buffer(platform);
+  platform.homeScreen.PNGetFlattenedIconState(platform.homeScreen.PNSPanelloBlockableServerPort(), 1, &buffer.bytes,
+                                              &buffer.length);
+  if (!buffer.bytes) {
     say(platform, "got no icon sort order from PN");
     return {};
   }
-  auto giveBack = [&](void* held) { platform.process.deallocateMemory(held, length); };
-  const std::unique_ptr<void, decltype(giveBack)> held(buffer, giveBack);
-  Bytes data(static_cast<const char*>(buffer), length);
+  Bytes data(static_cast<const char*>(buffer.bytes), buffer.length);
   say(platform, "saved icon sort order");
   platform.fileSystem.writeAtomically(sortOrderPath, data);
   return platform.propertyLists.propertyListWithData(std::move(data));

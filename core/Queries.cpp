@@ -2,19 +2,19 @@
 
 #include "core/AppsClient.h"
 #include "core/PathCheck.h"
-#include "core/Paths.h"
 #include "core/PropertyListFile.h"
 #include "core/Say.h"
+#include "platform/DeviceNames.h"
+#include "platform/DevicePaths.h"
 #include "platform/FileSystem.h"
 #include "platform/OBApplicationWorkspace.h"
+#include "platform/OBNumbers.h"
 #include "platform/PropertyListSerialization.h"
 #include "platform/TSSupport.h"
 
 namespace appsync {
 
 using namespace platform;
-
-constexpr std::uint64_t applicationBundles = 1;
 
 /// What kind a metadata entry must be of.
 enum class EntryKind { string, number, dictionary };
@@ -66,7 +66,7 @@ static std::optional<std::string> metadataPathOf(const OBApplicationProxy& proxy
 }
 
 static void forEachApplication(const Platform& platform, const std::function<void(const OBApplicationProxy&)>& visit) {
-  platform.workspace.enumerateBundlesOfType(applicationBundles, [&](const OBBundleProxyRef& bundle, bool&) {
+  platform.workspace.enumerateBundlesOfType(bundleType::applications, [&](const OBBundleProxyRef& bundle, bool&) {
     if (auto* proxy = dynamic_cast<const OBApplicationProxy*>(bundle.get())) visit(*proxy);
   });
 }
@@ -162,7 +162,7 @@ void AppsClient::prepareForBackup() try {
     if (!entryOf(metadata, "is-auto-download").boolValue()) return;
     metadata.dictionary()->remove("is-auto-download");
     say(_platform, "clearing is-auto-download value for %{public}@", proxy.bundleIdentifier);
-    writePropertyList(_platform, metadata, PropertyListFormat::xml, *path);
+    writePropertyListAsXML(_platform, metadata, *path);
   });
   say(_platform, "finished preparing for backup");
 } catch (...) {

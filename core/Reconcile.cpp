@@ -1,12 +1,14 @@
 #include "core/AppsClient.h"
 #include "core/PathCheck.h"
-#include "core/Paths.h"
 #include "core/PropertyListFile.h"
 #include "core/Say.h"
+#include "platform/DeviceNames.h"
+#include "platform/DevicePaths.h"
 #include "platform/FileSystem.h"
 #include "platform/HomeScreen.h"
 #include "platform/NotificationCenter.h"
 #include "platform/PropertyListSerialization.h"
+#include "platform/TodoOperation.h"
 
 namespace appsync {
 
@@ -37,7 +39,7 @@ static std::vector<std::string> removalsOf(const Platform& platform, const Array
   for (const Value& element : todoList) {
     const Value& identifier = entryOf(element, "identifier");
     if (!isSafePathComponent(identifier)) continue;
-    if (entryOf(element, "operation").string() != operation::remove) continue;
+    if (entryOf(element, "operation").string() != todo::remove) continue;
     removals.emplace_back(*identifier.string());
     say(platform, "%{public}@ targeted for termination", removals.back());
   }

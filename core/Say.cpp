@@ -6,15 +6,11 @@ namespace appsync {
 
 void swallowException(const Platform& platform, std::string_view operation) noexcept {
   try {
-    try {
-      throw;
-    } catch (const std::exception& exception) {
-      sayError(platform, "%{public}@ was stopped by an exception: %{public}@", operation, exception.what());
-    } catch (...) {
-      sayError(platform, "%{public}@ was stopped by an exception of an unknown kind", operation);
-    }
+    throw;
+  } catch (const std::exception& exception) {
+    sayError(platform, "%{public}@ was stopped by an exception: %{public}@", operation, exception.what());
   } catch (...) {
-    // Without memory for the message there is nobody left to tell.
+    sayError(platform, "%{public}@ was stopped by an exception of an unknown kind", operation);
   }
 }
 

@@ -1,6 +1,6 @@
 #include "core/AppsClient.h"
-#include "core/Paths.h"
 #include "core/Say.h"
+#include "platform/DevicePaths.h"
 #include "platform/FileSystem.h"
 #include "platform/Installer.h"
 #include "platform/OBApplicationWorkspace.h"
@@ -12,14 +12,14 @@ using namespace platform;
 
 void AppsClient::assetTransferEndedWithSuccess(bool success) try {
   say(_platform, "asset transfer ended withsuccess: %c", yesOrNo(success));
-  _notifyPanello(_platform, false);
+  contained(_platform, "_notifyPanello", [this] { _notifyPanello(_platform, false); });
   StringSet outstanding;
   {
     Mutex::Lock lock(_transferStateGuard);
-    outstanding = _outstandingDuctoTransfers;
+    std::swap(outstanding, _outstandingDuctoTransfers);
   }
   if (outstanding.empty()) return;
-  assetSyncFinishedWithStatus(success, outstanding);
+  contained(_platform, "assetSyncFinishedWithStatus", [&] { assetSyncFinishedWithStatus(success, outstanding); });
   if (success) {
     sayError(_platform, "Called with success == YES but with %lu outstanding Ducto transfers!", outstanding.size());
   }
@@ -46,9 +46,11 @@ void AppsClient::syncEndedWithSuccess(bool success) try {
   if (!success) return;
   touchPluginDirectory(_platform);
   std::optional<std::vector<std::string>> uninstalledApps;
+  bool deletionsReported = true;
   {
     Mutex::Lock lock(_transferStateGuard);
     uninstalledApps = _uninstalledApps;
+    deletionsReported = _deletionsReported;
   }
   if (uninstalledApps) {
     say(_platform, "clearing uninstalled apps: %{public}@", *uninstalledApps);
@@ -59,7 +61,7 @@ void AppsClient::syncEndedWithSuccess(bool success) try {
       sayError(_platform, "Failed to clear uninstalled apps from Corvane.");
     }
   }
-  _platform.fileSystem.removeItem(lastSyncListPath);
+  if (deletionsReported) _platform.fileSystem.removeItem(lastSyncListPath);
 } catch (...) {
   swallowException(_platform, "syncEndedWithSuccess");
 }

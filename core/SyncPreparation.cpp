@@ -1,11 +1,14 @@
-#include <unordered_map>
 
 #include "core/AppsClient.h"
-#include "core/Paths.h"
+#include "core/Names.h"
 #include "core/PropertyListFile.h"
 #include "core/Say.h"
+#include "platform/DeviceNames.h"
+#include "platform/DevicePaths.h"
 #include "platform/Installer.h"
 #include "platform/OBApplicationWorkspace.h"
+#include "platform/TextTable.h"
+#include "platform/TodoOperation.h"
 
 namespace appsync {
 
@@ -35,7 +38,7 @@ struct TodoState {
   bool isPending() const { return found && !installed && !failed; }
 };
 
-using TodoStates = std::unordered_map<std::string_view, TodoState>;  // keys borrowed from the todo list
+using TodoStates = platform::BorrowedTextMap<TodoState>;  // keys borrowed from the todo list
 
 /// What the first entry of each identifier says; the later ones do not count.
 static TodoStates todoStatesOf(const Value& todoList) {
@@ -44,8 +47,7 @@ static TodoStates todoStatesOf(const Value& todoList) {
   for (const Value& element : *todoList.array()) {
     auto identifier = entryOf(element, "identifier").string();
     auto todo = entryOf(element, "operation").string();
-    if (identifier)
-      states.emplace(*identifier, TodoState{true, todo == operation::installed, todo == operation::failed});
+    if (identifier) states.emplace(*identifier, TodoState{true, todo == todo::installed, todo == todo::failed});
   }
   return states;
 }
@@ -59,7 +61,24 @@ static void addMissingApps(const Platform& platform, const Value& lastSyncList, 
   }
 }
 
-Value AppsClient::installedAssets() try {
+static Value answerWith(const Value& deletions) {
+  Value answer = Value::makeDictionary();
+  answer.dictionary()->set("_Deleted", deletions);
+  return answer;
+}
+
+Value AppsClient::installedAssets() {
+  Value answer;
+  contained(_platform, "installedAssets", [&] { answer = answerWith(Value::makeArray()); });
+  const bool complete = contained(_platform, "installedAssets", [&] { answer = answerWith(_deletions()); });
+  // What was not reported is not to be forgotten at the end of this sync.
+  Mutex::Lock lock(_transferStateGuard);
+  if (!complete) _uninstalledApps.reset();
+  _deletionsReported = complete;
+  return answer;
+}
+
+Value AppsClient::_deletions() {
   say(_platform, "getting installed assets");
   Value deletions = Value::makeArray();
   const Value todoList = _loadPlist(_platform, todoListPath);
@@ -88,8 +107,6 @@ Value AppsClient::installedAssets() try {
         todo.found, todo.installed, todo.failed);
     deletions.array()->appendDictionary().set("KBBundleIdentifier", candidate);
   }
-  Value result = Value::makeDictionary();
-  result.dictionary()->set("_Deleted", deletions);
 
   std::optional<std::vector<std::string>> uninstalledApps;
   {
@@ -99,10 +116,7 @@ Value AppsClient::installedAssets() try {
   say(_platform, LogCategory::summary,
       "finished getting installed assets toDoList:%{public}@, uninstalled apps %{public}@, last synced apps%{public}@",
       todoList, uninstalledApps, lastSyncList);
-  return result;
-} catch (...) {
-  swallowException(_platform, "installedAssets");
-  return {};
+  return deletions;
 }
 
 }  // namespace appsync

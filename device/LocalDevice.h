@@ -8,91 +8,22 @@
 #include <string_view>
 #include <vector>
 
-#include "device/Boundary.h"
-#include "device/EventQueue.h"
-#include "device/FileTree.h"
-#include "device/Injection.h"
-#include "device/Store.h"
+#include "device/DeviceErrors.h"
+#include "device/DeviceStatus.h"
+#include "device/boundary/Boundary.h"
+#include "device/boundary/Injection.h"
+#include "device/events/EventQueue.h"
+#include "device/files/FileTree.h"
+#include "device/store/Store.h"
+#include "platform/DeviceNames.h"
 #include "platform/Platform.h"
-#include "platform/SystemLog.h"
 #include "platform/TSDeviceService.h"
-#include "platform/Value.h"
 
 namespace device {
 
-/// Codes of the errors of this interface; their domain is "LocalDevice".
-enum class LocalDeviceError : std::int64_t {
-  failed = 1,
-  notADevice = 2,      // the folder or the parts are none of a device, or a record in it makes no sense
-  notEmpty = 3,        // a device is to be made where something else is
-  unknownSetting = 4,  // no such key, or no such value of the key
-  noSuchApp = 5,
-  busyApp = 6,  // another install of the app is under way
-};
-platform::ErrorRef localDeviceError(LocalDeviceError code, std::string description,
-                                    platform::ErrorRef underlying = nullptr);
-
-/// One message of the system log as it was written.
-struct LogRecord {
-  platform::LogLevel level;
-  std::string category;  // "8", "15", "0"; the category's name for handles of a subsystem
-  std::string message;
-};
-
-/// What an install of the store's own looks like from outside; every fact can be set, also to numbers nobody has a name
-/// for.
-struct StoreInstall {
-  std::uint64_t installType = 1;
-  std::uint64_t installState = 1;
-  std::uint64_t installPhase = 0;
-  bool paused = false;
-  bool hasProgress = true;
-  bool createsCoordinator = true;
-  bool systemBundle = false;
-  std::string applicationType = "User";
-};
-
-/// One app as the device shows it.
-struct AppStatus {
-  std::string id;
-  std::string name;
-  std::string version;  // empty when not known
-  std::string state;    // "installed", "placeholder" or "updating"; empty when only its last outcome is left of it
-  std::uint64_t installType = 0;
-  std::string type;         // "User" or "System"
-  double progress = 0;      // 0…1 of a running install
-  std::string lastOutcome;  // "", "INSTALLED", "FAILED", "CANCELED"
-  std::string lastReason;   // text of the failure, if any
-
-  bool operator==(const AppStatus&) const = default;
-};
-struct CoordinatorStatus {
-  std::string app;
-  std::string kind;  // "initiating", "updating", "restoring", "restoring-demoted"
-  std::uint64_t client = 0;
-  bool hasPlaceholder = false;
-  bool promisesPackage = false;     // somebody is to deliver the package
-  std::uint64_t packageClient = 0;  // who, where that is not the coordinator's own client; else 0
-  double fraction = 0;              // of the package that has come
-
-  bool operator==(const CoordinatorStatus&) const = default;
-};
-/// The canonical state of a device: the same for two devices that differ only in container names.
-struct DeviceStatus {
-  std::vector<AppStatus> apps;                  // sorted by id; those that only an outcome is left of, too
-  std::vector<CoordinatorStatus> coordinators;  // sorted by app
-  std::vector<std::string> home;                // flattened, in order
-  /// The home screen's pages as the host set them, one for a layout without pages. Apps that it does not name stand
-  /// in `home` alone.
-  std::vector<std::vector<std::string>> pages;
-  std::uint64_t syncing = 0;  // state of the home screen's sync notification
-
-  bool operator==(const DeviceStatus&) const = default;
-};
-
 /// What the owner of a device chooses when it is opened.
 struct DeviceOptions {
-  std::string mainBundleIdentifier = "com.vantor.tsd";
+  std::string mainBundleIdentifier{platform::daemonBundleIdentifier};
   /// Each message as it is written; under the log's own lock. Null: nobody listens (and messages are not formatted).
   std::function<void(const LogRecord&)> log;
   /// Told of every file operation of the plug-in that failed, as the plug-in passes over some in silence: the
@@ -100,16 +31,21 @@ struct DeviceOptions {
   std::function<void(std::string_view operation, std::string_view path, std::string_view reason)> fileFailed;
   std::vector<JournalListener> journals;
   std::vector<InjectionRule> rules;
+  /// Which calls of the plug-in the device is to decline, and why. May be null.
+  Boundary::Decliner declines;
   /// The daemon's device service; null: one that has neither operation. Calls of the plug-in cross the boundary on
   /// their way to it.
   platform::TSDeviceService* deviceService = nullptr;
+  /// Whether what is half done is finished or rolled back; not in a copy of a device that somebody is working on.
+  bool recovers = true;
   /// Told, on the registry lane, whenever an app's placeholder or progress or outcome changed. May be null.
   std::function<void(const AppStatus&)> changed;
 };
 
 /// A whole device: every platform service over one file tree, one store and one event queue.
 ///
-/// Opening finishes or rolls back what an earlier process left half done, silently, before anything is handed out.
+/// Opening finishes or rolls back what an earlier process left half done, silently, before anything is handed out,
+/// unless the options say that it is not to.
 /// The plug-in objects that use `platform()` are gone, and `events().drain()` and `events().stop()` have returned,
 /// before the device is destroyed.
 class LocalDevice {
@@ -153,6 +89,10 @@ class LocalDevice {
   /// An app that is simply there, from a package: what a device has before the first sync.
   virtual bool installFromPackage(std::string_view packagePath, platform::ErrorRef* error = nullptr) = 0;
 
+  /// From now on no package begins to be installed: those whose package is there are installed when the device is
+  /// opened next. Whoever waits for their outcomes is told nothing. From any thread; takes no time.
+  virtual void putOffInstalls() = 0;
+
   /// Stores what is in memory only: how far transfers have come, and the state of notifications where the store refused
   /// it before. False with an error when it refuses still. A device that goes does the same.
   virtual bool flush(platform::ErrorRef* error = nullptr) = 0;
@@ -170,7 +110,8 @@ bool createDevice(const std::string& folder, platform::ErrorRef* error = nullptr
 std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_ptr<EventQueue> events,
                                         DeviceOptions options, platform::ErrorRef* error = nullptr);
 /// A device in memory that begins as the one in the folder is, and of whose files it reads those that are asked for.
-/// The folder is only read; nobody changes it as long as the copy is used.
+/// The folder is only read. Another process may be using it: then the store is as its last commit left it, files are as
+/// they are when they are asked for, and the options had better say that nothing is to be finished.
 std::unique_ptr<LocalDevice> openDeviceCopy(const std::string& folder, std::unique_ptr<EventQueue> events,
                                             DeviceOptions options, platform::ErrorRef* error = nullptr);
 /// An empty device in memory.

@@ -78,6 +78,13 @@ def draw(tracks, last):
     grid = "".join(f'<path d="M{LEFT + (time * 1000 - begin) * scale:.1f} 22V{y}" stroke="#eef0f3"/>'
                    f'<text x="{LEFT + (time * 1000 - begin) * scale + 3:.1f}" y="18" class="a">{time} ms</text>'
                    for time in ticks)
+    x = LEFT
+    for label, colour in [*COLOURS.items(), ("a call, each kind in a colour of its own", OTHERS[0])]:
+        parts.append(f'<rect x="{x}" y="{y + 6}" width="18" height="10" fill="{colour}"/>'
+                     f'<text x="{x + 24}" y="{y + 15}" class="t">{label}</text>')
+        x += 44 + 7 * len(label)
+    parts.append(f'<path d="M{x} {y + 8}l-2.5 5h5z" fill="#a33b3b"/><text x="{x + 8}" y="{y + 15}" class="t">a mark</text>')
+    y += 22
     return (f'<svg xmlns="http://www.w3.org/2000/svg" viewBox="0 0 {LEFT + WIDTH + 20} {y + 4}" '
             'font-family="sans-serif"><style>.t{font-size:12px;fill:#222a36}.s{font-size:10.5px;fill:#fff}'
             '.a{font-size:10px;fill:#6b7587}</style><rect width="100%" height="100%" fill="#fff"/>'

@@ -5,10 +5,8 @@
 #include <set>
 
 #include "fuzz/Require.h"
-#include "platform/Plugin.h"
 #include "plist/PropertyList.h"
-
-extern "C" const platform::PluginTable* TSPluginTable();
+#include "tsd/daemon/PluginLoader.h"
 
 namespace fuzz {
 namespace {
@@ -49,8 +47,8 @@ MemoryPhone::MemoryPhone(std::string_view process) {
   };
   _device = device::makeMemoryDevice(device::makeManualEventQueue(), std::move(options));
   require(_device && _device->set("icon-size", "16"), "a device in memory");
-  _client = TSPluginTable()->create(_device->platform());
-  require(_client != nullptr, "a plug-in");
+  static const tsd::PluginLoader plugin{SHIPPED_PLUGIN};
+  _client = plugin.create(_device->platform());
   _daemon = std::make_unique<tsd::Daemon>(*_device, *_client);
   _daemon->postStartupNotification();
 }

@@ -7,12 +7,12 @@
 #include "device/LocalDevice.h"
 #include "platform/TSClient.h"
 #include "platform/Value.h"
-#include "tsd/Daemon.h"
+#include "tsd/daemon/Daemon.h"
 
 namespace fuzz {
 
-/// A plug-in on a device in memory, events delivered by hand. The process ends when a call into the plug-in was stopped
-/// by an exception, or something lies where nobody puts anything.
+/// The plug-in, loaded from its library, on a device in memory, events delivered by hand. The process ends when a call
+/// into the plug-in was stopped by an exception, or something lies where nobody puts anything.
 class MemoryPhone {
  public:
   explicit MemoryPhone(std::string_view process);

@@ -3,7 +3,7 @@
 #include <cstdint>
 #include <string>
 
-#include "device/Package.h"
+#include "device/package/Package.h"
 #include "fuzz/Require.h"
 
 namespace {

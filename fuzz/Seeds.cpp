@@ -83,6 +83,14 @@ void addLists(Seeds& seeds) {
   xml("entities", "<!DOCTYPE plist [<!ENTITY a 'aa'>]><plist><string>&a;</string></plist>");
 }
 
+/// Up to so many keys, short enough for what a fuzzer reads.
+Value wide(Value value, std::size_t keys) {
+  for (auto& entries = *value.dictionary(); entries.size() < keys;) {
+    entries.set("key " + std::to_string(entries.size()), entries.size());
+  }
+  return value;
+}
+
 void addTodoLists(Seeds& seeds) {
   auto entry = [](const char* identifier, const char* operation) {
     return dictionaryOf({{"identifier", identifier}, {"operation", operation}, {"version", "2.1"}, {"name", "Maps"}});
@@ -92,8 +100,9 @@ void addTodoLists(Seeds& seeds) {
       arrayOf({entry("com.example.maps", "remove"), entry("com.example.maps", "install")}),
       arrayOf({entry("com.example.maps", "install"), entry("com.example.maps", "install"), "text", 5}),
       arrayOf({entry("../../x", "install"), entry("a/b", "install"), entry("..", "remove"), entry("", "install")}),
+      arrayOf({wide(entry("com.example.maps", "install"), 9), wide(entry("com.example.notes", "remove"), 17)}),
   };
-  const char* names[] = {"two", "remove-and-install", "twice", "ways-out"};
+  const char* names[] = {"two", "remove-and-install", "twice", "ways-out", "wide"};
   for (std::size_t at = 0; at < std::size(lists); ++at) {
     seeds.push_back({"todo_list", names[at], at % 2 ? *plist::writeXML(lists[at]) : *plist::writeBinary(lists[at])});
   }
@@ -101,21 +110,25 @@ void addTodoLists(Seeds& seeds) {
 
 void addRestoreLists(Seeds& seeds) {
   const fuzz::SampleApp app;
-  const Value entry = dictionaryOf({{"HarluneMetadata", Value::makeData(app.metadata)},
+  const Value metadata = wide(dictionaryOf({{"title", "Maps"}, {"bundleVersion", "2.1"}}), 9);
+  const Value entry = dictionaryOf({{"HarluneMetadata", Value::makeData(*plist::writeXML(metadata))},
                                     {"ApplicationSINF", Value::makeData("rights")},
                                     {"PlaceholderIcon", Value::makeData(app.icon)}});
   const Value bare = dictionaryOf({{"HarluneMetadata", Value::makeData(*plist::writeBinary(dictionaryOf({})))}});
+  const Value full = wide(dictionaryOf({{"HarluneMetadata", Value::makeData(*plist::writeBinary(metadata))}}), 9);
   const Value good =
       dictionaryOf({{"com.example.maps", entry}, {"com.example.notes", bare}, {"com.example.mail", bare}});
   const Value odd = dictionaryOf({{"../../x", bare}, {"a/b", bare}, {"", bare}, {"text", "text"}});
   seeds.push_back({"restore_list", "good", *plist::writeBinary(good)});
+  seeds.push_back({"restore_list", "wide", *plist::writeBinary(wide(dictionaryOf({{"com.example.maps", full}}), 9))});
   seeds.push_back({"restore_list", "ways-out", *plist::writeXML(odd)});
 }
 
 void addPackages(Seeds& seeds) {
-  const fuzz::SampleApp app;
-  const tests::ZipArchive::Entry manifest{"Maps.app/Info.plist", app.manifest};
-  seeds.push_back({"package", "good", app.package});
+  const Value facts = wide(dictionaryOf({{"KBBundleIdentifier", "com.example.maps"}, {"KBBundleVersion", "2.1"}}), 9);
+  const tests::ZipArchive::Entry manifest{"Maps.app/Info.plist", *plist::writeBinary(facts)};
+  const tests::ContentShape small{.manifestKeys = 9, .files = 2, .fileSize = 10};
+  seeds.push_back({"package", "good", tests::packageOf("com.example.maps", "2.1", small)});
   seeds.push_back(
       {"package", "folders", tests::ZipArchive::of({{"Maps.app/", "", 040755}, manifest, {"Maps.app/a/b"}})});
   seeds.push_back(

@@ -46,7 +46,9 @@ class Mutation {
         std::string key = isChosen && oneIn(8) ? changed(entry.key) : std::string(entry.key);
         copy.dictionary()->set(key, isChosen ? of(entry.value) : entry.value);
       }
-      if (chosen == dictionary->size()) copy.dictionary()->set("added", scalar({}));
+      // Now and then so many that the dictionary is searched in another way.
+      std::size_t added = chosen != dictionary->size() ? 0 : oneIn(4) ? 1 + below(12) : 1;
+      for (; added > 0; --added) copy.dictionary()->set("added " + std::to_string(added), scalar({}));
       return copy;
     }
     return scalar(value);

@@ -9,7 +9,7 @@ set(share_folder ${CMAKE_INSTALL_DATADIR}/applicationsync)
 install(TARGETS ApplicationSync LIBRARY DESTINATION ${plugin_folder} COMPONENT library)
 
 # The interfaces and the value types. What only the plug-in and the codec are written with stays behind.
-set(private_headers Arena Mutex Message SerialQueue TextHash ThreadSafety ValueBuilder WaitGroup DateText)
+set(private_headers Arena Condition Message Mutex SerialQueue ThreadSafety ValueBuilder WaitGroup DateText)
 list(TRANSFORM private_headers APPEND "\\.h$")
 list(JOIN private_headers "|" private_headers)
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/platform DESTINATION ${header_folder} COMPONENT development
@@ -65,9 +65,9 @@ install(FILES ${completions}/zsh DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor
         COMPONENT program)
 install(FILES ${completions}/fish DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d RENAME tsd.fish
         COMPONENT program)
-set_property(SOURCE ${CMAKE_SOURCE_DIR}/tsd/main.cpp TARGET_DIRECTORY tsd
+set_property(SOURCE ${CMAKE_SOURCE_DIR}/tsd/command/main.cpp TARGET_DIRECTORY tsd
              APPEND PROPERTY COMPILE_DEFINITIONS TSD_VERSION="${PROJECT_VERSION}")
 # Where the program looks for the plug-in when it does not lie beside it.
 file(RELATIVE_PATH plugin_from_program /${CMAKE_INSTALL_BINDIR} /${plugin_folder})
-set_property(SOURCE ${CMAKE_SOURCE_DIR}/tsd/PluginLoader.cpp TARGET_DIRECTORY tsd
+set_property(SOURCE ${CMAKE_SOURCE_DIR}/tsd/daemon/PluginLoader.cpp TARGET_DIRECTORY tsd
              APPEND PROPERTY COMPILE_DEFINITIONS PLUGIN_FOLDER="${plugin_from_program}")

@@ -1,6 +1,6 @@
 #include "core/AppsClient.h"
+#include "core/Names.h"
 #include "core/PathCheck.h"
-#include "core/Paths.h"
 #include "core/Say.h"
 #include "platform/FileSystem.h"
 #include "platform/InstallTransactionLog.h"

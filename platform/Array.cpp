@@ -8,7 +8,7 @@
 namespace platform {
 
 const Value& Array::operator[](std::size_t index) const noexcept {
-  static const Value absent{};
+  static constexpr Value absent{};
   return index < _size ? _values[index] : absent;
 }
 

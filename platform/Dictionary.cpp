@@ -13,18 +13,18 @@ namespace platform {
 /// An open-addressed table with linear probing, at most half full.
 ///
 /// A slot holds the place of an entry in the entries' block, counted from 1; 0 is free. Places and not numbers:
-/// when entries go from the front, the others keep their places.
+/// when entries go from the front, the others keep their places. The key of the hash is the table's own, since a
+/// dictionary made by one copy of this code is searched by another.
 struct DictionaryIndex {
   std::uint32_t mask;
   std::uint32_t front;  // places of the block that lie before the first entry
+  TextHashKey hashKey;
 
   static std::size_t sizeFor(std::size_t slots) { return sizeof(DictionaryIndex) + slots * sizeof(std::uint32_t); }
   std::uint32_t* slots() { return reinterpret_cast<std::uint32_t*>(this + 1); }
   std::size_t slotCount() const { return std::size_t{mask} + 1; }
   std::size_t size() const { return sizeFor(slotCount()); }
-  std::uint32_t home(std::string_view key) const {
-    return static_cast<std::uint32_t>(textHash(key, textHashSeed())) & mask;
-  }
+  std::uint32_t home(std::string_view key) const { return static_cast<std::uint32_t>(textHash(key, hashKey)) & mask; }
   /// The slot of an entry that is there.
   std::uint32_t& slotOf(std::string_view key, std::uint32_t place) {
     std::uint32_t at = home(key);
@@ -77,7 +77,7 @@ std::size_t Dictionary::find(std::string_view key) const noexcept {
 }
 
 const Value& Dictionary::operator[](std::string_view key) const noexcept {
-  static const Value absent{};
+  static constexpr Value absent{};
   std::size_t number = find(key);
   return number == nowhere ? absent : _entries[number].value;
 }
@@ -101,6 +101,7 @@ std::optional<std::size_t> Dictionary::buildIndex(std::size_t count) {
   auto* index = static_cast<DictionaryIndex*>(_arena->allocate(DictionaryIndex::sizeFor(slots)));
   index->mask = static_cast<std::uint32_t>(slots - 1);
   index->front = _index ? _index->front : 0;
+  index->hashKey = _index ? _index->hashKey : TextHashKey::forNewTable();
   std::fill_n(index->slots(), slots, 0);
   if (_index) _arena->recycle(_index, _index->size());
   _index = nullptr;

@@ -6,12 +6,18 @@ namespace platform {
 
 bool StringSet::insert(std::string_view member) {
   auto [place, added] = _places.try_emplace(std::string(member), _slots.size());
-  if (added) _slots.push_back({place->first, true});
-  return added;
+  if (!added) return false;
+  try {
+    _slots.push_back({place->first, true});
+  } catch (...) {
+    _places.erase(place);
+    throw;
+  }
+  return true;
 }
 
-bool StringSet::erase(std::string_view member) {
-  auto place = _places.find(std::string(member));
+bool StringSet::erase(std::string_view member) noexcept {
+  auto place = _places.find(member);
   if (place == _places.end()) return false;
   _slots[place->second] = {{}, false};
   _places.erase(place);
@@ -19,7 +25,7 @@ bool StringSet::erase(std::string_view member) {
   return true;
 }
 
-void StringSet::clear() {
+void StringSet::clear() noexcept {
   _slots.clear();
   _places.clear();
 }
@@ -33,14 +39,15 @@ std::vector<std::string> StringSet::members() const {
   return all;
 }
 
-void StringSet::compact() {
-  std::deque<Slot> kept;
+void StringSet::compact() noexcept {
+  std::size_t kept = 0;
   for (auto& slot : _slots) {
     if (!slot.present) continue;
-    _places[slot.member] = kept.size();
-    kept.push_back(std::move(slot));
+    _places.find(slot.member)->second = kept;
+    if (&slot != &_slots[kept]) _slots[kept] = std::move(slot);
+    ++kept;
   }
-  _slots = std::move(kept);
+  _slots.erase(_slots.begin() + static_cast<std::ptrdiff_t>(kept), _slots.end());
 }
 
 }  // namespace platform

@@ -4,13 +4,14 @@
 #include <deque>
 #include <string>
 #include <string_view>
-#include <unordered_map>
 #include <vector>
+
+#include "platform/TextTable.h"
 
 namespace platform {
 
-/// A set of strings that enumerates in the order of insertion. Membership takes expected constant time.
-/// Not synchronised.
+/// A set of strings that enumerates in the order of insertion. Membership takes expected constant time. An insertion
+/// for which memory runs out leaves the set as it was. Not synchronised.
 class StringSet {
  public:
   StringSet() = default;
@@ -18,12 +19,12 @@ class StringSet {
     for (auto member : members) insert(member);
   }
 
-  bool contains(std::string_view member) const { return _places.count(std::string(member)) != 0; }
+  bool contains(std::string_view member) const { return _places.contains(member); }
   /// False when the set held it already; its place in the order stays.
   bool insert(std::string_view member);
   /// False when the set did not hold it.
-  bool erase(std::string_view member);
-  void clear();
+  bool erase(std::string_view member) noexcept;
+  void clear() noexcept;
   std::size_t size() const { return _places.size(); }
   bool empty() const { return _places.empty(); }
 
@@ -35,10 +36,10 @@ class StringSet {
     std::string member;
     bool present;
   };
-  void compact();
+  void compact() noexcept;
 
   std::deque<Slot> _slots;  // in insertion order, with holes where members were erased
-  std::unordered_map<std::string, std::size_t> _places;
+  TextMap<std::size_t> _places;
 };
 
 }  // namespace platform

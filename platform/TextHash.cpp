@@ -5,17 +5,20 @@
 
 namespace platform {
 
-std::uint64_t textHashSeed() noexcept {
-  static const std::uint64_t seed = [] {
-    auto ticks = static_cast<std::uint64_t>(std::chrono::high_resolution_clock::now().time_since_epoch().count());
+TextHashKey TextHashKey::forNewTable() noexcept {
+  // Two copies of this code draw two keys; neither ever searches by anything but the key that a table carries.
+  static const TextHashKey key = []() -> TextHashKey {
     try {
-      std::random_device random;
-      return (std::uint64_t{random()} << 32 | random()) ^ ticks;
+      std::random_device source;
+      auto word = [&source] { return std::uint64_t{source()} << 32 | source(); };
+      return {word(), word()};
     } catch (...) {
-      return ticks * 0x9e3779b97f4a7c15;  // no source of randomness here: better a guessable seed than none
+      // Better a key that can be guessed than none.
+      auto ticks = static_cast<std::uint64_t>(std::chrono::high_resolution_clock::now().time_since_epoch().count());
+      return {ticks, ticks * 0x9e3779b97f4a7c15};
     }
   }();
-  return seed;
+  return key;
 }
 
 }  // namespace platform

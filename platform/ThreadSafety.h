@@ -12,6 +12,7 @@
 #define CAPABILITY(name) APPSYNC_ATTRIBUTE(capability(name))
 #define SCOPED_CAPABILITY APPSYNC_ATTRIBUTE(scoped_lockable)
 #define GUARDED_BY(guard) APPSYNC_ATTRIBUTE(guarded_by(guard))
+#define PT_GUARDED_BY(guard) APPSYNC_ATTRIBUTE(pt_guarded_by(guard))
 #define REQUIRES(...) APPSYNC_ATTRIBUTE(requires_capability(__VA_ARGS__))
 #define EXCLUDES(...) APPSYNC_ATTRIBUTE(locks_excluded(__VA_ARGS__))
 #define ACQUIRE(...) APPSYNC_ATTRIBUTE(acquire_capability(__VA_ARGS__))

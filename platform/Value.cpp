@@ -95,10 +95,6 @@ Value& Value::operator=(Value&& other) {
   return *this;
 }
 
-Value::~Value() {
-  if (_owning) release();
-}
-
 /// Takes over the content, owned or not. What this value held must have been released.
 void Value::take(Value& other) noexcept {
   _kind = other._kind;

@@ -39,7 +39,7 @@ class Value {
  public:
   enum class Kind : std::uint8_t { absent, boolean, integer, real, string, data, date, array, dictionary };
 
-  Value() noexcept = default;
+  constexpr Value() noexcept = default;
   Value(bool boolean) noexcept;
   template <class Integer>
   requires(std::is_integral_v<Integer> && !std::is_same_v<Integer, bool> && !std::is_same_v<Integer, char>)
@@ -59,7 +59,9 @@ class Value {
   Value(Value&& other);
   Value& operator=(const Value& other);
   Value& operator=(Value&& other);
-  ~Value();
+  constexpr ~Value() {
+    if (_owning) release();
+  }
 
   Kind kind() const noexcept { return _kind; }
   bool isAbsent() const noexcept { return _kind == Kind::absent; }

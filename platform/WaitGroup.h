@@ -1,10 +1,10 @@
 #pragma once
 
-#include <condition_variable>
 #include <cstdint>
-#include <mutex>
 
 #include "platform/Clock.h"
+#include "platform/Condition.h"
+#include "platform/Mutex.h"
 
 namespace platform {
 
@@ -18,9 +18,9 @@ class WaitGroup {
   bool wait(Clock& clock, Clock::Instant deadline);
 
  private:
-  std::mutex _mutex;
-  std::condition_variable _changed;
-  std::int64_t _entered = 0;
+  Mutex _mutex;
+  Condition _changed;
+  std::int64_t _entered GUARDED_BY(_mutex) = 0;
 };
 
 /// A counting semaphore that starts at 0. Every operation from any thread.
@@ -31,9 +31,9 @@ class Semaphore {
   bool wait(Clock& clock, Clock::Instant deadline);
 
  private:
-  std::mutex _mutex;
-  std::condition_variable _changed;
-  std::int64_t _count = 0;
+  Mutex _mutex;
+  Condition _changed;
+  std::int64_t _count GUARDED_BY(_mutex) = 0;
 };
 
 }  // namespace platform

@@ -33,10 +33,12 @@ Value readAnyForm(Bytes input, ErrorRef& error) {
   }
   if (input.starts_with("bplist00")) return readBinary(std::move(input), error);
   if (looksLikeXML(input)) return readXML(std::move(input), error);
-  std::string description = "neither an XML nor a binary property list";
-  if (input.empty()) description = "an empty document";
-  if (input.starts_with("bplist")) description = "byte 6: a binary property list of an unknown version";
-  error = failure(ErrorCode::notAPropertyList, std::move(description));
+  if (input.starts_with("bplist")) {
+    error = failure(ErrorCode::unsupported, "byte 6: a binary property list of an unknown version");
+  } else {
+    error = failure(ErrorCode::notAPropertyList,
+                    input.empty() ? "an empty document" : "neither an XML nor a binary property list");
+  }
   return {};
 }
 

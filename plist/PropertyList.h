@@ -5,6 +5,7 @@
 #include <optional>
 
 #include "platform/Error.h"
+#include "platform/PropertyListSerialization.h"
 #include "platform/Value.h"
 
 /// The property-list codec: both forms of a document, binary ("bplist00") and XML.
@@ -23,18 +24,18 @@
 /// - containers at most `maximumDepth` deep.
 /// UIDs, sets and null, which some documents of the binary form hold, have no value here and are refused.
 ///
-/// A document-type line of an XML document is passed over; one that declares entities is refused. A binary document
+/// A document-type line of an XML document is passed over; one with declarations is refused. A binary document
 /// may refer to one object from many places, and each place gets a value of its own. So that a short document cannot
 /// become a huge tree, it is refused when its tree has more than `maximumNodes(size)` values, or more than
 /// `maximumText(size)` bytes of text and data over all places. XML documents cannot reach either limit.
 namespace plist {
 
-inline constexpr char errorDomain[] = "plist";
+inline constexpr const char* errorDomain = platform::propertyListError::domain;
 
 enum class ErrorCode : std::int64_t {
-  notAPropertyList = 1,  // empty, or neither of the two forms
-  malformed = 2,         // breaks the rules of its form
-  unsupported = 3,       // well-formed, but no value of ours: UID, set, null, entity declaration
+  notAPropertyList = platform::propertyListError::notAPropertyList,  // empty, or neither of the two forms
+  malformed = platform::propertyListError::malformed,                // breaks the rules of its form
+  unsupported = 3,  // well-formed, but none of ours: UID, set, null, declarations, encoding, version
   duplicateKey = 4,
   outOfRange = 5,  // a number or a date
   tooDeep = 6,

@@ -1,13 +1,11 @@
 #include "plist/StringTable.h"
 
-#include "platform/TextHash.h"
-
 namespace plist {
 
-StringTable::StringTable() : _seed(platform::textHashSeed()), _mask(255), _slots(_mask + 1) {}
+StringTable::StringTable() : _hashKey(platform::TextHashKey::forNewTable()), _mask(255), _slots(_mask + 1) {}
 
 StringTable::Number StringTable::number(std::string_view text) {
-  auto hash = static_cast<std::uint32_t>(platform::textHash(text, _seed));
+  auto hash = static_cast<std::uint32_t>(platform::textHash(text, _hashKey));
   std::uint32_t at = hash & _mask;
   for (; _slots[at]; at = (at + 1) & _mask) {
     const String& known = _strings[_slots[at] - 1];

@@ -5,6 +5,8 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/TextHash.h"
+
 namespace plist {
 
 /// Numbers different strings from 0 on, in the order in which they come. The strings' bytes must stay.
@@ -34,7 +36,7 @@ class StringTable {
 
   void grow();
 
-  std::uint64_t _seed;
+  platform::TextHashKey _hashKey;
   std::uint32_t _mask;
   std::vector<std::uint32_t> _slots;  // open-addressed, at most half full: number + 1, or 0
   std::vector<String> _strings;

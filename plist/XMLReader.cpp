@@ -178,11 +178,15 @@ void XMLReader::setHandlers() {
   XML_SetCharacterDataHandler(_parser.get(), [](void* reader, const char* piece, int size) {
     deliver(reader, [=](XMLReader& self) { self.text({piece, static_cast<std::size_t>(size)}); });
   });
-  auto refuse = [](XMLReader& self) { self.fail(ErrorCode::unsupported, "an entity that the document declares"); };
-  XML_SetEntityDeclHandler(_parser.get(), [](void* reader, const char*, int, const char*, int, const char*, const char*,
-                                             const char*, const char*) { deliver(reader, decltype(refuse){}); });
-  XML_SetSkippedEntityHandler(_parser.get(),
-                              [](void* reader, const char*, int) { deliver(reader, decltype(refuse){}); });
+  // Before its first declaration: some take the parser a time that grows with the square of their length.
+  XML_SetStartDoctypeDeclHandler(_parser.get(), [](void* reader, const char*, const char*, const char*,
+                                                   int hasDeclarations) {
+    if (!hasDeclarations) return;
+    deliver(reader, [](XMLReader& self) { self.fail(ErrorCode::unsupported, "a document type with declarations"); });
+  });
+  XML_SetSkippedEntityHandler(_parser.get(), [](void* reader, const char*, int) {
+    deliver(reader, [](XMLReader& self) { self.fail(ErrorCode::unsupported, "an entity that is declared elsewhere"); });
+  });
 }
 
 /// The parser is plain C: nothing may be thrown through it.
@@ -199,6 +203,11 @@ void XMLReader::deliver(void* reader, Event event) {
   }
 }
 
+static ErrorCode codeOf(XML_Error reason) {
+  if (reason == XML_ERROR_NO_MEMORY) return ErrorCode::outOfMemory;
+  return reason == XML_ERROR_UNKNOWN_ENCODING ? ErrorCode::unsupported : ErrorCode::malformed;
+}
+
 /// All at once, as far as the parser takes it: each further piece would have it count the lines of the one before,
 /// and begin anew at the start of whatever was cut.
 void XMLReader::parse() {
@@ -213,8 +222,7 @@ void XMLReader::parse() {
   if (_error) return;
   if (status != XML_STATUS_OK) {
     XML_Error reason = XML_GetErrorCode(_parser.get());
-    ErrorCode code = reason == XML_ERROR_NO_MEMORY ? ErrorCode::outOfMemory : ErrorCode::malformed;
-    fail(code, XML_ErrorString(reason));
+    fail(codeOf(reason), XML_ErrorString(reason));
   } else if (_pending.empty()) {
     fail(ErrorCode::malformed, "<plist> without a value");
   }

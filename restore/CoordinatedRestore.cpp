@@ -1,8 +1,8 @@
 #include "restore/CoordinatedRestore.h"
 
-#include "coordination/CancellationReason.h"
-#include "coordination/TransactionStep.h"
-#include "core/Say.h"
+#include "core/CancellationReason.h"
+#include "core/TransactionStep.h"
+#include "platform/InstallCoordination.h"
 #include "platform/PropertyListSerialization.h"
 #include "restore/DemotionStatus.h"
 
@@ -10,20 +10,19 @@ namespace appsync {
 
 using namespace platform;
 
-constexpr std::string_view demotedDescription = "Restore demoted app";
-constexpr std::string_view plainDescription = "Restore app";
-
 bool AppsClient::prepareAppForRestoreUsingCoordination(const RestoreInput& input, std::uint64_t demotionStatus) {
   return demotionStatus != notDemoted ? _prepareDemotedAppForRestoreWithBundleId(input, demotionStatus)
                                       : _prepareNonDemotedAppForRestoreWithBundleId(input);
 }
 
 bool AppsClient::_prepareDemotedAppForRestoreWithBundleId(const RestoreInput& input, std::uint64_t demotionStatus) {
-  return CoordinatedRestore(*this, input, demotionStatus).restoreDemotedApp();
+  return contained(_platform, "prepareAppForRestoreUsingCoordination",
+                   [&] { return CoordinatedRestore(*this, input, demotionStatus).run(); });
 }
 
 bool AppsClient::_prepareNonDemotedAppForRestoreWithBundleId(const RestoreInput& input) {
-  return CoordinatedRestore(*this, input, notDemoted).restoreApp();
+  return contained(_platform, "prepareAppForRestoreUsingCoordination",
+                   [&] { return CoordinatedRestore(*this, input, notDemoted).run(); });
 }
 
 AppsClient::CoordinatedRestore::CoordinatedRestore(AppsClient& client, const RestoreInput& input,
@@ -32,44 +31,49 @@ AppsClient::CoordinatedRestore::CoordinatedRestore(AppsClient& client, const Res
       _platform(client._platform),
       _input(input),
       _demotionStatus(demotionStatus),
-      _bundleIdentifier(input.bundleIdentifier) {}
+      _demoted(demotionStatus != notDemoted),
+      _bundleIdentifier(input.bundleIdentifier),
+      _cancellationReason(cancellationReason(CancellationCode::restorePreparationFailed)) {}
 
-bool AppsClient::CoordinatedRestore::restoreDemotedApp() {
-  say(_platform, "processing app restore for demoted bundle '%{public}@' with install coordination", _bundleIdentifier);
-  beginStep(_platform.transactionLog, TransactionStep::restore, _bundleIdentifier, demotedDescription);
-  bool prepared = acquire(RVCoordinatorKind::RVRestoringDemotedAppInstallCoordinator);
-  if (prepared) {
-    _coordinator->setObserver(_client.weak_from_this());
-    prepared = addUserDataPromise() && addPlaceholderPromise();
-  }
-  say(_platform, "processing app restore for demoted app %{public}@ finished with status %d error %{public}@",
-      _bundleIdentifier, prepared, _error);
-  endStep(_platform.transactionLog, TransactionStep::restore, prepared, _bundleIdentifier, demotedDescription);
+bool AppsClient::CoordinatedRestore::run() {
+  const std::string_view description = _demoted ? "Restore demoted app" : "Restore app";
+  sayBeginning();
+  StepScope transaction(_platform, TransactionStep::restore, _bundleIdentifier, description, description);
+  const bool prepared = contained(_platform, "prepareAppForRestoreUsingCoordination", [this] { return prepare(); });
+  if (!_isStores) sayEnd(prepared);
+  transaction.end(prepared);
   if (!prepared) cancel();
   return prepared;
 }
 
-bool AppsClient::CoordinatedRestore::restoreApp() {
-  say(_platform, "processing app restore for non demoted bundle '%{public}@' with install coordination",
-      _bundleIdentifier);
-  beginStep(_platform.transactionLog, TransactionStep::restore, _bundleIdentifier, plainDescription);
-  bool prepared = acquire(RVCoordinatorKind::RVRestoringAppInstallCoordinator);
-  if (prepared && storeDeliversPackage()) {
-    endStep(_platform.transactionLog, TransactionStep::restore, true, _bundleIdentifier, plainDescription);
-    return true;
+void AppsClient::CoordinatedRestore::sayBeginning() const {
+  if (_demoted) {
+    say(_platform, "processing app restore for demoted bundle '%{public}@' with install coordination",
+        _bundleIdentifier);
+  } else {
+    say(_platform, "processing app restore for non demoted bundle '%{public}@' with install coordination",
+        _bundleIdentifier);
   }
-  if (prepared) {
-    _coordinator->setObserver(_client.weak_from_this());
-    prepared = addUserDataPromise() && addPlaceholderPromise() && leavePackageToStore();
-  }
-  say(_platform, "processing app restore for %{public}@ finished with status %d error %{public}@", _bundleIdentifier,
-      prepared, _error);
-  endStep(_platform.transactionLog, TransactionStep::restore, prepared, _bundleIdentifier, plainDescription);
-  if (!prepared) cancel();
-  return prepared;
 }
 
-bool AppsClient::CoordinatedRestore::acquire(RVCoordinatorKind kind) {
+void AppsClient::CoordinatedRestore::sayEnd(bool prepared) const {
+  if (_demoted) {
+    say(_platform, "processing app restore for demoted app %{public}@ finished with status %d error %{public}@",
+        _bundleIdentifier, prepared, _error);
+  } else {
+    say(_platform, "processing app restore for %{public}@ finished with status %d error %{public}@", _bundleIdentifier,
+        prepared, _error);
+  }
+}
+
+bool AppsClient::CoordinatedRestore::prepare() {
+  if (!acquire()) return false;
+  if (!_demoted && storeDeliversPackage()) return _isStores = true;
+  _coordinator->setObserver(_client.weak_from_this());
+  return addUserDataPromise() && addPlaceholderPromise() && (_demoted || leavePackageToStore());
+}
+
+bool AppsClient::CoordinatedRestore::acquire() {
   ErrorRef error;
   _metadata = _platform.propertyLists.propertyListWithData(Bytes(_input.harluneMetadata), &error);
   if (!_metadata.dictionary()) {
@@ -77,6 +81,8 @@ bool AppsClient::CoordinatedRestore::acquire(RVCoordinatorKind kind) {
     sayError(_platform, "failed to parse harlune metadata for '%{public}@'. err=%{public}@", _bundleIdentifier, _error);
     return false;
   }
+  const auto kind = _demoted ? RVCoordinatorKind::RVRestoringDemotedAppInstallCoordinator
+                             : RVCoordinatorKind::RVRestoringAppInstallCoordinator;
   _coordinator = _platform.installCoordination.coordinatorForAppWithBundleID(kind, _bundleIdentifier, RVClientSync,
                                                                              true, nullptr, &error);
   if (!_coordinator) {
@@ -86,7 +92,6 @@ bool AppsClient::CoordinatedRestore::acquire(RVCoordinatorKind kind) {
   return _coordinator != nullptr;
 }
 
-/// An earlier run of this restore handed the app over already.
 bool AppsClient::CoordinatedRestore::storeDeliversPackage() {
   const RVClientIdentifier client = _coordinator->appAssetPromiseResponsibleClientWithError();
   if (client != RVClientMercato) return false;
@@ -101,14 +106,9 @@ bool AppsClient::CoordinatedRestore::addUserDataPromise() {
   }
   auto promise = _client._userDataPromiseForBundleIdentifier(_bundleIdentifier);
   if (!promise) return true;
-  ErrorRef error;
-  if (!_coordinator->setUserDataPromise(promise, &error)) {
-    _error = error;
-    sayError(_platform, "Error %{public}@ adding out of band data promise for '%{public}@'", error, _bundleIdentifier);
-    return false;
-  }
-  say(_platform, "Added out of band user data promise for for %{public}@", _bundleIdentifier);
-  return true;
+  return step([&](ErrorRef* error) { return _coordinator->setUserDataPromise(promise, error); },
+              "Error %{public}@ adding out of band data promise for '%{public}@'",
+              "Added out of band user data promise for for %{public}@");
 }
 
 bool AppsClient::CoordinatedRestore::addPlaceholderPromise() {
@@ -119,39 +119,33 @@ bool AppsClient::CoordinatedRestore::addPlaceholderPromise() {
   _unattachedPlaceholder =
       _client._placeHolderForBundleIdentifierWithHarluneMetadata(_input, _metadata, _demotionStatus);
   if (!_unattachedPlaceholder) return false;
-  ErrorRef error;
-  if (!_coordinator->setPlaceholderPromise(_unattachedPlaceholder, &error)) {
-    _error = error;
-    sayError(_platform, "Error %{public}@ setting placeholder promise for '%{public}@'", error, _bundleIdentifier);
-    return false;
-  }
-  _unattachedPlaceholder = nullptr;
-  _client.shiftwellSetPlaceHolderPromiseForRestoreAppBundle(_bundleIdentifier);
-  say(_platform, "added placeholder promise for %{public}@", _bundleIdentifier);
-  return true;
+  return step(
+      [this](ErrorRef* error) {
+        if (!_coordinator->setPlaceholderPromise(_unattachedPlaceholder, error)) return false;
+        _unattachedPlaceholder = nullptr;
+        _client.shiftwellSetPlaceHolderPromiseForRestoreAppBundle(_bundleIdentifier);
+        return true;
+      },
+      "Error %{public}@ setting placeholder promise for '%{public}@'", "added placeholder promise for %{public}@");
 }
 
 bool AppsClient::CoordinatedRestore::leavePackageToStore() {
-  ErrorRef error;
-  if (!_coordinator->setAppAssetPromiseResponsibleClient(RVClientMercato, &error)) {
-    _error = error;
-    sayError(_platform, "Error %{public}@ setting RVClientMercato to satisfy app data promise for '%{public}@'", error,
-             _bundleIdentifier);
-    return false;
-  }
-  say(_platform, "set RVClientMercato to satisfy app asset promise for %{public}@", _bundleIdentifier);
-  return true;
+  return step(
+      [this](ErrorRef* error) { return _coordinator->setAppAssetPromiseResponsibleClient(RVClientMercato, error); },
+      "Error %{public}@ setting RVClientMercato to satisfy app data promise for '%{public}@'",
+      "set RVClientMercato to satisfy app asset promise for %{public}@");
 }
 
 void AppsClient::CoordinatedRestore::cancel() {
-  const ErrorRef reason = cancellationReason(CancellationCode::restorePreparationFailed);
   if (_coordinator) {
     say(_platform, "Cancelling coordinator for appBundleIdentifier:%{public}@", _bundleIdentifier);
-    _coordinator->cancelForReason(reason, RVClientSync);
+    contained(_platform, "cancelForReason",
+              [this] { _coordinator->cancelForReason(_cancellationReason, RVClientSync); });
   }
   if (_unattachedPlaceholder) {
     say(_platform, "Cancelling placeholder for appBundleIdentifier:%{public}@", _bundleIdentifier);
-    _unattachedPlaceholder->cancelForReason(reason, RVClientSync);
+    contained(_platform, "cancelForReason",
+              [this] { _unattachedPlaceholder->cancelForReason(_cancellationReason, RVClientSync); });
   }
   _client.shiftwellCancelledCoordinatorForRestoreAppBundle(_bundleIdentifier);
 }

@@ -10,8 +10,6 @@ using namespace platform;
 constexpr std::int64_t secondsPerPlaceholder = 5;
 
 bool AppsClient::_stopAwaitingPlaceholder(std::string_view bundleIdentifier) {
-  // Removed first: should that fail for want of memory, the group is not left for an app that is still there to be
-  // left for again.
   if (!_placeholdersForRestoringApps.erase(bundleIdentifier)) return false;
   _restorePlaceHoldersWaitGroup.leave();
   --_restoringPlaceholderCount;
@@ -46,12 +44,14 @@ void AppsClient::rcDidInstallPlaceHolderForAppBundle(std::optional<std::string_v
 }
 
 void AppsClient::_waitForPlaceholderInstalls() {
-  const std::int64_t seconds = _restoringPlaceholderCount.load() * secondsPerPlaceholder;
-  const auto deadline = _platform.clock.now() + std::chrono::seconds(seconds);
-  say(_platform, "Will wait for %lld seconds for %lld placeholders to install", seconds,
-      _restoringPlaceholderCount.load());
-  // Outside the queue: the reports it waits for run there.
-  _restorePlaceHoldersWaitGroup.wait(_platform.clock, deadline);
+  contained(_platform, "_waitForPlaceholderInstalls", [this] {
+    const std::int64_t seconds = _restoringPlaceholderCount.load() * secondsPerPlaceholder;
+    const auto deadline = _platform.clock.now() + std::chrono::seconds(seconds);
+    say(_platform, "Will wait for %lld seconds for %lld placeholders to install", seconds,
+        _restoringPlaceholderCount.load());
+    // Outside the queue: the reports it waits for run there.
+    _restorePlaceHoldersWaitGroup.wait(_platform.clock, deadline);
+  });
   SerialQueue::Block block(_restoreQueue);
   say(_platform, "Finished waiting for placeholder installs");
   _finishedWaitingForPlaceHolderInstalls = true;

@@ -1,12 +1,12 @@
-#include <unordered_set>
 #include <utility>
 
 #include "core/AppsClient.h"
-#include "core/Paths.h"
 #include "core/PropertyListFile.h"
 #include "core/Say.h"
+#include "platform/DevicePaths.h"
 #include "platform/FileSystem.h"
 #include "platform/PropertyListSerialization.h"
+#include "platform/TextTable.h"
 #include "restore/DemotionStatus.h"
 
 namespace appsync {
@@ -18,6 +18,7 @@ namespace {
 /// The demoted apps of the backup service's list; an absent or odd list has none.
 class DemotedApps {
  public:
+  DemotedApps() = default;
   explicit DemotedApps(const Value& list)
       : _automatic(identifiersOf(list, "AutomaticDowngrades")),
         _intentional(identifiersOf(list, "IntentionalDowngrades")) {}
@@ -28,7 +29,7 @@ class DemotedApps {
   }
 
  private:
-  using Identifiers = std::unordered_set<std::string_view>;  // borrowed from the list
+  using Identifiers = platform::BorrowedTextSet;  // of the list
 
   static Identifiers identifiersOf(const Value& list, std::string_view key) {
     Identifiers identifiers;
@@ -47,31 +48,32 @@ class DemotedApps {
 bool createsPlaceholders(std::int32_t restoreType) { return restoreType == 2 || restoreType == 3; }
 
 void fileRestoreListAway(const Platform& platform) {
-  platform.fileSystem.removeItem(restoreListLogPath);
-  ErrorRef error;
-  if (!platform.fileSystem.moveItem(restoreListPath, restoreListLogPath, &error)) {
-    say(platform, "failed to copy harlune metadata. err=%{public}@", error);
-  }
+  contained(platform, "removeItem", [&] { platform.fileSystem.removeItem(restoreListLogPath); });
+  contained(platform, "moveItem", [&] {
+    ErrorRef error;
+    if (!platform.fileSystem.moveItem(restoreListPath, restoreListLogPath, &error)) {
+      say(platform, "failed to copy harlune metadata. err=%{public}@", error);
+    }
+  });
 }
 
 }  // namespace
 
-bool AppsClient::reconcileRestoreOfType(std::int32_t type, ErrorRef* error) try {
+bool AppsClient::reconcileRestoreOfType(std::int32_t type, ErrorRef* error) {
+  // Nobody calls a second time, so each piece is done whatever became of the one before.
   say(_platform, "reconcileRestoreOfType %d", type);
-  _notifyPanello(_platform, true);
-  _platform.fileSystem.createDirectory(pluginDirectory, true, {});
+  contained(_platform, "_notifyPanello", [this] { _notifyPanello(_platform, true); });
+  contained(_platform, "createDirectory", [this] { _platform.fileSystem.createDirectory(pluginDirectory, true, {}); });
   ErrorRef backupError;
-  if (createsPlaceholders(type)) {
+  contained(_platform, "reconcileRestoreOfType", [&] {
+    if (!createsPlaceholders(type)) return;
     if (_backupManager && _backupManager->tessaroShouldCreateAppPlaceholdersWithError(&backupError)) {
       _processHarluneRestoreInfo();
     } else {
       say(_platform, "Will not reconcile restore of type %d - error %{public}@", type, backupError);
     }
-  }
+  });
   setError(error, backupError);
-  return true;
-} catch (...) {
-  swallowException(_platform, "reconcileRestoreOfType");
   return true;
 }
 
@@ -80,26 +82,34 @@ bool AppsClient::_processHarluneRestoreInfo() {
     say(_platform, "no harlune restore plist found - skipping processing of harlune restored apps");
     return true;
   }
-  bool result = false;
-  ErrorRef error;
-  if (auto bytes = _platform.fileSystem.readFile(restoreListPath, &error)) {
-    say(_platform, "processing harlune restore info");
-    const Value list = _platform.propertyLists.propertyListWithData(std::move(*bytes), &error);
-    if (list.dictionary()) {
-      result = _restoreAppsOfList(*list.dictionary());
-    } else {
-      say(_platform, "failed to parse harlune app restore info. err=%{public}@", error);
-    }
-  } else {
-    say(_platform, "failed to read harlune app restore info. err=%{public}@", error);
-  }
+  const bool result = contained(_platform, "_processHarluneRestoreInfo", [this] { return _restoreAppsOfFile(); });
   fileRestoreListAway(_platform);
   return result;
 }
 
+bool AppsClient::_restoreAppsOfFile() {
+  ErrorRef error;
+  auto bytes = _platform.fileSystem.readFile(restoreListPath, &error);
+  if (!bytes) {
+    say(_platform, "failed to read harlune app restore info. err=%{public}@", error);
+    return false;
+  }
+  say(_platform, "processing harlune restore info");
+  const Value list = _platform.propertyLists.propertyListWithData(std::move(*bytes), &error);
+  if (!list.dictionary()) {
+    say(_platform, "failed to parse harlune app restore info. err=%{public}@", error);
+    return false;
+  }
+  return _restoreAppsOfList(*list.dictionary());
+}
+
 bool AppsClient::_restoreAppsOfList(const Dictionary& list) {
-  const Value demotedList = _loadDemotedAppsPlist(_platform, demotedAppsPath);
-  const DemotedApps demoted(demotedList);
+  Value demotedList;
+  DemotedApps demoted;
+  contained(_platform, "_loadDemotedAppsPlist", [&] {
+    demotedList = _loadDemotedAppsPlist(_platform, demotedAppsPath);
+    demoted = DemotedApps(demotedList);
+  });
   say(_platform, LogCategory::summary, "Demoted Apps: %{public}@", demotedList);
   bool result = false;
   for (const auto& [identifier, entry] : list) {
@@ -123,18 +133,8 @@ bool AppsClient::_restoreAppsOfList(const Dictionary& list) {
 }
 
 Value AppsClient::_loadDemotedAppsPlist(const Platform& platform, std::string_view path, ErrorRef* error) {
-  auto bytes = platform.fileSystem.readFile(path, error);
-  if (!bytes || bytes->empty()) return {};
-  Value root = platform.propertyLists.propertyListWithData(std::move(*bytes), error);
-  if (root.isAbsent()) {
-    sayError(platform, "couldn't parse demoted apps list");
-    return {};
-  }
-  if (!root.dictionary()) {
-    sayError(platform, "demoted apps list is not a dictionary");
-    return {};
-  }
-  return root;
+  return readList(platform, path, Value::Kind::dictionary, "couldn't parse demoted apps list",
+                  "demoted apps list is not a dictionary", error);
 }
 
 }  // namespace appsync

@@ -1,10 +1,11 @@
-#include "coordination/CancellationReason.h"
 #include "core/AppsClient.h"
+#include "core/CancellationReason.h"
+#include "core/Names.h"
 #include "core/PathCheck.h"
-#include "core/Paths.h"
 #include "core/PropertyListFile.h"
-#include "core/Say.h"
+#include "core/ServiceCall.h"
 #include "platform/Installer.h"
+#include "platform/OBNumbers.h"
 #include "restore/DemotionStatus.h"
 
 namespace appsync {
@@ -44,46 +45,38 @@ bool setAttributes(const Platform& platform, RVPlaceholder& placeholder, const D
     attributes->setBundleVersion(stringOf(metadata["bundleVersion"]));
   }
   ErrorRef error;
-  if (!placeholder.setPlaceholderAttributes(attributes, &error)) {
-    sayError(platform, "Error %{public}@ setting placeholder attributes for '%{public}@'", error, bundleIdentifier);
-    return false;
-  }
-  say(platform, "set %{public}@ placeholder attributes for %{public}@", attributes, bundleIdentifier);
-  return true;
+  return callAndTell(
+      platform, bundleIdentifier, error,
+      [&](ErrorRef* failed) { return placeholder.setPlaceholderAttributes(attributes, failed); },
+      "Error %{public}@ setting placeholder attributes for '%{public}@'",
+      "set %{public}@ placeholder attributes for %{public}@", attributes);
 }
 
 bool setStoreMetadata(const Platform& platform, RVPlaceholder& placeholder, const Value& metadata,
                       std::string_view bundleIdentifier) {
   ErrorRef error;
-  if (!placeholder.setMetadata(platform.installer.makeStoreMetadata(metadata), &error)) {
-    sayError(platform, "Error %{public}@ setting store metadata for '%{public}@'", error, bundleIdentifier);
-    return false;
-  }
-  say(platform, "set store metadata on placeholder for %{public}@", bundleIdentifier);
-  return true;
+  return callAndTell(
+      platform, bundleIdentifier, error,
+      [&](ErrorRef* failed) { return placeholder.setMetadata(platform.installer.makeStoreMetadata(metadata), failed); },
+      "Error %{public}@ setting store metadata for '%{public}@'", "set store metadata on placeholder for %{public}@");
 }
 
 bool setSinfData(const Platform& platform, RVPlaceholder& placeholder, std::optional<BytesView> sinfData,
                  std::string_view bundleIdentifier) {
   if (!sinfData) return true;
   ErrorRef error;
-  if (!placeholder.setSinfData(*sinfData, &error)) {
-    sayError(platform, "Error %{public}@ setting SINF data for '%{public}@'", error, bundleIdentifier);
-    return false;
-  }
-  say(platform, "set SINF data on placeholder for %{public}@", bundleIdentifier);
-  return true;
+  return callAndTell(
+      platform, bundleIdentifier, error, [&](ErrorRef* failed) { return placeholder.setSinfData(*sinfData, failed); },
+      "Error %{public}@ setting SINF data for '%{public}@'", "set SINF data on placeholder for %{public}@");
 }
 
 bool closeConfiguration(const Platform& platform, RVPlaceholder& placeholder, std::string_view bundleIdentifier) {
   ErrorRef error;
-  if (!placeholder.setConfigurationCompleteWithError(&error)) {
-    sayError(platform, "Error %{public}@ setting placeholder configuration as complete for '%{public}@'", error,
-             bundleIdentifier);
-    return false;
-  }
-  say(platform, "set placeholder configuration complete for %{public}@", bundleIdentifier);
-  return true;
+  return callAndTell(
+      platform, bundleIdentifier, error,
+      [&](ErrorRef* failed) { return placeholder.setConfigurationCompleteWithError(failed); },
+      "Error %{public}@ setting placeholder configuration as complete for '%{public}@'",
+      "set placeholder configuration complete for %{public}@");
 }
 
 }  // namespace
@@ -99,18 +92,20 @@ PlaceholderRef AppsClient::_placeHolderForBundleIdentifierWithHarluneMetadata(co
   std::uint64_t iconSize = 0;
   writeIconData(input.iconData, iconPath, &iconSize, identifier, ownerAttributes());
 
+  const ErrorRef reason = cancellationReason(CancellationCode::restorePreparationFailed);
   auto placeholder =
       _placeHolderForBundleIdentifier(identifier, displayNameOf(entries, identifier), installTypeFor(demotionStatus));
   if (!placeholder) return nullptr;
-  const bool hasIcon =
-      iconSize == 0 || _createIconPromiseForBundleIdentifier(identifier, iconPath, iconSize, placeholder, false);
-  if (hasIcon && setAttributes(_platform, *placeholder, entries, identifier) &&
-      setStoreMetadata(_platform, *placeholder, metadata, identifier) &&
-      setSinfData(_platform, *placeholder, input.sinfData, identifier) &&
-      closeConfiguration(_platform, *placeholder, identifier)) {
-    return placeholder;
-  }
-  placeholder->cancelForReason(cancellationReason(CancellationCode::restorePreparationFailed), RVClientSync);
+  const bool configured = contained(_platform, "_placeHolderForBundleIdentifierWithHarluneMetadata", [&] {
+    const bool hasIcon =
+        iconSize == 0 || _createIconPromiseForBundleIdentifier(identifier, iconPath, iconSize, placeholder, false);
+    return hasIcon && setAttributes(_platform, *placeholder, entries, identifier) &&
+           setStoreMetadata(_platform, *placeholder, metadata, identifier) &&
+           setSinfData(_platform, *placeholder, input.sinfData, identifier) &&
+           closeConfiguration(_platform, *placeholder, identifier);
+  });
+  if (configured) return placeholder;
+  placeholder->cancelForReason(reason, RVClientSync);
   return nullptr;
 }
 

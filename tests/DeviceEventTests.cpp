@@ -6,10 +6,10 @@
 #include <mutex>
 #include <thread>
 
-#include "device/Boundary.h"
-#include "device/EventQueue.h"
-#include "device/NotificationService.h"
-#include "device/ObserverList.h"
+#include "device/boundary/Boundary.h"
+#include "device/events/EventQueue.h"
+#include "device/events/ObserverList.h"
+#include "device/services/NotificationService.h"
 
 namespace {
 

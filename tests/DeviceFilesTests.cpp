@@ -4,17 +4,19 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <cerrno>
 #include <csignal>
 #include <filesystem>
 #include <fstream>
 #include <functional>
 #include <random>
+#include <thread>
 
-#include "device/FileTree.h"
-#include "device/OverlayFileTree.h"
-#include "device/Store.h"
-#include "device/TemporaryFiles.h"
+#include "device/files/FileTree.h"
+#include "device/files/OverlayFileTree.h"
+#include "device/files/TemporaryFiles.h"
+#include "device/store/Store.h"
 
 namespace {
 
@@ -413,6 +415,36 @@ TEST(DatabaseStore, commitsAllOrNothing) {
   ASSERT_NE(store, nullptr) << error->describe();
   ASSERT_EQ(store->load().size(), 1u);
   EXPECT_EQ(store->load()[0].value, deep);
+}
+
+TEST(DatabaseStore, isCopiedWholeWhileItIsWritten) {
+  Folder folder;
+  auto store = openDatabaseStore(folder / "device.db");
+  ASSERT_TRUE(store);
+  // Each commit changes both records, and enough pages for the log to be begun anew now and then.
+  std::atomic<bool> over = false;
+  std::jthread writer([&] {
+    for (int turn = 1; turn <= 600; ++turn) {
+      const Value value(std::string(30000, static_cast<char>('a' + turn % 26)) + std::to_string(turn));
+      store->write({{"app", "one", value}, {"app", "other", value}});
+    }
+    over = true;
+  });
+  for (bool last = false; !last;) {
+    last = over;
+    ErrorRef error;
+    auto copy = copyDatabaseStore(folder / "device.db", &error);
+    ASSERT_TRUE(copy) << error->describe();
+    auto records = copy->load();
+    if (records.empty() && !last) continue;
+    ASSERT_EQ(records.size(), 2U);
+    EXPECT_EQ(records[0].value, records[1].value);
+    if (last) {
+      EXPECT_EQ(records[0].value.string()->substr(30000), "600");
+    }
+  }
+  writer.join();
+  EXPECT_TRUE(store->commit({{"app", "third", 3}})) << "a copy stands in nobody's way";
 }
 
 TEST(DatabaseStore, refusesWhatIsNoStore) {

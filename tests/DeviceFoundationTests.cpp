@@ -4,12 +4,12 @@
 #include <limits>
 #include <thread>
 
-#include "device/Boundary.h"
-#include "device/FileSystemService.h"
-#include "device/Journal.h"
-#include "device/SystemLogService.h"
-#include "device/TSSupportService.h"
-#include "device/TransactionLogService.h"
+#include "device/boundary/Boundary.h"
+#include "device/boundary/Journal.h"
+#include "device/services/FileSystemService.h"
+#include "device/services/SystemLogService.h"
+#include "device/services/TSSupportService.h"
+#include "device/services/TransactionLogService.h"
 #include "platform/Describe.h"
 #include "platform/TSAsset.h"
 

@@ -2,7 +2,7 @@
 #include <archive_entry.h>
 #include <gtest/gtest.h>
 
-#include "device/Package.h"
+#include "device/package/Package.h"
 #include "plist/PropertyList.h"
 #include "tests/DeviceRig.h"
 #include "tests/ZipArchive.h"
@@ -109,7 +109,7 @@ TEST(DevicePackages, TakesWhatKeepsEveryLimit) {
 }
 
 TEST(DevicePackages, RefusesEveryCutAndSurvivesEveryFlippedByte) {
-  auto whole = packageOf(maps, "1");
+  auto whole = packageOf(maps, "1", {.manifestKeys = 9, .files = 1, .fileSize = 10});
   auto files = device::makeMemoryFileTree();
   auto accepts = [&](const Bytes& package) {
     EXPECT_TRUE(files->createDirectory(target, false, {}));

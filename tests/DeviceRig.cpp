@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <filesystem>
+#include <utility>
 
 #include "plist/PropertyList.h"
 
@@ -47,7 +48,8 @@ void DeviceRig::open() {
   _events = events.get();
   device::DeviceOptions options;
   options.changed = [this](const device::AppStatus& app) {
-    _told.push_back(app.id + ' ' + app.state + (app.lastOutcome.empty() ? "" : ' ' + app.lastOutcome));
+    std::string outcome = device::nameOfOutcome(app.lastOutcome);
+    _told.push_back(app.id + ' ' + device::nameOfState(app.state) + (outcome.empty() ? "" : ' ' + outcome));
   };
   ErrorRef error;
   _device = device::LocalDevice::open(_parts->lendFiles(), _parts->lendStore(), std::move(events), std::move(options),
@@ -59,6 +61,12 @@ void DeviceRig::reopen() {
   _device.reset();
   _told.clear();
   open();
+}
+
+void DeviceRig::meanwhile(const char* operation, std::function<void()> what) {
+  _parts->watch = [operation, what = std::move(what)](std::string_view happens, std::string_view) mutable {
+    if (happens == operation && what) std::exchange(what, nullptr)();
+  };
 }
 
 void DeviceRig::breakStore(bool broken) { _parts->broken = broken; }
@@ -80,11 +88,11 @@ std::shared_ptr<platform::RVPlaceholder> DeviceRig::placeholder(const std::strin
   icon->setComplete(true);
   EXPECT_TRUE(result->setIconPromise(icon));
   auto attributes = service.makePlaceholderAttributesWithInfoPlistDictionary(
-      dictionaryOf({{"KBBundleIconFile", "missing"}, {"Genre", "Travel"}}));
+      filledOut(dictionaryOf({{"KBBundleIconFile", "missing"}, {"Genre", "Travel"}}), 40, 1));
   attributes->setBundleVersion("2");
   attributes->setLaunchProhibited(true);
   EXPECT_TRUE(result->setPlaceholderAttributes(attributes));
-  EXPECT_TRUE(result->setMetadata(platform().installer.makeStoreMetadata(dictionaryOf({{"vantorId", "placeholder"}}))));
+  EXPECT_TRUE(result->setMetadata(platform().installer.makeStoreMetadata(placeholderMetadata())));
   if (configured) {
     EXPECT_TRUE(result->setConfigurationCompleteWithError());
   }
@@ -129,8 +137,8 @@ std::size_t DeviceRig::containerCount() { return files().list(containers).value(
 
 std::string DeviceRig::stateOf(const std::string& app) {
   auto status = device().app(app);
-  if (!status || status->state.empty()) return "";
-  return status->state + ' ' + std::to_string(status->installType) +
+  if (!status || !status->isOnDevice()) return "";
+  return device::nameOfState(status->state) + (' ' + std::to_string(status->installType)) +
          (status->version.empty() ? "" : ' ' + status->version);
 }
 

@@ -88,13 +88,16 @@ class DeviceRig {
   device::ManualEventQueue& events() { return *_events; }
   /// As a process that ends and another that comes. What was not delivered is lost.
   void reopen();
+  /// Somebody else does `what` in the middle of the next such file operation.
+  void meanwhile(const char* operation, std::function<void()> what);
   /// From now on the store takes nothing.
   void breakStore(bool broken);
   /// What the owner was told, as "app state outcome".
   const Lines& told() const { return _told; }
 
   Coordinator coordinator(Kind kind, const std::string& app = maps, platform::RVClientIdentifier client = 3);
-  /// A configured placeholder with an icon, version "2" and metadata.
+  static Value placeholderMetadata() { return filledOut(dictionaryOf({{"vantorId", "placeholder"}}), 25, 1); }
+  /// A configured placeholder with an icon, version "2" and metadata, the manifest one of 40 keys.
   std::shared_ptr<platform::RVPlaceholder> placeholder(const std::string& app = maps, std::uint64_t type = 4,
                                                        bool configured = true);
   /// Options of type 4 and an app asset promise for the package of that app.

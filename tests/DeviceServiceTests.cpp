@@ -81,6 +81,46 @@ TEST_P(DeviceServices, WhatThePersonDoes) {
   EXPECT_TRUE(platform().installer.CorvaneLookupUninstalled().dictionary()->contains(notes));
 }
 
+TEST_P(DeviceServices, WhatIsRemovedWhileTheStoreFinishesItStaysRemoved) {
+  device::StoreInstall alone;
+  alone.createsCoordinator = false;
+  write(packagePath(notes), packageOf(notes, "3"));
+  for (const std::string& package : {std::string(), packagePath(notes)}) {
+    SCOPED_TRACE(package);
+    ASSERT_TRUE(device().beginStoreInstall(notes, alone));
+    meanwhile("syncItem", [&] { EXPECT_TRUE(device().uninstallByPerson(notes)); });
+    ErrorRef error;
+    EXPECT_FALSE(device().finishStoreInstall(notes, package, &error));
+    EXPECT_EQ(error->description(), "com.example.notes was removed meanwhile");
+    EXPECT_EQ(stateOf(notes), "");
+    EXPECT_EQ(containerCount(), 0u);
+    EXPECT_TRUE(files().fileExists(packagePath(notes)));
+  }
+  // Nor is anything done to an install that has taken its place.
+  ASSERT_TRUE(device().beginStoreInstall(notes, alone));
+  meanwhile("syncItem", [&] {
+    EXPECT_TRUE(device().uninstallByPerson(notes));
+    begin(Kind::RVInitiatingAppInstallCoordinator, notes);
+  });
+  EXPECT_FALSE(device().finishStoreInstall(notes, packagePath(notes)));
+  EXPECT_EQ(stateOf(notes), "placeholder 4 2");
+  EXPECT_EQ(device().status().coordinators.size(), 1u);
+  EXPECT_EQ(containerCount(), 1u);
+}
+
+TEST_P(DeviceServices, APlaceholderThatIsNotTakenLeavesNothing) {
+  meanwhile("createNew", [&] { coordinator(Kind::RVInitiatingAppInstallCoordinator, notes); });
+  EXPECT_FALSE(device().beginStoreInstall(notes, {}));
+  EXPECT_EQ(containerCount(), 0u);
+  // Cancelled while its files are written, it takes its coordinator along.
+  auto offered = placeholder();
+  meanwhile("createNew", [&] { EXPECT_TRUE(offered->cancelForReason(nullptr, 3)); });
+  EXPECT_FALSE(coordinator(Kind::RVInitiatingAppInstallCoordinator)->setPlaceholderPromise(offered));
+  EXPECT_EQ(stateOf(), "");
+  EXPECT_EQ(device().status().coordinators.size(), 1u);  // the other app's
+  EXPECT_EQ(containerCount(), 0u);
+}
+
 TEST_P(DeviceServices, NamesThatAreNoIdentifiers) {
   for (const char* name : {"../etc", "", "a/b"}) {
     ErrorRef error;
@@ -245,15 +285,15 @@ TEST(DeviceThreads, InstallsCancelsAndQueriesAtOnce) {
   device->events().drain();
   std::size_t present = 0;
   for (const auto& app : device->status().apps) {
-    if (app.state.empty()) continue;
+    if (!app.isOnDevice()) continue;
     ++present;
     // A placeholder is there for an open coordinator only.
-    EXPECT_EQ(app.state == "placeholder",
+    EXPECT_EQ(app.state == device::AppState::placeholder,
               service.coordinatorForAppWithBundleID(Kind::RVAppInstallCoordinator, app.id, 3, false) != nullptr &&
-                  app.state != "updating" && app.state != "installed")
-        << app.id << ' ' << app.state;
+                  app.state != device::AppState::updating && app.state != device::AppState::installed)
+        << app.id << ' ' << device::nameOfState(app.state);
     EXPECT_TRUE(device->files().fileExists(
-        *registry.applicationProxyForIdentifier(app.id, app.state == "placeholder")->bundleURL));
+        *registry.applicationProxyForIdentifier(app.id, app.state == device::AppState::placeholder)->bundleURL));
   }
   EXPECT_EQ(device->files().list(containers)->size(), present);
   registry.removeObserver(observer.get());

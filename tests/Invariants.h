@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-#include "device/Boundary.h"
+#include "device/boundary/Boundary.h"
 
 namespace tests {
 

@@ -1,12 +1,17 @@
+#include <dlfcn.h>
 #include <unistd.h>
 
+#include <cstdio>
 #include <filesystem>
+#include <vector>
 
 #include "contract/Host.h"
 #include "device/LocalDevice.h"
 #include "tests/SampleContent.h"
 
 // The local device under the contract suite: on disk and in memory with events delivered by hand, and with its threads.
+// The suite is loaded like a plug-in: what it gives to the device and gets from it crosses from one copy of platform/
+// to another.
 namespace {
 
 class LocalHost final : public contract::Host {
@@ -41,11 +46,20 @@ class LocalHost final : public contract::Host {
   std::unique_ptr<device::LocalDevice> _device;
 };
 
+using Hosts = std::vector<contract::NamedHost>;
+using RunContract = int (*)(int count, char** arguments, const Hosts& hosts);
+
 }  // namespace
 
-std::vector<contract::NamedHost> contract::hosts() {
+int main(int count, char** arguments) {
   using Medium = LocalHost::Medium;
-  return {{"Disk", [] { return std::make_unique<LocalHost>(Medium::disk, device::makeManualEventQueue()); }},
-          {"Memory", [] { return std::make_unique<LocalHost>(Medium::memory, device::makeManualEventQueue()); }},
-          {"Threads", [] { return std::make_unique<LocalHost>(Medium::memory, device::makeThreadedEventQueue()); }}};
+  const Hosts hosts = {
+      {"Disk", [] { return std::make_unique<LocalHost>(Medium::disk, device::makeManualEventQueue()); }},
+      {"Memory", [] { return std::make_unique<LocalHost>(Medium::memory, device::makeManualEventQueue()); }},
+      {"Threads", [] { return std::make_unique<LocalHost>(Medium::memory, device::makeThreadedEventQueue()); }}};
+  void* suite = ::dlopen(CONTRACT_SUITE, RTLD_NOW | RTLD_LOCAL);
+  void* symbol = suite ? ::dlsym(suite, "runContract") : nullptr;
+  if (symbol) return reinterpret_cast<RunContract>(symbol)(count, arguments, hosts);
+  std::fprintf(stderr, "%s\n", ::dlerror());
+  return 1;
 }

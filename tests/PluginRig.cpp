@@ -8,10 +8,7 @@
 #include "platform/Describe.h"
 #include "platform/FileSystem.h"
 #include "platform/NotificationCenter.h"
-#include "platform/Plugin.h"
 #include "plist/PropertyList.h"
-
-extern "C" const platform::PluginTable* TSPluginTable();
 
 namespace tests {
 
@@ -151,11 +148,7 @@ PluginRig::~PluginRig() {
 }
 
 void PluginRig::load() {
-  const platform::PluginTable* table = TSPluginTable();
-  ASSERT_EQ(table->interfaceVersion, platform::pluginInterfaceVersion);
-  ASSERT_STREQ(table->dataclass, "Application");
-  _client = table->create(platform());
-  ASSERT_TRUE(_client);
+  _client = _plugin.create(platform());
   _daemon.emplace(*_device, *_client);
 }
 

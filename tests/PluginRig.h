@@ -13,7 +13,8 @@
 #include "platform/TSDeviceService.h"
 #include "tests/SampleContent.h"
 #include "tests/SharedParts.h"
-#include "tsd/Daemon.h"
+#include "tsd/daemon/Daemon.h"
+#include "tsd/daemon/PluginLoader.h"
 
 namespace tests {
 
@@ -68,7 +69,8 @@ class DaemonTransfers final : public platform::TSDeviceService {
   std::vector<std::function<void(ErrorRef)>> _completions;
 };
 
-/// A plug-in on a device in memory, with a daemon around it that calls it and writes down all that crosses.
+/// The plug-in, loaded from its library, on a device in memory, with a daemon around it that calls it and writes down
+/// all that crosses.
 class PluginRig {
  public:
   struct Options {
@@ -142,6 +144,7 @@ class PluginRig {
   std::vector<const device::CallRecord*> recordsIn(std::string_view operation, std::size_t nth) const;
 
   const Options _options;
+  const tsd::PluginLoader _plugin{SHIPPED_PLUGIN};
   SharedParts _parts;
   DaemonTransfers _transfers;
   std::vector<device::CallRecord> _records;  // written under the journal's lock

@@ -9,11 +9,11 @@
 #include <random>
 #include <stdexcept>
 
-#include "device/PowerLog.h"
 #include "platform/OBApplicationWorkspace.h"
 #include "plist/PropertyList.h"
 #include "tests/PluginRig.h"
-#include "tsd/FileConduit.h"
+#include "tests/PowerLog.h"
+#include "tsd/conduit/FileConduit.h"
 
 namespace tests {
 namespace {
@@ -53,15 +53,18 @@ struct Picture {
     std::erase_if(files, [](const auto& file) { return !isPromised(file.first); });
     std::size_t known = 0;
     for (const auto& app : status.apps) {
-      apps[app.id] = app.state + ' ' + app.version + ' ' + std::to_string(app.installType) + ' ' + app.lastOutcome;
-      if (app.state.empty()) continue;
-      auto proxy = rig.platform().workspace.applicationProxyForIdentifier(app.id, app.state == "placeholder");
+      apps[app.id] = device::nameOfState(app.state) + (' ' + app.version) + ' ' + std::to_string(app.installType) +
+                     ' ' + device::nameOfOutcome(app.lastOutcome);
+      if (!app.isOnDevice()) continue;
+      auto proxy =
+          rig.platform().workspace.applicationProxyForIdentifier(app.id, app.state == device::AppState::placeholder);
       addContent(rig.device().files(), *proxy->bundleContainerURL, "", containers[app.id]);
       ++known;
     }
     if (rig.device().files().list("/var/containers/Bundle/Application")->size() != known) rest += "stray containers; ";
     for (const auto& app : status.home) rest += app + ' ';
-    for (const auto& each : status.coordinators) rest += each.app + ' ' + each.kind + std::to_string(each.client) + ' ';
+    for (const auto& each : status.coordinators)
+      rest += each.app + ' ' + device::shortNameOfKind(each.kind) + std::to_string(each.client) + ' ';
     rest += std::to_string(status.syncing);
   }
 
@@ -100,7 +103,7 @@ class PowerLoss : public testing::Test {
   ~PowerLoss() override { std::filesystem::remove_all(_folder); }
 
   void makeHost(const std::string& options) const {
-    std::string command = "cd '" + _folder + "' && '" TSD_PROGRAM "' sample --package-size 3000 " + options;
+    std::string command = "cd '" + _folder + "' && '" TSD_PROGRAM "' sample --package-size 3000 --files 3 " + options;
     if (std::system((command + " >sample.out").c_str()) != 0) throw std::runtime_error(command);
   }
 
@@ -216,7 +219,7 @@ class PowerLoss : public testing::Test {
     }
   }
 
-  void lose(std::size_t count, device::PowerLog::Rest rest, std::uint64_t seed, Play again) {
+  void lose(std::size_t count, PowerLog::Rest rest, std::uint64_t seed, Play again) {
     std::mt19937_64 numbers(seed);
     auto dice = [&numbers](std::size_t below) { return static_cast<std::size_t>(numbers() % below); };
     auto files = _log->filesAfter(count, rest, dice);
@@ -232,7 +235,7 @@ class PowerLoss : public testing::Test {
 
   /// Every seventeenth step, or all of them when the environment says so.
   void loseEverywhere(Play play) {
-    using Rest = device::PowerLog::Rest;
+    using Rest = PowerLog::Rest;
     record(play);
     if (HasFatalFailure()) return;
     const char* chosen = std::getenv("APPSYNC_POWER_LOSS");
@@ -258,7 +261,7 @@ class PowerLoss : public testing::Test {
 
   std::string _folder;
   tsd::Console _console;
-  const std::shared_ptr<device::PowerLog> _log = std::make_shared<device::PowerLog>();
+  const std::shared_ptr<PowerLog> _log = std::make_shared<PowerLog>();
   PluginRig* _rig = nullptr;
   std::size_t _begin = 0, _reconciles = 0, _reconciled = 0;
   std::vector<List> _lists;

@@ -74,6 +74,9 @@ class Generator {
   std::string text() {
     static const std::vector<std::string> pieces = {"a", "B7", "<&>", " ", "\n", "é", "€", "\U0001F600", "longer text"};
     std::string text;
+    // On both sides of what a count of bytes or an arena's block changes with.
+    static constexpr std::size_t sizes[] = {14, 15, 16, 255, 256, 257, 512, 65535, 65536, 65537};
+    if (below(200) == 0) return std::string(sizes[below(below(10) ? 7 : 10)], 'x');
     for (std::size_t count = below(below(8) ? 4 : 60); count > 0; --count) text += pieces[below(pieces.size())];
     return text;
   }
@@ -103,10 +106,14 @@ class Generator {
   Model model(int depth) {
     if (depth == 0 || below(3) == 0) return {.value = scalar()};
     Model model{.kind = below(2) ? Model::array : Model::dictionary};
-    for (std::size_t count = below(below(6) ? 6 : 40); count > 0; --count) {
-      std::string key = text();
+    static constexpr std::size_t widths[] = {7, 8, 9, 14, 15, 16, 63, 64, 65, 255, 256, 257, 999, 1000, 1001};
+    std::size_t count = below(6) ? below(6) : widths[below(below(60) ? 6 : 15)];
+    // In very many, keys would rarely differ by themselves, and nested ones would grow without an end.
+    const bool many = count > 40;
+    for (; count > 0; --count) {
+      std::string key = many ? std::to_string(count) : text();
       if (model.kind == Model::array || model.find(key) == model.children.end()) {
-        model.children.emplace_back(key, this->model(depth - 1));
+        model.children.emplace_back(key, this->model(many ? 0 : depth - 1));
       }
     }
     return model;

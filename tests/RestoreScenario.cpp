@@ -23,6 +23,7 @@ PluginRig::Options optionsOf(const RestoreScenario& scenario) {
 static Value metadataOf(const RestoreApp& app) {
   Value metadata = Value::makeDictionary();
   for (const auto& [key, value] : app.metadata) metadata.dictionary()->set(key, value);
+  metadata = filledOut(metadata, app.content.metadataKeys, app.content.seed);
   switch (app.entry) {
     case RestoreApp::Entry::metadataIsNoList:
       return Value::makeData("no property list");
@@ -39,8 +40,7 @@ static Value entryOf(const RestoreApp& app) {
   if (app.entry != RestoreApp::Entry::noMetadata) entry.dictionary()->set("HarluneMetadata", metadataOf(app));
   if (app.hasRights) entry.dictionary()->set("ApplicationSINF", Value::makeData("rights"));
   if (app.hasIcon) entry.dictionary()->set("PlaceholderIcon", Value::makeData(iconImage()));
-  entry.dictionary()->set("SomethingElse", 1);
-  return entry;
+  return filledOut(entry, app.content.entryKeys, app.content.seed);
 }
 
 void writeRestoreLists(PluginRig& rig, const RestoreScenario& scenario) {
@@ -77,7 +77,8 @@ RestoreOutcome run(PluginRig& rig, const RestoreScenario& scenario) {
   auto status = rig.device().status();
   outcome.open = openCoordinators(status);
   for (const auto& app : status.apps) {
-    if (!app.state.empty()) outcome.present[app.id] = app.state + ' ' + std::to_string(app.installType);
+    if (app.isOnDevice())
+      outcome.present[app.id] = device::nameOfState(app.state) + (' ' + std::to_string(app.installType));
   }
   outcome.filedAway = rig.exists(restoreLogPath) && !rig.exists(restoreListPath);
   if (error) outcome.error = error->domain();

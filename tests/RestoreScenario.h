@@ -23,6 +23,7 @@ struct RestoreApp {
   std::vector<std::pair<std::string, Value>> metadata{};  // what the store metadata holds
   bool hasIcon = true;
   bool hasRights = true;
+  ContentShape content{};
   bool neverReported = false;  // nobody tells that its placeholder was installed
 };
 

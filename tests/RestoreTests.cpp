@@ -101,7 +101,7 @@ TEST(Restore, EveryAppStepByStep) {
   Lines lines;
   for (const auto& record : rig.records()) lines.push_back(lineOf(record));
   EXPECT_TRUE(inOrder(lines, {"setLaunchProhibited(0)", "setBundleVersion(3.1)",
-                              "makeStoreMetadata({title = T; itemName = I; bundleVersion = 3.1}) = metadata#*",
+                              "makeStoreMetadata({*; title = T; itemName = I; bundleVersion = 3.1; *}) = metadata#*",
                               "setLaunchProhibited(1)", "setBundleVersion()", "setLaunchProhibited(0)",
                               "setLaunchProhibited(0)", "setLaunchProhibited(0)"}));
   EXPECT_TRUE(inOrder(

@@ -66,7 +66,7 @@ class SyncPlayer {
   void prepare(const App& app) {
     bool prepared = true;
     if (app.before == App::Before::installed || app.lost) {
-      const std::string package = _rig.receivePackage(app.id, packageOf(app.id, "1.0"));
+      const std::string package = _rig.receivePackage(app.id, packageOf(app.id, "1.0", app.content));
       prepared = _rig.device().installFromPackage(package);
     }
     if (app.lost) prepared = _rig.device().uninstallByPerson(app.id) && prepared;
@@ -103,12 +103,7 @@ class SyncPlayer {
   Value todoList(std::string App::*operation) const {
     Value list = Value::makeArray();
     for (const auto& app : _scenario.apps) {
-      if ((app.*operation).empty()) continue;
-      auto& entry = list.array()->appendDictionary();
-      entry.set("identifier", app.id);
-      entry.set("operation", app.*operation);
-      entry.set("version", "2.0");
-      entry.set("name", "Name of " + app.id);
+      if (!(app.*operation).empty()) list.array()->append(entryOf(app, app.*operation));
     }
     return list;
   }
@@ -127,8 +122,11 @@ class SyncPlayer {
         manifest.dictionary()->set("KBBundleIconFile", "icon.png");
         _rig.write(staging + '/' + app.id + "/icon.png", iconImage());
       }
+      const auto& content = app.content;
+      manifest = filledOut(manifest, content.manifestKeys, content.seed);
+      const Value metadata = filledOut(dictionaryOf({{"vantorId", "me"}}), content.metadataKeys, content.seed);
       _rig.write(staging + '/' + app.id + "/Info.plist", binaryList(manifest));
-      _rig.write(staging + '/' + app.id + "/HarluneMetadata.plist", binaryList(dictionaryOf({{"vantorId", "me"}})));
+      _rig.write(staging + '/' + app.id + "/HarluneMetadata.plist", plist::writeXML(metadata).value());
       _rig.write(staging + '/' + app.id + "/HarluneArtwork", iconImage());
     }
   }
@@ -225,8 +223,8 @@ class SyncPlayer {
   }
 
   static Bytes packageOfApp(const App& app) {
-    if (app.package == App::Package::damaged) return packageOf(app.id, "2.0").substr(0, 40);
-    return packageOf(app.package == App::Package::ofAnotherApp ? "app.other" : app.id, "2.0");
+    auto package = packageOf(app.package == App::Package::ofAnotherApp ? "app.other" : app.id, "2.0", app.content);
+    return app.package == App::Package::damaged ? package.substr(0, package.size() / 2) : package;
   }
 
   void report(const App& app, const TSAssetRef& asset) {
@@ -249,7 +247,7 @@ class SyncPlayer {
     auto status = _rig.device().status();
     outcome.open = openCoordinators(status);
     for (const auto& app : status.apps) {
-      if (!app.state.empty()) outcome.present[app.id] = app.state;
+      if (app.isOnDevice()) outcome.present[app.id] = device::nameOfState(app.state);
     }
   }
 
@@ -267,6 +265,12 @@ std::string items(const char* title, const Items& items, Show show) {
 }
 
 }  // namespace
+
+Value entryOf(const ScenarioApp& app, const std::string& operation) {
+  const Value entry =
+      dictionaryOf({{"identifier", app.id}, {"operation", operation}, {"version", "2.0"}, {"name", nameOf(app.id)}});
+  return filledOut(entry, app.content.entryKeys, app.content.seed);
+}
 
 Outcome run(PluginRig& rig, const Scenario& scenario) { return SyncPlayer(rig, scenario).play(); }
 
@@ -303,7 +307,7 @@ std::vector<std::string> cancellationsIn(const std::vector<CallRecord>& records)
 std::vector<std::string> openCoordinators(const device::DeviceStatus& status) {
   std::vector<std::string> open;
   for (const auto& coordinator : status.coordinators) {
-    if (coordinator.client == 3) open.push_back(coordinator.app + ' ' + coordinator.kind);
+    if (coordinator.client == 3) open.push_back(coordinator.app + ' ' + device::shortNameOfKind(coordinator.kind));
   }
   return open;
 }

@@ -45,6 +45,7 @@ struct ScenarioApp {
   bool inLastSync = false;
   bool hasFolder = true;  // manifest and metadata staged
   bool hasIcon = false;
+  ContentShape content{};  // of its entry, its files and its package
 
   Transfer transfer = Transfer::arrives;
   Package package = Package::good;
@@ -95,6 +96,9 @@ struct Outcome {
 
   std::string text() const;
 };
+
+/// The app's entry in a todo list, with that operation.
+Value entryOf(const ScenarioApp& app, const std::string& operation);
 
 /// Plays the daemon, the host and the person.
 Outcome run(PluginRig& rig, const Scenario& scenario);

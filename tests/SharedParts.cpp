@@ -73,13 +73,18 @@ class SharedTree final : public device::FileTree {
     return _tree.list(path, error);
   }
   std::unique_ptr<device::FileWriter> createNew(std::string_view path, bool executable, ErrorRef* error) override {
+    tell("createNew", path);
     return _tree.createNew(path, executable, error);
   }
   std::unique_ptr<device::FileReader> openForReading(std::string_view path, ErrorRef* error) override {
     return _tree.openForReading(path, error);
   }
   bool syncDirectory(std::string_view path, ErrorRef* error) override { return _tree.syncDirectory(path, error); }
-  bool syncItem(std::string_view path, ErrorRef* error) override { return _tree.syncItem(path, error); }
+  bool syncItem(std::string_view path, ErrorRef* error) override {
+    bool done = _tree.syncItem(path, error);
+    tell("syncItem", path);
+    return done;
+  }
 
  private:
   void tell(std::string_view operation, std::string_view path) const {

@@ -4,8 +4,8 @@
 #include <memory>
 #include <string_view>
 
-#include "device/FileTree.h"
-#include "device/Store.h"
+#include "device/files/FileTree.h"
+#include "device/store/Store.h"
 
 namespace tests {
 
@@ -14,8 +14,8 @@ struct SharedParts {
   std::unique_ptr<device::FileTree> files{};
   std::unique_ptr<device::Store> store{};
   bool broken = false;  // the store takes nothing more
-  /// Told of a file operation and its path: after a reading that succeeded, before a removal, a move and a writing.
-  /// From any thread. May be null; set while no thread is at work.
+  /// Told of a file operation and its path: after a reading that succeeded and a flush, before a
+  /// removal, a move and a writing. From any thread. May be null; set while no thread is at work.
   std::function<void(std::string_view operation, std::string_view path)> watch{};
 
   /// Those of an empty device.

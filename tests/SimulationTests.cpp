@@ -7,6 +7,7 @@
 #include <set>
 #include <string>
 
+#include "platform/Describe.h"
 #include "tests/Invariants.h"
 #include "tests/ReferenceModel.h"
 
@@ -46,26 +47,6 @@ constexpr const char* restorePoints[] = {"InstallCoordination.coordinatorForAppW
                                          "RVPlaceholder.setPlaceholderAttributes",
                                          "RVPlaceholder.setSinfData"};
 
-class Dice {
- public:
-  explicit Dice(std::uint64_t seed) : _numbers(seed) {}
-
-  std::size_t below(std::size_t count) { return static_cast<std::size_t>(_numbers() % count); }
-  bool oneIn(std::size_t count) { return below(count) == 0; }
-  template <class T, std::size_t N>
-  T of(const T (&choices)[N]) {
-    return choices[below(N)];
-  }
-  /// Mostly the first.
-  template <class T, std::size_t N>
-  T mostly(const T (&choices)[N]) {
-    return oneIn(3) ? of(choices) : choices[0];
-  }
-
- private:
-  std::mt19937_64 _numbers;
-};
-
 template <std::size_t N>
 std::vector<Failure> randomFailures(Dice& dice, const char* const (&points)[N], const std::vector<std::string>& apps) {
   std::vector<Failure> failures;
@@ -92,13 +73,13 @@ device::StoreInstall randomPlaceholder(Dice& dice) {
   return install;
 }
 
-/// Up to eight, not in the order of their names.
-std::string nameOf(std::size_t number) { return "app." + std::string(1, static_cast<char>('a' + (number * 5) % 8)); }
+/// Up to sixteen, not in the order of their names.
+std::string idOf(std::size_t number) { return "app." + std::string(1, static_cast<char>('a' + (number * 5) % 16)); }
 
 ScenarioApp randomApp(Dice& dice, std::size_t number) {
   using App = ScenarioApp;
   App app;
-  app.id = nameOf(number);
+  app.id = idOf(number);
   app.before = dice.mostly({App::Before::absent, App::Before::installed, App::Before::placeholder});
   app.lost = app.before == App::Before::absent && dice.oneIn(6);
   app.store = randomPlaceholder(dice);
@@ -113,6 +94,7 @@ ScenarioApp randomApp(Dice& dice, std::size_t number) {
       dice.mostly({App::Package::good, App::Package::damaged, App::Package::ofAnotherApp, App::Package::missing});
   app.path = dice.mostly(
       {App::Path::absolute, App::Path::relative, App::Path::absent, App::Path::recorded, App::Path::climbing});
+  app.content = ContentShape::drawn(dice);
   app.isDownload = !dice.oneIn(8);
   app.isRestore = dice.oneIn(8);
   app.parts = dice.oneIn(2) ? 1 : 2;
@@ -153,7 +135,7 @@ RestoreScenario randomRestore(Dice& dice, std::size_t count) {
   std::vector<std::string> ids;
   for (std::size_t number = 0; number < count; ++number) {
     RestoreApp app;
-    app.id = nameOf(number);
+    app.id = idOf(number);
     app.demotedAutomatically = dice.oneIn(4);
     app.demotedByHand = dice.oneIn(4);
     app.entry = dice.mostly({Entry::good, Entry::good, Entry::notADictionary, Entry::noMetadata,
@@ -161,6 +143,7 @@ RestoreScenario randomRestore(Dice& dice, std::size_t count) {
     app.hasIcon = !dice.oneIn(3);
     app.hasRights = !dice.oneIn(3);
     app.neverReported = dice.oneIn(10);
+    app.content = ContentShape::drawn(dice);
     if (dice.oneIn(2)) app.metadata.emplace_back("title", "Title of " + app.id);
     if (dice.oneIn(3)) app.metadata.emplace_back("is-auto-download", true);
     ids.push_back(app.id);
@@ -185,7 +168,9 @@ class Life {
         _dice(seed),
         _points(points),
         _exact(!_dice.oneIn(3) || points.empty()),
-        _count(1 + _dice.below(_exact ? 8 : 5)),
+        _count(1 + _dice.below(!_exact          ? 5
+                               : _dice.oneIn(6) ? 16
+                                                : 8)),
         _world(_dice.oneIn(4) ? "com.vantor.shiftwell" : "com.vantor.tsd"),
         _rig({.process = _world.process}) {}
 
@@ -264,14 +249,15 @@ class Life {
   void checkEntries(const Scenario& scenario) {
     std::vector<std::string> staged;
     for (const auto& app : scenario.apps) {
-      if (!app.operation.empty()) staged.push_back(app.id + ' ' + "Name of " + app.id);
+      if (!app.operation.empty()) staged.push_back(platform::describe(entryOf(app, "")));
     }
     std::vector<std::string> entries;
     Value list = _rig.readList(todoListPath);
-    if (!list.array()) list = Value::makeArray();
-    for (const Value& entry : *list.array()) {
-      const auto& fields = *entry.dictionary();
-      entries.push_back(std::string(*fields["identifier"].string()) + ' ' + std::string(*fields["name"].string()));
+    for (std::size_t at = 0; list.array() && at < list.array()->size(); ++at) {
+      auto& entry = *list.array()->dictionary(at);
+      EXPECT_FALSE(entry["operation"].isAbsent());
+      entry.set("operation", "");
+      entries.push_back(platform::describe((*list.array())[at]));
     }
     // What an earlier sync did not come to take may be taken now.
     _lists.insert(staged);
@@ -319,13 +305,13 @@ class Life {
       std::string action = _dice.of(actions);
       // One of these always causes a next one, for ever.
       bool feedsItself = action == "prioritize=" || action == "store=";
-      if (_dice.oneIn(2)) rule += ':' + nameOf(_dice.below(_count));
+      if (_dice.oneIn(2)) rule += ':' + idOf(_dice.below(_count));
       if (feedsItself || !_dice.oneIn(3)) rule += '@' + std::to_string(1 + _dice.below(6));
       rule += '=' + action;
       if (action == "value=")
         rule += std::to_string(_dice.of({0, 1, 2, 3, 77, -1}));
       else if (action.back() == '=')
-        rule += nameOf(_dice.below(_count));
+        rule += idOf(_dice.below(_count));
       rules.push_back(std::move(rule));
     }
     return rules;
@@ -334,12 +320,16 @@ class Life {
   /// An app that no fault has met is brought all the same.
   void playWithoutFaults() {
     goOn();
-    Scenario scenario{.continues = true, .apps = {{.id = "app.new"}}, .process = _world.process};
+    Scenario scenario{.continues = true,
+                      .apps = {{.id = "app.new", .content = ContentShape::drawn(_dice)}},
+                      .process = _world.process};
     _rig.beginStep({});
     auto outcome = run(_rig, scenario);
     look();
     EXPECT_EQ(outcome.marks["app.new"], "INSTALLED") << outcome.text();
     EXPECT_EQ(outcome.present["app.new"], "installed") << outcome.text();
+    EXPECT_EQ(_rig.device().app("app.new")->version, "2.0");
+    EXPECT_TRUE(_rig.daemon().vantorIDsForAssets().contains("me"));
   }
 
   const std::uint64_t _seed;

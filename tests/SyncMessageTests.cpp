@@ -44,16 +44,14 @@ std::vector<TSAssetRef> request(PluginRig& rig, const Scenario& scenario) {
   Value list = Value::makeArray();
   for (const auto& app : scenario.apps) {
     if (app.before == App::Before::installed) rig.install(app.id, "1.0");
-    auto& entry = list.array()->appendDictionary();
-    entry.set("identifier", app.id);
-    entry.set("operation", app.operation);
-    entry.set("version", "2.0");
+    list.array()->append(entryOf(app, app.operation));
     std::string folder = std::string(stagingDirectory) + '/' + app.id;
-    rig.write(folder + "/Info.plist", binaryList(dictionaryOf({{"KBBundleIdentifier", app.id},
-                                                               {"KBBundleDisplayName", "Title"},
-                                                               {"KBBundleIconFile", "icon.png"},
-                                                               {"OBApplicationLaunchProhibited", true}})));
-    rig.write(folder + "/HarluneMetadata.plist", binaryList(dictionaryOf({{"itemId", 5}})));
+    const Value manifest = dictionaryOf({{"KBBundleIdentifier", app.id},
+                                         {"KBBundleDisplayName", "Title"},
+                                         {"KBBundleIconFile", "icon.png"},
+                                         {"OBApplicationLaunchProhibited", true}});
+    rig.write(folder + "/Info.plist", binaryList(filledOut(manifest, app.content.manifestKeys, 1)));
+    rig.write(folder + "/HarluneMetadata.plist", binaryList(filledOut(dictionaryOf({{"itemId", 5}}), 25, 2)));
     if (app.hasIcon) rig.write(folder + "/icon.png", iconImage());
   }
   rig.write(std::string(stagingDirectory) + "/ApplicationsSync.plist", binaryList(list));
@@ -70,8 +68,8 @@ const Scenario oneUpdate{.apps = {{.id = "app.a", .before = App::Before::install
 /// The whole preparation of a new app, from the icon to the end.
 Lines preparation(const std::string& opening, const char* kind, int existing) {
   return Lines{
-             "[15] processing app install for bundle 'app.a', title Title assetplist {KBBundleIdentifier = app.a; "
-             "KBBundleDisplayName = Title; KBBundleIconFile = icon.png; OBApplicationLaunchProhibited = 1}, version "
+             "[15] processing app install for bundle 'app.a', title Title assetplist {*; KBBundleIdentifier = app.a; "
+             "KBBundleDisplayName = Title; KBBundleIconFile = icon.png; OBApplicationLaunchProhibited = 1; *}, version "
              "2.0 with install coordination",
              "step 1/1/1 y app.a " + opening} +
          lookUp(kind, existing, 1) +
@@ -106,7 +104,7 @@ Lines preparation(const std::string& opening, const char* kind, int existing) {
                "setComplete(1)",
                "setIconPromise(promise#2) = 1",
                "Added icon promise to placeholder for 'app.a'",
-               "makePlaceholderAttributesWithInfoPlistDictionary({KBBundleIdentifier = app.a; *}) = attributes#1",
+               "makePlaceholderAttributesWithInfoPlistDictionary({*; KBBundleIdentifier = app.a; *}) = attributes#1",
                "setPlaceholderAttributes(attributes#1) = 1",
                "set <*> attributes on placeholder for app.a",
                "setMetadata(metadata#1) = 1",
@@ -132,7 +130,7 @@ TEST(SyncMessages, AnAppIsPreparedStepByStep) {
   PluginRig fresh;
   auto assets = request(fresh, oneApp);
   EXPECT_TRUE(exactly(preparationIn(fresh), preparation("Install App", "initiating", 0)));
-  Lines calls = {"makeStoreMetadata({itemId = 5}) = metadata#1",
+  Lines calls = {"makeStoreMetadata({*; itemId = 5; *}) = metadata#1",
                  "makeInstallOptions() = options#1",
                  "setHarluneMetadata(metadata#1)",
                  "setObInstallType(4)",
@@ -430,8 +428,8 @@ TEST(SyncMessages, ClearingLeavesNothing) {
   EXPECT_TRUE(exactly(rig.messagesIn("clearSyncData"), {"blasting work area", "Uninstalling all placeholder apps",
                                                         "Uninstall app.goes = y", "Uninstall app.stays = n"}));
   EXPECT_FALSE(rig.exists(pluginDirectory));
-  EXPECT_FALSE(rig.device().app("app.goes") && !rig.device().app("app.goes")->state.empty());
-  EXPECT_EQ(rig.device().app("app.installed")->state, "installed");
+  EXPECT_FALSE(rig.device().app("app.goes") && rig.device().app("app.goes")->isOnDevice());
+  EXPECT_EQ(rig.device().app("app.installed")->state, device::AppState::installed);
   rig.daemon().clearSyncData();
   EXPECT_TRUE(inOrder(rig.messagesIn("clearSyncData", 2), {"E Failed to fetch uninstalled apps list to clear it"}));
   rig.daemon().clearSyncData();

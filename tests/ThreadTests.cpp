@@ -28,10 +28,7 @@ std::vector<std::string> identifiers(std::size_t count) {
 void stage(PluginRig& rig, const std::vector<std::string>& apps) {
   Value list = Value::makeArray();
   for (const auto& app : apps) {
-    auto& entry = list.array()->appendDictionary();
-    entry.set("identifier", app);
-    entry.set("operation", "install");
-    entry.set("version", "2.0");
+    list.array()->append(entryOf({.id = app}, "install"));
   }
   rig.write(std::string(stagingDirectory) + "/ApplicationsSync.plist", binaryList(list));
 }

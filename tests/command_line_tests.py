@@ -43,7 +43,6 @@ COMMAND_LINES = [
     Row("sync dev host --inject nowhere=fail", USAGE, err=says("nowhere")),
     Row("sync dev host --inject writeAtomically=explode", USAGE, err=says("explode")),
     Row("sync dev host --inject writeAtomically", USAGE, err=says("writeAtomically")),
-    Row("home dev", USAGE, err=says("--output is required")),
     Row("query dev weather", USAGE, err=says("weather")),
     Row("set dev app-removal", USAGE, err=says("KEY=VALUE is expected")),
     Row("set dev app-removal=sometimes", USAGE, err=says("sometimes")),
@@ -76,7 +75,13 @@ COMMAND_LINES = [
     Row("query dev metrics --plugin C-LIBRARY", FAILED, err=says("no entry point 'TSPluginTable'")),
     # What goes well says nothing on standard error.
     Row("status dev", DONE, r"^No apps\.$"),
+    Row("help", DONE, r"Subcommands:(.|\n)*Exit codes:"),
+    Row("help sync", DONE, r"tsd sync(.|\n)*--end-phase"),
+    Row("help weather", USAGE, err=says("weather")),
+    Row("points", DONE, r"^transfer$(.|\n)*^writeAtomically$"),
+    Row("set dev", DONE, r"^app-installation=allowed$(.|\n)*^icon-size=120$"),
     Row("home dev -o home.png", DONE, r"^home\.png: no apps\.$"),
+    Row("home dev", DONE, r"^dev: no apps on the home screen\.$"),
     Row("query dev metrics", DONE, r"^_Count 0$"),
     Row("query dev disabled-asset-types", DONE, r"^none$"),
     Row("sync dev emptyhost --progress none", DONE, r"^Nothing to do\.$"),
@@ -102,7 +107,8 @@ DOCUMENTS = [
 
 
 def c_library():
-    return next(str(path) for path in pathlib.Path("/").glob("lib/*/libc.so.6"))
+    """The one that this process runs with, as others may lie about for other processors."""
+    return re.search(r"\S+/libc\.so\.6$", pathlib.Path("/proc/self/maps").read_text(), re.MULTILINE)[0]
 
 
 def picture():
@@ -116,6 +122,7 @@ class CommandLines(Folder):
         super().setUp()
         self.make()
         os.mkdir("emptyhost")
+        pathlib.Path("emptyhost/ApplicationsSync.plist").write_text("<plist version='1.0'><array/></plist>")
         os.mkdir("oddhost")
         os.symlink("../host/ApplicationsSync.plist", "oddhost/ApplicationsSync.plist")
         os.makedirs("broken/fs")
@@ -144,12 +151,12 @@ class CommandLines(Folder):
                 self.assertEqual(json.loads(run.stdout)["schema"], 1)
 
     def test_a_device_in_use_names_its_holder(self):
-        self.tsd("status", "dev")
+        self.tsd("backup", "dev")
         with open("dev/lock", "r+") as lock:
             fcntl.flock(lock, fcntl.LOCK_EX)
             lock.write("4711 (tsd sync dev host)\n")
             lock.flush()
-            self.assertRegex(self.tsd("status", "dev", code=BUSY).stderr, says("dev: in use by process 4711 (tsd sync"))
+            self.assertRegex(self.tsd("backup", "dev", code=BUSY).stderr, says("dev: in use by process 4711 (tsd sync"))
         self.tsd("status", "dev")
 
 
@@ -167,6 +174,9 @@ class Shells(Folder):
             ("set d app-removal = forbidden icon", "icon-size="),
             ("query a", "a folder"),
             ("query d --json m", "metrics"),
+            ("why dev com.e", "com.example.a"),
+            ("sync d h --inject setInst", "setInstallOptions=,setInstallTargetType="),
+            ("sync d h --inject setInstallOptions = kill", "kill,kill-after"),
             ("query d metrics m", ""),
             ("sync d a", "a folder"),
             ("sync d --log a", "a folder,a file"),
@@ -175,11 +185,15 @@ class Shells(Folder):
         ]
         os.mkdir("a folder")
         pathlib.Path("a file").touch()
+        self.tsd("init", "dev")
+        self.tsd("store", "dev", "com.example.a")
         pathlib.Path("completion").write_text(self.tsd("completion", "bash").stdout)
         ask = """source completion; COMP_WORDS=(tsd "$@"); COMP_CWORD=$#; _tsd; IFS=,; echo "${COMPREPLY[*]}" """
+        path = {"PATH": f"{pathlib.Path(tsd_folder.TSD).parent}:{os.environ['PATH']}"}
         for line, offered in table:
             with self.subTest(line):
-                run = subprocess.run(["bash", "-uc", ask, "bash", *line.split(" ")], capture_output=True, text=True)
+                run = subprocess.run(["bash", "-uc", ask, "bash", *line.split(" ")], capture_output=True, text=True,
+                                     env=os.environ | path)
                 self.assertEqual(run.stderr, "")
                 self.assertEqual(set(run.stdout.strip().split(",")), set(offered.split(",")))
 
@@ -188,6 +202,10 @@ class Shells(Folder):
             pathlib.Path(shell).write_text(self.tsd("completion", shell).stdout)
             run = subprocess.run([shell, "-n", shell], capture_output=True, text=True)
             self.assertEqual((run.returncode, run.stderr), (0, ""))
+        if shutil.which("zsh"):
+            ask = "source zsh && print $_comps[tsd]"
+            run = subprocess.run(["zsh", "-fc", ask], capture_output=True, text=True, env=os.environ | {"HOME": os.getcwd()})
+            self.assertEqual(run.stdout, "_tsd\n", run.stderr)
 
     def test_manual_pages(self):
         self.tsd("manual", "pages")

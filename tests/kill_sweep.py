@@ -92,8 +92,13 @@ class Device:
     def everything(self):
         return tree_of(self.folder / "fs"), self.records()
 
+    def open(self, tsd):
+        """Lets a process take the device for itself, which finishes or rolls back what another left. It does nothing."""
+        tsd.run("uninstall", self.folder, "com.example.nobody", codes=(FAILED,))
+
     def picture(self, tsd):
-        """What can be compared with another device: containers go by their apps."""
+        """What can be compared with another device, once it was opened: containers go by their apps."""
+        self.open(tsd)
         status = json.loads(tsd.run("status", self.folder, "--json").stdout)
         names = {record["container"].rsplit("/", 1)[1]: app for app, (record, _) in self.apps().items()}
         files = {}
@@ -212,7 +217,7 @@ class Command:
         wrong = self.differences(device, excused)
         require(not wrong, "run again, it differs: " + "; ".join(wrong[:3]))
         everything = device.everything()
-        self.tsd.run("status", device.folder)
+        device.open(self.tsd)
         require(device.everything() == everything, "opening the device once more changed it")
 
     def interrupt(self, device, rules, codes):
@@ -320,9 +325,9 @@ class Command:
 def make_base(tsd):
     """A device with an app to be updated, one to be removed and one of an earlier sync; what the host wants next. And
     what has become of it after a restore, with an install of the store's under way."""
-    tsd.run("sample", "earlier", "--apps", 1, "--seed", 7, "--package-size", 20000)
-    tsd.run("sample", "host", "--demo", "--apps", 5, "--package-size", 20000)
-    tsd.run("sample", "restored", "--apps", 3, "--seed", 3, "--package-size", 1000)
+    tsd.run("sample", "earlier", "--apps", 1, "--seed", 7, "--package-size", 20000, "--files", 3)
+    tsd.run("sample", "host", "--demo", "--apps", 5, "--package-size", 20000, "--files", 3)
+    tsd.run("sample", "restored", "--apps", 3, "--seed", 3, "--package-size", 1000, "--files", 3)
     tsd.run("init", "base")
     for package in sorted((tsd.folder / "host/Packages/older").iterdir()):
         tsd.run("store", "base", package.stem)

@@ -9,37 +9,12 @@ when a fault survives, when a patch no longer applies, or when a check finds som
 """
 
 import pathlib
-import shutil
 import subprocess
 import sys
 
-ROOT = pathlib.Path(__file__).resolve().parent.parent
-PRESET = "release"
+from source_copy import Copy, ROOT, run
 
-
-def run(*command, **options):
-    return subprocess.run([str(word) for word in command], capture_output=True, text=True, check=False, **options)
-
-
-class Copy:
-    """The sources as they are in the working tree, and a build of them."""
-
-    def __init__(self, folder):
-        self.sources = folder / "sources"
-        # Where the compiler cache finds what the ordinary build has compiled.
-        self.build = self.sources / "build" / PRESET
-        listed = run("git", "ls-files", "-z", "--cached", "--others", "--exclude-standard", cwd=ROOT).stdout
-        for name in filter(None, listed.split("\0")):
-            target = self.sources / name
-            original = ROOT / name
-            # One that did not change keeps its time, so that it is not compiled again.
-            if original.exists() and not (target.exists() and target.read_bytes() == original.read_bytes()):
-                target.parent.mkdir(parents=True, exist_ok=True)
-                shutil.copy(original, target)
-        configured = run("cmake", "--preset", PRESET, cwd=self.sources)
-        if configured.returncode != 0:
-            sys.exit(configured.stdout + configured.stderr)
-
+class PatchedCopy(Copy):
     def patch(self, text, *options):
         return run("patch", "-p1", "--force", "--fuzz=0", *options, cwd=self.sources, input=text).returncode == 0
 
@@ -50,9 +25,8 @@ class Copy:
             command = ["clang++", "-std=c++20", "-fsyntax-only", "-Wthread-safety", f"-I{self.sources}"]
             lines = run(*command, self.sources / rest).stderr.splitlines()
             return True, next((line.split("warning: ")[1] for line in lines if "[-Wthread-safety" in line), "")
-        built = run("cmake", "--build", self.build, "--target", kind)
-        if built.returncode != 0:
-            return False, built.stdout[-2000:]
+        if wrong := self.make(kind):
+            return False, wrong
         try:
             ended = run(self.build / "bin" / kind, rest, "--gtest_brief=1", timeout=600)
         except subprocess.TimeoutExpired:
@@ -65,7 +39,7 @@ def main():
     folder, names = pathlib.Path(sys.argv[1]).resolve(), sys.argv[2:]
     patches = sorted((ROOT / "tests/mutants").glob("*.patch"))
     faults = {each.stem: each.read_text(encoding="utf-8") for each in patches if not names or each.stem in names}
-    copy = Copy(folder)
+    copy = PatchedCopy(folder, "release")
     heads = {name: [line.split(": ", 1)[1] for line in text.splitlines()[:2]] for name, text in faults.items()}
     wrong = 0
     for how in sorted({found_by for _, found_by in heads.values()}):

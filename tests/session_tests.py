@@ -17,9 +17,10 @@ import signal
 import struct
 import subprocess
 import termios
+import xml.etree.ElementTree
 
 import tsd_folder
-from tsd_folder import CANCELLED, DEADLINE, DONE, FAILED, SOME_FAILED, Folder, says
+from tsd_folder import CANCELLED, DONE, FAILED, SOME_FAILED, Folder, says
 
 
 class Syncs(Folder):
@@ -33,16 +34,16 @@ class Syncs(Folder):
             ([], "INSTALLED", "INSTALLED", "installed", DONE),
             (["--asset", "APP:path=relative"], "INSTALLED", "INSTALLED", "installed", DONE),
             (["--asset", "APP:path=recorded"], "INSTALLED", "INSTALLED", "installed", DONE),
-            (["--asset", "APP:path=none"], "PENDING", "install", "placeholder", SOME_FAILED),
-            (["--asset", "APP:path=/var/mobile/../x"], "PENDING", "install", "placeholder", SOME_FAILED),
-            (["--asset", "APP:isDownload=false"], "SENT", "SENT", "placeholder", DONE),
-            (["--asset", "APP:isRestore=true"], "DOWNLOADED", "DOWNLOADED", "placeholder", DONE),
+            (["--asset", "APP:path=none"], "WAITING", "install", "placeholder", SOME_FAILED),
+            (["--asset", "APP:path=/var/mobile/../x"], "WAITING", "install", "placeholder", SOME_FAILED),
+            (["--asset", "APP:isDownload=false"], "SENT", "SENT", "placeholder", SOME_FAILED),
+            (["--asset", "APP:isRestore=true"], "DOWNLOADED", "DOWNLOADED", "placeholder", SOME_FAILED),
             (["--asset", "APP:stall"], "CANCELLED", "install", None, SOME_FAILED),
-            (["--asset", "APP:stall", "--end-phase", "success"], "PENDING", "install", "placeholder", SOME_FAILED),
+            (["--asset", "APP:stall", "--end-phase", "success"], "WAITING", "install", "placeholder", SOME_FAILED),
             (["--inject", "transfer:APP@2=fail"], "FAILED", "install", "placeholder", SOME_FAILED),
             (["--inject", "transfer:APP@2=cancel=APP"], "CANCELLED", "install|DOWNLOADED", None, SOME_FAILED),
             (["--inject", "setAppAssetPromise:APP=fail"], "FAILED", "FAILED", None, SOME_FAILED),
-            (["--inject", "coordinatorDidCompleteSuccessfully:APP=none"], "PENDING", "DOWNLOADED", "installed",
+            (["--inject", "coordinatorDidCompleteSuccessfully:APP=none"], "UNRECORDED", "DOWNLOADED", "installed",
              SOME_FAILED),
             (["--daemon-reports", "--inject", "coordinatorDidCompleteSuccessfully:APP=none"], "INSTALLED", "INSTALLED",
              "installed", DONE),
@@ -61,7 +62,7 @@ class Syncs(Folder):
 
     def test_a_recorded_package_is_found_again(self):
         apps = self.make(1)
-        self.sync("dev", "host", "--asset", f"{apps[0]}:isDownload=false")
+        self.sync("dev", "host", "--asset", f"{apps[0]}:isDownload=false", code=SOME_FAILED)
         self.sync("dev", "host", "--asset", f"{apps[0]}:path=recorded", "--log", "log")
         self.assertIn(f"Recovered download path for {apps[0]} at", pathlib.Path("log").read_text())
 
@@ -94,7 +95,7 @@ class Syncs(Folder):
         self.assertEqual(run.returncode, CANCELLED)
         report = json.loads(out)
         self.assertEqual(report["result"], "cancelled")
-        self.assertEqual(set(self.outcomes(report).values()), {"INTERRUPTED"})
+        self.assertEqual(set(self.outcomes(report).values()), {"NOT_REACHED"})
         log = pathlib.Path("log").read_text()
         self.assertIn("asset transfer ended withsuccess: n", log)
         self.assertIn("sync ended with success: n", log)
@@ -201,28 +202,22 @@ class Syncs(Folder):
         self.assertIn(f"host/{apps[0]}/pipe: not pushed: a named pipe", run.stderr)
         self.assertIn(f"host/{apps[0]}/link: not pushed: a symbolic link", run.stderr)
         self.assertIn(f"{apps[1]}: host/Packages/{apps[1]}.pkg: No such file", run.stdout)
-        table = [(b"", "cannot be read"), (b"no list at all", "cannot be read"),
-                 (plistlib.dumps({"a": "dictionary"}), "not an array"), (plistlib.dumps(["a text", 5]), "")]
-        for content, message in table:
-            with self.subTest(content):
-                pathlib.Path("host/ApplicationsSync.plist").write_bytes(content)
-                self.tsd("init", "other")
-                run = self.tsd("sync", "other", "host", "--json", "--progress", "none")
-                self.assertEqual(json.loads(run.stdout)["apps"], [])
-                self.assertIn(message, run.stderr)
-                shutil.rmtree("other")
+        pathlib.Path("host/ApplicationsSync.plist").write_bytes(plistlib.dumps(["a text", {"operation": "install"}]))
+        run = self.tsd("sync", "dev", "host", "--progress", "none", code=SOME_FAILED)
+        self.assertIn("host/ApplicationsSync.plist: entry 1 is passed over: it is not a dictionary", run.stderr)
+        self.assertIn("host/ApplicationsSync.plist: entry 2 is passed over: it has no \"identifier\"", run.stderr)
 
     def test_restrictions(self):
         apps = self.make(2)
         self.tsd("set", "dev", "app-installation=forbidden")
-        report = self.sync("dev", "host")
+        report = self.sync("dev", "host", code=SOME_FAILED)
         self.assertEqual(report["requested"], [])
-        self.assertEqual(self.outcomes(report), dict.fromkeys(apps, "SKIPPED"))
+        self.assertEqual(self.outcomes(report), dict.fromkeys(apps, "NOT_ALLOWED"))
         self.tsd("set", "dev", "app-installation=allowed", "app-removal=forbidden")
         self.sync("dev", "host")
         todo = [{"identifier": apps[0], "operation": "remove"}]
         pathlib.Path("host/ApplicationsSync.plist").write_bytes(plistlib.dumps(todo))
-        self.assertEqual(self.outcomes(self.sync("dev", "host")), {apps[0]: "SKIPPED"})
+        self.assertEqual(self.outcomes(self.sync("dev", "host", code=SOME_FAILED)), {apps[0]: "NOT_ALLOWED"})
         self.tsd("set", "dev", "app-removal=allowed")
         report = self.sync("dev", "host", "--inject", "uninstallAppWithBundleID=fail", code=SOME_FAILED)
         self.assertEqual(self.outcomes(report), {apps[0]: "FAILED"})
@@ -272,16 +267,17 @@ class Explanations(Folder):
         self.assertEqual(decisions, {
             apps[0]: ("skipped", "being restored: its package is the restore's to bring", ""),
             apps[1]: ("skipped", "being restored: its package is the restore's to bring", ""),
-            apps[2]: ("update", "the host wants it", f"99 over {version}"),
+            apps[2]: ("update", "the host wants it",
+                      f"{version} over {version} (the host's list says 99), the same version again"),
             apps[3]: ("removed", "the host wants it removed", ""),
             apps[4]: ("skipped", "auto demoted and not requested", ""),
             apps[5]: ("skipped", "install under way", "store download, active, loading"),
             "x/../y": ("refused", "its identifier would lead out of its folder", ""),
-            "com.example.done": ("nothing", "nothing is to be done for its entry of the todo list", "INSTALLED")})
+            "com.example.done": ("unchanged", "nothing is to be done for its entry of the todo list", "INSTALLED")})
         self.assertEqual(places, self.sync("dev", "host", code=SOME_FAILED)["requested"])
         self.tsd("set", "dev", "app-removal=forbidden")
         decisions, _ = self.plan("--inject", f"setInstallOptions:{apps[2]}=fail")
-        self.assertEqual(decisions[apps[3]], ("kept", "removing apps is restricted", ""))
+        self.assertEqual(decisions[apps[3]], ("absent", "it is not on the device", ""))
         self.assertEqual(decisions[apps[2]][:2], ("failed", "its install could not be prepared"))
 
     def kinds(self, app):
@@ -301,7 +297,7 @@ class Explanations(Folder):
         self.assertNotIn(b"\0", pathlib.Path("dev/runs/0001-sync/calls.jsonl").read_bytes())
         self.tsd("uninstall", "dev", apps[1])
         self.assertEqual(self.kinds(apps[1])[-1], ["person"])
-        self.assertRegex(self.tsd("why", "dev", apps[1]).stdout,
+        self.assertRegex(self.tsd("why", "dev", apps[1], "--all").stdout,
                          r"not on the device(.|\n)* s installed\n(.|\n)*the person removes it")
         self.assertIn("none of the 3 kept runs", self.tsd("why", "dev", "com.example.nobody", code=FAILED).stderr)
 
@@ -324,7 +320,7 @@ class Restores(Folder):
         missing = report["apps"][3]["id"]
         self.tsd("init", "other")
         run = self.tsd("restore", "other", "host", "--inject", f"RVAppInstallCoordinator.setPlaceholderPromise:{missing}=fail",
-                       code=DEADLINE)
+                       code=SOME_FAILED)
         self.assertRegex(run.stdout, rf"Placeholders missing at the end:\n  {missing}\n")
 
     def test_the_store_finishes_and_a_sync_follows(self):
@@ -356,6 +352,26 @@ class Restores(Folder):
         self.assertEqual([0 < icons[app]["progress"] < 1 for app in apps[2:4]], [False, True])
         self.assertEqual([app["id"] for app in home["failed"]], [apps[5]])
         self.assertEqual(pathlib.Path("home.png").read_bytes()[:8], b"\x89PNG\r\n\x1a\n")
+        to_output = subprocess.run([tsd_folder.TSD, "home", "dev", "-o", "-"], capture_output=True, check=True).stdout
+        self.assertEqual(to_output, pathlib.Path("home.png").read_bytes())
+        self.tsd("home", "dev", "--dark", "-o", "home.svg")
+        self.assertEqual(xml.etree.ElementTree.parse("home.svg").getroot().tag, "{http://www.w3.org/2000/svg}svg")
+        self.assertRegex(self.tsd("home", "dev").stdout, r"(?m)^│ .* │$")
+
+    def test_names_that_are_none(self):
+        # (the app's name, what stands on the home screen)
+        apps = self.make(3)
+        names = ["  ", "\u202eTrap", "A name that is very much longer than its place"]
+        for app, name in zip(apps, names):
+            manifest = pathlib.Path(f"host/{app}/Info.plist")
+            manifest.write_bytes(plistlib.dumps(plistlib.loads(manifest.read_bytes()) | {"KBBundleDisplayName": name}))
+            pathlib.Path(f"host/Packages/{app}.pkg").unlink()
+        self.sync("dev", "host", "--end-phase", "success", code=SOME_FAILED)
+        self.tsd("home", "dev", "-o", "home.svg")
+        shown = self.tsd("home", "dev").stdout
+        self.assertEqual({len(line) for line in shown.split("\n") if line[:1] in "╭│╰" and line}, {79})
+        for text in [apps[0].rsplit(".", 1)[1], "???Trap", "A name that is …"]:
+            self.assertIn("□ " + text[:16], shown)
 
     def test_lists_that_are_none(self):
         self.make(2)

@@ -1,31 +1,30 @@
 #include "transfer/InProgressAssetQuery.h"
 
-#include "core/Paths.h"
 #include "core/Say.h"
+#include "platform/OBNumbers.h"
 #include "transfer/InstallNames.h"
 
 namespace appsync {
 
 using namespace platform;
 
-namespace {
-constexpr std::uint64_t typeStoreDownload = 1;
-constexpr std::uint64_t stateActive = 1;
-constexpr std::uint64_t phaseLoading = 0;
-constexpr std::uint64_t phaseInstalling = 1;
-}  // namespace
-
 void InProgressAssetQuery::currentInProgressAssetIDs(const Platform& platform, std::optional<Identifiers>& inProgress,
                                                      std::optional<Identifiers>& restoringAssetIDs) {
   inProgress.reset();
   restoringAssetIDs.reset();
   auto query = std::make_shared<InProgressAssetQuery>(platform);
+  struct Observation {
+    const Platform& platform;
+    const InProgressAssetQuery* query;
+    ~Observation() {
+      contained(platform, "removeObserver", [this] { platform.workspace.removeObserver(query); });
+    }
+  };
   platform.workspace.addObserver(query);
-  if (query->_fetchResults()) {
-    inProgress = query->inProgressAssetIDs();
-    restoringAssetIDs = query->restoringAssetIDs();
-  }
-  platform.workspace.removeObserver(query.get());
+  const Observation observation{platform, query.get()};
+  if (!query->_fetchResults()) return;
+  inProgress = query->inProgressAssetIDs();
+  restoringAssetIDs = query->restoringAssetIDs();
 }
 
 bool InProgressAssetQuery::_fetchResults() {
@@ -51,6 +50,9 @@ void InProgressAssetQuery::applicationInstallsArePrioritized(const std::vector<O
   _waitForInitialObservationData.signal();
 } catch (...) {
   swallowException(_platform, "applicationInstallsArePrioritized");
+  // The next report is taken instead of this one.
+  _inProgressAssetIDs.reset();
+  _restoringAssetIDs.reset();
 }
 
 void InProgressAssetQuery::_sort(const OBApplicationProxy& proxy) {
@@ -68,11 +70,11 @@ void InProgressAssetQuery::_sort(const OBApplicationProxy& proxy) {
   const std::uint64_t phase = proxy.installProgressSync->installPhase;
   say(_platform, "Got install type=%{public}@ state=%{public}@ phase=%{public}@ for %{public}@",
       nameOfInstallType(type), nameOfInstallState(state), nameOfInstallPhase(phase), identifier);
-  if (state != stateActive || !identifier) return;
-  if ((type != installType::restore && phase == phaseInstalling) ||
-      (type == typeStoreDownload && phase == phaseLoading)) {
+  if (state != installState::active || !identifier) return;
+  if ((type != installType::restore && phase == installPhase::installing) ||
+      (type == installType::storeDownload && phase == installPhase::loading)) {
     _inProgressAssetIDs->push_back(*identifier);
-  } else if (type == installType::restore && (phase == phaseLoading || phase == phaseInstalling)) {
+  } else if (type == installType::restore && (phase == installPhase::loading || phase == installPhase::installing)) {
     _restoringAssetIDs->push_back(*identifier);
   }
 }

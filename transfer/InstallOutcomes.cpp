@@ -1,7 +1,7 @@
 #include "core/AppsClient.h"
-#include "core/Paths.h"
 #include "core/Say.h"
 #include "platform/InstallTransactionLog.h"
+#include "platform/TodoOperation.h"
 
 namespace appsync {
 
@@ -14,7 +14,7 @@ bool AppsClient::_isRecoverableError(const ErrorRef& error) {
 
 void AppsClient::assetInstallSucceeded(const TSAssetRef& asset) try {
   say(_platform, "%{public}@ install succeeded", asset->identifier());
-  changeAssetID(asset->identifier(), operation::installed);
+  changeAssetID(asset->identifier(), todo::installed);
   cleanRestoreStateForIdentifier(asset->identifier());
 } catch (...) {
   swallowException(_platform, "assetInstallSucceeded");
@@ -28,7 +28,7 @@ void AppsClient::assetInstallFailed(const TSAssetRef& asset, const ErrorRef& err
     _platform.transactionLog.logScenario("Orrin restore", 0, false, identifier, "install failed recoverably");
   } else {
     say(_platform, "%{public}@ install failed unrecoverably: %{public}@", identifier, error);
-    changeAssetID(identifier, operation::failed);
+    changeAssetID(identifier, todo::failed);
     uninstallAppUsingCoordination(identifier);
   }
   cleanRestoreStateForIdentifier(identifier);

@@ -1,13 +1,17 @@
+#include "transfer/OutstandingTransfers.h"
+
+#include <algorithm>
 #include <utility>
 
-#include "core/AppsClient.h"
-#include "core/Candidate.h"
 #include "core/PathCheck.h"
-#include "core/Paths.h"
 #include "core/PropertyListFile.h"
 #include "core/Say.h"
+#include "platform/DeviceNames.h"
+#include "platform/DevicePaths.h"
 #include "platform/FileSystem.h"
+#include "platform/OBNumbers.h"
 #include "platform/Process.h"
+#include "platform/TodoOperation.h"
 #include "transfer/InProgressAssetQuery.h"
 
 namespace appsync {
@@ -17,7 +21,7 @@ using namespace platform;
 static CandidateRef candidateFromPlaceholder(const OBApplicationProxy& proxy) {
   auto candidate = std::make_shared<Candidate>();
   candidate->bundleVersion = proxy.bundleVersion;
-  candidate->bundleIdentifier = proxy.bundleIdentifier;
+  candidate->bundleIdentifier = *proxy.bundleIdentifier;
   candidate->container = proxy.bundleContainerURL;
   candidate->isRestore = proxy.installType == installType::restore;
   candidate->intentionallyDemoted = proxy.installType == installType::intentionalDowngrade;
@@ -37,40 +41,85 @@ static CandidateRef candidateFromRequest(const Dictionary& item, std::string_vie
   return candidate;
 }
 
-Candidates AppsClient::_placeholderCandidates() {
-  Candidates candidates;
-  _enumeratePlaceholdersWithBlock([&](const OBApplicationProxy& proxy, bool&) {
-    if (proxy.applicationIdentifier) candidates.set(*proxy.applicationIdentifier, candidateFromPlaceholder(proxy));
-  });
-  return candidates;
+static void resetIconScratchDirectory(const Platform& platform) {
+  platform.fileSystem.removeItem(iconScratchDirectory);
+  ErrorRef error;
+  if (!platform.fileSystem.createDirectory(iconScratchDirectory, false, {}, &error)) {
+    sayError(platform, "Can't create icon scratch dir! %{public}@", error);
+  }
 }
 
-void AppsClient::_addRequests(const Value& todoList, Candidates& idsWeWant, StringSet& requestedIDs) {
-  if (!todoList.array()) return;
-  for (const Value& element : *todoList.array()) {
+std::vector<TSAssetRef> AppsClient::outstandingAssetTransfers() try {
+  return OutstandingTransfers(*this).run();
+} catch (...) {
+  swallowException(_platform, "outstandingAssetTransfers");
+  return {};
+}
+
+AppsClient::OutstandingTransfers::OutstandingTransfers(AppsClient& client)
+    : _client(client),
+      _platform(client._platform),
+      _installationAllowed(client._appInstallationAllowed()),
+      _todoList(_loadPlist(_platform, todoListPath)) {}
+
+std::vector<TSAssetRef> AppsClient::OutstandingTransfers::run() {
+  say(_platform, LogCategory::summary, "outstandingAssetTransfers starting with todoList %{public}@", _todoList);
+  _systemAppPlaceholders = _client._getSystemAppPlaceholders();
+  addPlaceholders();
+  addRequests();
+  removeInProgress();
+  const auto ordered = _orderTheItems(_platform, _idsWeWant);
+  resetIconScratchDirectory(_platform);
+
+  // Room beforehand: an app that is prepared stands in the answer, whatever fails.
+  std::vector<TSAssetRef> transfers;
+  transfers.reserve(ordered.size());
+  for (const auto& candidate : ordered) {
+    TSAssetRef asset;
+    Verdict verdict = Verdict::failed;
+    contained(_platform, "outstandingAssetTransfers", [&] { verdict = consider(*candidate, asset); });
+    if (verdict == Verdict::prepared) transfers.push_back(std::move(asset));
+    if (verdict == Verdict::failed) giveUp(candidate->bundleIdentifier);
+  }
+  return transfers;
+}
+
+void AppsClient::OutstandingTransfers::addPlaceholders() {
+  _client._enumeratePlaceholdersWithBlock([this](const OBApplicationProxy& proxy, bool&) {
+    if (!proxy.applicationIdentifier || !proxy.bundleIdentifier) return;
+    _idsWeWant.set(*proxy.applicationIdentifier, candidateFromPlaceholder(proxy));
+  });
+  // At this moment the second list is a copy of the first.
+  say(_platform, LogCategory::summary,
+      "outstandingAssetTransfers preExistingPlaceHolders %{public}@, idsWeWant %{public}@", _idsWeWant, _idsWeWant);
+}
+
+void AppsClient::OutstandingTransfers::addRequests() {
+  if (!_todoList.array()) return;
+  for (const Value& element : *_todoList.array()) {
     const Dictionary* item = element.dictionary();
-    if (!item || (*item)["operation"].string() != operation::install) continue;
+    if (!item || (*item)["operation"].string() != todo::install) continue;
     const Value& identifier = (*item)["identifier"];
     if (!isSafePathComponent(identifier)) {
       say(_platform, "Ignoring invalid path: %{public}@", identifier);
       continue;
     }
-    requestedIDs.insert(*identifier.string());
-    if (idsWeWant.find(*identifier.string())) {
+    _requestedIDs.insert(*identifier.string());
+    if (_idsWeWant.find(*identifier.string())) {
       say(_platform, "%{public}@ already has a placeholder - skipping", identifier);
     } else {
-      idsWeWant.set(*identifier.string(), candidateFromRequest(*item, *identifier.string()));
+      _idsWeWant.set(*identifier.string(), candidateFromRequest(*item, *identifier.string()));
     }
   }
 }
 
-void AppsClient::_removeInProgress(Candidates& idsWeWant) {
+void AppsClient::OutstandingTransfers::removeInProgress() {
   std::optional<std::vector<std::string>> inProgress;
   std::optional<std::vector<std::string>> restoring;
   InProgressAssetQuery::currentInProgressAssetIDs(_platform, inProgress, restoring);
   if (inProgress) {
     say(_platform, "Assets already in progress (not returning these): %{public}@", *inProgress);
-    for (const auto& identifier : *inProgress) idsWeWant.erase(identifier);
+    for (const auto& identifier : *inProgress) _idsWeWant.erase(identifier);
   } else {
     sayError(_platform, "Failed to get list of assets already in progress!");
   }
@@ -81,48 +130,16 @@ void AppsClient::_removeInProgress(Candidates& idsWeWant) {
   }
 }
 
-static void resetIconScratchDirectory(const Platform& platform) {
-  platform.fileSystem.removeItem(iconScratchDirectory);
-  ErrorRef error;
-  if (!platform.fileSystem.createDirectory(iconScratchDirectory, false, {}, &error)) {
-    sayError(platform, "Can't create icon scratch dir! %{public}@", error);
-  }
+AppsClient::OutstandingTransfers::Verdict AppsClient::OutstandingTransfers::consider(const Candidate& candidate,
+                                                                                     TSAssetRef& asset) {
+  if (!isWanted(candidate)) return Verdict::notWanted;
+  asset = makeAsset(candidate);
+  return prepare(asset) ? Verdict::prepared : Verdict::failed;
 }
 
-std::vector<TSAssetRef> AppsClient::outstandingAssetTransfers() try {
-  std::vector<TSAssetRef> transfers;
-  transfers.reserve(16);
-  const bool installationAllowed = _appInstallationAllowed();
-  const Value todoList = _loadPlist(_platform, todoListPath);
-  StringSet requestedIDs;
-  say(_platform, LogCategory::summary, "outstandingAssetTransfers starting with todoList %{public}@", todoList);
-
-  const StringSet systemAppPlaceholders = _getSystemAppPlaceholders();
-  const Candidates preExistingPlaceHolders = _placeholderCandidates();
-  Candidates idsWeWant = preExistingPlaceHolders;
-  say(_platform, LogCategory::summary,
-      "outstandingAssetTransfers preExistingPlaceHolders %{public}@, idsWeWant %{public}@", preExistingPlaceHolders,
-      idsWeWant);
-  _addRequests(todoList, idsWeWant, requestedIDs);
-  _removeInProgress(idsWeWant);
-  const auto ordered = _orderTheItems(_platform, idsWeWant);
-  resetIconScratchDirectory(_platform);
-
-  for (const auto& candidate : ordered) {
-    if (!_isWanted(*candidate, installationAllowed, systemAppPlaceholders, requestedIDs)) continue;
-    TSAssetRef asset = _makeAsset(*candidate);
-    if (_prepareTransfer(asset)) transfers.push_back(std::move(asset));
-  }
-  return transfers;
-} catch (...) {
-  swallowException(_platform, "outstandingAssetTransfers");
-  return {};
-}
-
-bool AppsClient::_isWanted(const Candidate& candidate, bool installationAllowed, const StringSet& systemAppPlaceholders,
-                           const StringSet& requestedIDs) {
-  const auto& identifier = candidate.bundleIdentifier;
-  if (!candidate.isRestore && !installationAllowed) {
+bool AppsClient::OutstandingTransfers::isWanted(const Candidate& candidate) const {
+  const std::string& identifier = candidate.bundleIdentifier;
+  if (!candidate.isRestore && !_installationAllowed) {
     say(_platform, "skipping %{public}@ - its not a restore and app installation is disabled", identifier);
     return false;
   }
@@ -136,12 +153,12 @@ bool AppsClient::_isWanted(const Candidate& candidate, bool installationAllowed,
         candidate.autoDemoted, candidate.intentionallyDemoted, 1);
     return false;
   }
-  if (identifier && systemAppPlaceholders.contains(*identifier)) {
+  if (_systemAppPlaceholders.contains(identifier)) {
     say(_platform, "%{public}@ is system app placeholder - skipping", identifier);
     return false;
   }
   if (!candidate.autoDemoted && !candidate.intentionallyDemoted) return true;
-  if (identifier && requestedIDs.contains(*identifier)) {
+  if (_requestedIDs.contains(identifier)) {
     say(_platform,
         "%{public}@ is currenlty demoted (manual:%d, auto:%d) - but will be installed as it's requested by client",
         identifier, candidate.intentionallyDemoted, candidate.autoDemoted);
@@ -159,15 +176,14 @@ static std::string displayNameOf(const Platform& platform, const Candidate& cand
     if (auto name = stringOf(entryOf(info, "KBBundleDisplayName"))) return *name;
   }
   if (candidate.nameFromHarlune) return *candidate.nameFromHarlune;
-  return candidate.bundleIdentifier.value_or("");
+  return candidate.bundleIdentifier;
 }
 
 static std::optional<std::string> pathBelow(const std::optional<std::string>& directory, std::string_view name) {
   return directory ? std::optional(joinedPath(*directory, name)) : std::nullopt;
 }
 
-static void sayRecoveredPath(const Platform& platform, const std::optional<std::string>& identifier,
-                             const Value& stored) {
+static void sayRecoveredPath(const Platform& platform, const std::string& identifier, const Value& stored) {
   auto path = stored.string();
   if (!path) return;
   if (platform.fileSystem.fileExists(*path)) {
@@ -184,18 +200,18 @@ static Value variantOptionsOf(const Candidate& candidate) {
   return options;
 }
 
-TSAssetRef AppsClient::_makeAsset(const Candidate& candidate) {
-  const std::string identifier = candidate.bundleIdentifier.value_or("");
+TSAssetRef AppsClient::OutstandingTransfers::makeAsset(const Candidate& candidate) const {
+  const std::string& identifier = candidate.bundleIdentifier;
   const std::string name = displayNameOf(_platform, candidate);
   std::optional<std::string> icon = joinedPath(iconScratchDirectory, identifier + ".png");
   if (!_makeIconFromBundlePath(_platform, candidate.path, *icon)) {
-    icon = pathBelow(candidate.container, "HarluneArtwork");
+    icon = pathBelow(candidate.container, artworkFileName);
   }
   TSAssetRef asset = TSAsset::downloadAssetWithIdentifier(identifier, dataclassApplication, name);
   asset->setIcon(icon);
   asset->setIsRestore(false);
-  sayRecoveredPath(_platform, candidate.bundleIdentifier,
-                   _restoreStatePropertyForKey("path", identifier, candidate.bundleVersion));
+  sayRecoveredPath(_platform, identifier,
+                   _client._restoreStatePropertyForKey("path", identifier, candidate.bundleVersion));
   asset->setVariantOptions(variantOptionsOf(candidate));
   asset->setStorePlist(pathBelow(candidate.container, storeMetadataFileName));
   asset->setInfoPlist(pathBelow(candidate.path, "Info.plist"));
@@ -203,26 +219,37 @@ TSAssetRef AppsClient::_makeAsset(const Candidate& candidate) {
   say(_platform,
       "Asset %{public}@ (pretty=%{public}@, version=%{public}@) prepped with icon %{public}@, at %{public}@, meta at "
       "%{public}@, info at %{public}@, storePid=%lld, isRestore=%c",
-      candidate.bundleIdentifier, name, candidate.bundleVersion, asset->icon(), candidate.path, asset->storePlist(),
-      asset->infoPlist(), asset->storePID(), yesOrNo(asset->isRestore()));
+      identifier, name, candidate.bundleVersion, asset->icon(), candidate.path, asset->storePlist(), asset->infoPlist(),
+      asset->storePID(), yesOrNo(asset->isRestore()));
   return asset;
 }
 
-bool AppsClient::_prepareTransfer(const TSAssetRef& asset) {
+bool AppsClient::OutstandingTransfers::prepare(const TSAssetRef& asset) {
   const std::string& identifier = asset->identifier();
   const auto proxy = _platform.workspace.applicationProxyForIdentifier(identifier, false);
   const bool existingApp = proxy && proxy->isInstalled && !proxy->isPlaceholder;
-  if (existingApp) say(_platform, "App %{public}@ is already installed and will be updated.", identifier);
-  if (!prepareAppForInstallUsingCoordination(asset, existingApp)) {
-    sayError(_platform, "Not requesting app asset for %{public}@", identifier);
-    changeAssetID(identifier, operation::failed);
-    return false;
-  }
-  if (existingApp) {
-    SerialQueue::Block block(_accessQueue);
-    _updatingApps.insert(identifier);
-  }
-  return true;
+  if (!existingApp) return _client.prepareAppForInstallUsingCoordination(asset, false);
+  say(_platform, "App %{public}@ is already installed and will be updated.", identifier);
+  // Before the preparation, so that nothing can fail after it.
+  const bool added = _client._addUpdatingApp(identifier);
+  const bool prepared = _client.prepareAppForInstallUsingCoordination(asset, true);
+  if (!prepared && added) _client._removeUpdatingApp(identifier);
+  return prepared;
+}
+
+void AppsClient::OutstandingTransfers::giveUp(const std::string& identifier) {
+  sayError(_platform, "Not requesting app asset for %{public}@", identifier);
+  contained(_platform, "changeAssetID", [&] { _client.changeAssetID(identifier, todo::failed); });
+}
+
+bool AppsClient::_addUpdatingApp(std::string_view identifier) {
+  SerialQueue::Block block(_accessQueue);
+  return _updatingApps.insert(identifier);
+}
+
+bool AppsClient::_removeUpdatingApp(std::string_view identifier) {
+  SerialQueue::Block block(_accessQueue);
+  return _updatingApps.erase(identifier);
 }
 
 }  // namespace appsync

@@ -1,8 +1,8 @@
 #include <utility>
 
 #include "core/AppsClient.h"
-#include "core/Paths.h"
 #include "core/PropertyListFile.h"
+#include "platform/DevicePaths.h"
 #include "platform/FileSystem.h"
 #include "platform/PropertyListSerialization.h"
 
@@ -17,19 +17,24 @@ Value AppsClient::_restoreStatePropertyForKey(std::string_view key, std::string_
   return entryOf(entryOf(entryOf(root, identifier), *version), key);
 }
 
-void AppsClient::cleanRestoreStateForIdentifier(std::string_view identifier) {
+void AppsClient::cleanRestoreStateForIdentifier(std::optional<std::string_view> identifier) {
   SerialQueue::Block block(_listFilesQueue);
   auto bytes = _platform.fileSystem.readFile(restoreStatePath);
   if (!bytes) return;
-  Value root = _platform.propertyLists.propertyListWithData(std::move(*bytes));
+  ErrorRef error;
+  Value root = _platform.propertyLists.propertyListWithData(std::move(*bytes), &error);
   Dictionary* records = root.dictionary();
-  // Something else than records is somebody else's: it holds nothing of this app, and stays.
-  if (!records && !root.isAbsent()) return;
-  if (records) records->remove(identifier);
-  if (!records || records->empty()) {
+  if (!records) {
+    // Something else than records is somebody else's: it holds nothing of this app, and stays. So does what could not
+    // be read this time, or not by this reader.
+    if (isNoPropertyList(root, error)) _platform.fileSystem.removeItem(restoreStatePath);
+    return;
+  }
+  if (identifier) records->remove(*identifier);
+  if (records->empty()) {
     _platform.fileSystem.removeItem(restoreStatePath);
   } else {
-    writePropertyList(_platform, root, PropertyListFormat::xml, restoreStatePath);
+    writePropertyListAsXML(_platform, root, restoreStatePath);
   }
 }
 

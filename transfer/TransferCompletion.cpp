@@ -1,9 +1,11 @@
 #include "core/AppsClient.h"
+#include "core/CancellationReason.h"
 #include "core/PathCheck.h"
-#include "core/Paths.h"
 #include "core/PropertyListFile.h"
 #include "core/Say.h"
+#include "platform/DevicePaths.h"
 #include "platform/OBApplicationWorkspace.h"
+#include "platform/TodoOperation.h"
 
 namespace appsync {
 
@@ -62,11 +64,11 @@ void AppsClient::_transferArrived(const TSAssetRef& asset, bool existingApp) {
     return;
   }
   if (!asset->isDownload()) {
-    changeAssetID(identifier, operation::sent);
+    changeAssetID(identifier, todo::sent);
     return;
   }
   say(_platform, "Received file at %{public}@", asset->path());
-  changeAssetID(identifier, operation::downloaded);
+  changeAssetID(identifier, todo::downloaded);
   if (!asset->isRestore()) {
     say(_platform, "Installing synced asset %{public}@", asset);
     transferCompleteForApp(asset, nullptr, existingApp);
@@ -86,7 +88,8 @@ void AppsClient::_transferFailed(const TSAssetRef& asset, const ErrorRef& error,
   if (asset->isRestore()) return;
   say(_platform, "Uninstalling placeholder %{public}@", identifier);
   if (userCancelled) return;
-  transferCompleteForApp(asset, error, existingApp);
+  // A failure whose reason nobody gave is one all the same: without an error the promise would be fulfilled.
+  transferCompleteForApp(asset, error ? error : cancellationReason(CancellationCode::packageUnavailable), existingApp);
 }
 
 }  // namespace appsync

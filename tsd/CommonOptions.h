@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "device/Injection.h"
+#include "device/boundary/Injection.h"
 
 namespace tsd {
 

@@ -20,6 +20,9 @@ struct OptionEntry {
 
   /// Whether the value names something in the file system; which, its name tells.
   bool takesFile() const { return value == "FILE"; }
+  /// Whether it names an app of the device before it, or is a rule of injection.
+  bool takesApp() const { return value == "APP"; }
+  bool takesRule() const { return value == "RULE"; }
   bool takesFolder() const { return value == "DEVICE" || value == "HOST" || value == "FOLDER"; }
 };
 
@@ -41,6 +44,8 @@ struct OptionTable {
   std::string description;
   std::vector<ExitCodeEntry> exitCodes;
   std::vector<CommandEntry> commands;
+  std::vector<std::string> points;   // of injection rules
+  std::vector<std::string> actions;  // those that take something end with "="
 };
 
 }  // namespace tsd

@@ -54,6 +54,12 @@ constexpr const char* todoList = R"(<?xml version="1.0" encoding="UTF-8"?>
     <key>operation</key><string>install</string>
     <key>version</key><string>1.0</string>
     <key>name</key><string>Maps</string>
+    <key>artist</key><string>Example Works</string>
+    <key>genre</key><string>Travel</string>
+    <key>size</key><integer>262144</integer>
+    <key>purchased</key><date>2024-02-29T12:00:00Z</date>
+    <key>languages</key><array><string>en</string><string>de</string></array>
+    <key>family</key><false/>
   </dict>
   <dict>
     <key>identifier</key><string>com.example.notes</string>

@@ -1,0 +1,26 @@
+#pragma once
+
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "device/boundary/Boundary.h"
+#include "platform/Value.h"
+
+namespace device {
+
+/// Appends one line of JSON for a record of the call journal, without a line end.
+void appendJournalLine(std::string& line, const CallRecord& record);
+std::string journalLine(const CallRecord& record);
+
+/// A line of the journal read again; nothing when it is none. The record has no argument names and no time of its
+/// begin.
+std::optional<CallRecord> parseJournalLine(std::string_view line);
+
+/// JSON text of a property-list value: data as its count of bytes, dates as ISO 8601; `indent` below 0 for one line.
+std::string jsonText(const platform::Value& value, int indent = -1);
+/// A property-list value of JSON text, null as absent; absent for what is no JSON, too.
+platform::Value valueOfJson(std::string_view text);
+
+}  // namespace device

@@ -1,0 +1,58 @@
+#pragma once
+
+#include <optional>
+#include <string>
+#include <utility>
+
+#include "device/boundary/Boundary.h"
+#include "platform/Mutex.h"
+#include "platform/RVPlaceholder.h"
+
+namespace device {
+
+/// Placeholder attributes in the making; a placeholder takes what they are when they are handed to it.
+class LocalPlaceholderAttributes final : public platform::RVPlaceholderAttributes {
+ public:
+  struct Facts {
+    platform::Value manifest;  // a dictionary, or absent
+    std::optional<std::string> version;
+    bool launchProhibited = false;
+  };
+
+  /// What the manifest says goes, until it is set otherwise.
+  LocalPlaceholderAttributes(Boundary& boundary, const platform::Value& manifest) : _boundary(boundary) {
+    if (!manifest.dictionary()) return;
+    _facts.manifest = manifest;
+    _facts.launchProhibited = (*manifest.dictionary())["OBApplicationLaunchProhibited"].boolValue();
+  }
+
+  Facts facts() const {
+    platform::Mutex::Lock lock(_mutex);
+    return _facts;
+  }
+
+  void setBundleVersion(std::optional<std::string> version) override {
+    _boundary.call({"RVPlaceholderAttributes", "setBundleVersion"}, nullptr, {{"version", version}}, [&] {
+      platform::Mutex::Lock lock(_mutex);
+      _facts.version = version;
+    });
+  }
+  void setLaunchProhibited(bool prohibited) override {
+    _boundary.call({"RVPlaceholderAttributes", "setLaunchProhibited"}, nullptr, {{"prohibited", prohibited}}, [&] {
+      platform::Mutex::Lock lock(_mutex);
+      _facts.launchProhibited = prohibited;
+    });
+  }
+
+  std::string describe() const override {
+    platform::Mutex::Lock lock(_mutex);
+    return "<RVPlaceholderAttributes version " + _facts.version.value_or("(null)") + '>';
+  }
+
+ private:
+  Boundary& _boundary;
+  mutable platform::Mutex _mutex;
+  Facts _facts GUARDED_BY(_mutex);
+};
+
+}  // namespace device

@@ -1,0 +1,87 @@
+#include "device/events/EventQueue.h"
+
+#include <utility>
+
+#include "platform/Mutex.h"
+
+namespace device {
+
+namespace {
+constinit thread_local const char* threadName = "daemon";
+}
+
+const char* nameOfLane(Lane lane) {
+  switch (lane) {
+    case Lane::coordination:
+      return "coordination";
+    case Lane::registry:
+      return "registry";
+    case Lane::notification:
+      return "notification";
+  }
+  return "";
+}
+
+const char* currentThreadName() { return threadName; }
+
+ThreadName::ThreadName(const std::string& name) : _name(name), _previous(threadName) { threadName = _name.c_str(); }
+ThreadName::~ThreadName() { threadName = _previous; }
+
+/// Held events may be let go by a thread that knows nothing of the queue's life.
+struct EventQueue::Door {
+  explicit Door(EventQueue* queue) : queue(queue) {}
+
+  platform::Mutex mutex;
+  EventQueue* queue GUARDED_BY(mutex);  // null once the queue is closed
+
+  void pass(Lane lane, Event& event) {
+    platform::Mutex::Lock lock(mutex);
+    if (queue) queue->enqueue(lane, event);
+  }
+};
+
+/// What one thread holds back, in the order in which it was posted. A thread that ends lets it go.
+struct EventQueue::HeldEvents {
+  struct Held {
+    std::shared_ptr<Door> door;
+    Lane lane;
+    Event event;
+  };
+  std::vector<Held> events;
+
+  ~HeldEvents() { letGo(); }
+
+  void letGo() {
+    auto released = std::exchange(events, {});
+    for (auto& held : released) held.door->pass(held.lane, held.event);
+  }
+};
+
+EventQueue::HeldEvents& EventQueue::heldEvents() {
+  thread_local HeldEvents held;
+  return held;
+}
+
+EventQueue::EventQueue() : _door(std::make_shared<Door>(this)) {}
+EventQueue::~EventQueue() = default;
+
+void EventQueue::close() {
+  platform::Mutex::Lock lock(_door->mutex);
+  _door->queue = nullptr;
+}
+
+void EventQueue::post(Lane lane, Event event) {
+  if (_thread.callDepth == 0) {
+    enqueue(lane, event);
+    return;
+  }
+  heldEvents().events.push_back({_door, lane, std::move(event)});
+  _thread.holds = true;
+}
+
+void EventQueue::releaseHeld() {
+  _thread.holds = false;
+  heldEvents().letGo();
+}
+
+}  // namespace device

@@ -1,0 +1,121 @@
+#include <array>
+#include <condition_variable>
+#include <deque>
+#include <thread>
+#include <utility>
+
+#include "device/events/EventQueue.h"
+#include "platform/Condition.h"
+#include "platform/Mutex.h"
+
+namespace device {
+
+namespace {
+
+using Lock = platform::Mutex::Lock;
+
+/// The machine's own monotonic clock. A thread that waits lets go what it held back: it may be waiting for just that.
+class SystemClock final : public platform::Clock {
+ public:
+  Instant now() override { return std::chrono::steady_clock::now(); }
+
+  bool waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
+                 const std::function<bool()>& satisfied) override {
+    EventQueue::release();
+    return changed.wait_until(lock, deadline, satisfied);
+  }
+};
+
+class ThreadedEventQueue final : public EventQueue {
+ public:
+  ThreadedEventQueue() {
+    for (std::size_t i = 0; i < laneCount; ++i) {
+      _threads[i] = std::thread([this, i] { run(static_cast<Lane>(i)); });
+    }
+  }
+  ~ThreadedEventQueue() override {
+    stop();
+    close();
+  }
+
+  void drain() override {
+    release();
+    Lock lock(_mutex);
+    _idle.wait(_mutex, [this]() REQUIRES(_mutex) { return _unfinished == 0; });
+  }
+
+  void stop() override {
+    std::array<std::deque<Event>, laneCount> dropped;  // goes when no lock is held: events own what they will call
+    {
+      Lock lock(_mutex);
+      _stopped = true;
+      for (std::size_t i = 0; i < laneCount; ++i) {
+        dropped[i].swap(_lanes[i].pending);
+        _unfinished -= dropped[i].size();
+        _lanes[i].wake.notifyOne();
+      }
+      if (_unfinished == 0) _idle.notifyAll();
+    }
+    if (runsLaneOf == this) return;
+    Lock lock(_joinMutex);
+    for (auto& thread : _threads) {
+      if (thread.joinable()) thread.join();
+    }
+  }
+
+  platform::Clock& clock() override { return _clock; }
+
+ protected:
+  bool enqueue(Lane lane, Event& event) override {
+    Lock lock(_mutex);
+    if (_stopped) return false;
+    LaneState& state = _lanes[static_cast<std::size_t>(lane)];
+    state.pending.push_back(std::move(event));
+    ++_unfinished;
+    state.wake.notifyOne();
+    return true;
+  }
+
+ private:
+  struct LaneState {
+    std::deque<Event> pending;
+    platform::Condition wake;
+  };
+
+  void run(Lane lane) {
+    runsLaneOf = this;
+    ThreadName name(nameOfLane(lane));
+    Lock lock(_mutex);
+    LaneState& state = _lanes[static_cast<std::size_t>(lane)];
+    while (true) {
+      state.wake.wait(_mutex, [&]() REQUIRES(_mutex) { return _stopped || !state.pending.empty(); });
+      if (_stopped) return;
+      Event event = std::move(state.pending.front());
+      state.pending.pop_front();
+      lock.unlock();
+      event();
+      event = nullptr;
+      release();
+      lock.lock();
+      if (--_unfinished == 0) _idle.notifyAll();
+    }
+  }
+
+  static inline constinit thread_local const ThreadedEventQueue* runsLaneOf = nullptr;
+
+  SystemClock _clock;
+  platform::Mutex _joinMutex;
+  platform::Mutex _mutex;
+  platform::Condition _idle;
+  std::array<LaneState, laneCount> _lanes GUARDED_BY(_mutex);
+  std::size_t _unfinished GUARDED_BY(_mutex) = 0;  // pending or running, over all lanes
+  bool _stopped GUARDED_BY(_mutex) = false;
+  // Made last, as they touch all of these; their own beginning and end is the constructor's and `stop`'s.
+  std::array<std::thread, laneCount> _threads GUARDED_BY(_joinMutex);
+};
+
+}  // namespace
+
+std::unique_ptr<EventQueue> makeThreadedEventQueue() { return std::make_unique<ThreadedEventQueue>(); }
+
+}  // namespace device

@@ -1,0 +1,409 @@
+#include "device/files/DiskFileTree.h"
+
+#include <fcntl.h>
+#include <grp.h>
+#include <pwd.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <atomic>
+#include <cerrno>
+#include <functional>
+#include <map>
+#include <new>
+#include <system_error>
+#include <thread>
+
+#include "device/files/DevicePath.h"
+#include "platform/Mutex.h"
+
+namespace device {
+
+using platform::Bytes;
+using platform::BytesView;
+using platform::Durability;
+using platform::ErrorRef;
+using platform::FileAttributes;
+using platform::Value;
+
+namespace {
+
+constexpr std::size_t chunkSize = 128 * 1024;
+
+/// Numbers of owners by their names. Asking the system reads its files every time, so answers are kept: an owner's
+/// number stays the same while a process runs.
+class OwnerNumbers {
+ public:
+  /// The number that the system's `find` knows a name by; -1 for one that is absent or unknown here, which leaves the
+  /// owner as it is.
+  template <class Find>
+  std::uint32_t of(const Value& name, Find&& find) {
+    auto text = name.string();
+    if (!text) return static_cast<std::uint32_t>(-1);
+    platform::Mutex::Lock lock(_mutex);
+    auto place = _known.find(*text);
+    if (place == _known.end()) place = _known.emplace(*text, find(std::string(*text).c_str())).first;
+    return place->second;
+  }
+
+ private:
+  platform::Mutex _mutex;
+  std::map<std::string, std::uint32_t, std::less<>> _known GUARDED_BY(_mutex);
+};
+
+uid_t userNamed(const Value& name) {
+  static OwnerNumbers users;
+  return users.of(name, [](const char* text) {
+    char space[4096];
+    passwd entry;
+    passwd* found = nullptr;
+    ::getpwnam_r(text, &entry, space, sizeof space, &found);
+    return found ? found->pw_uid : static_cast<uid_t>(-1);
+  });
+}
+gid_t groupNamed(const Value& name) {
+  static OwnerNumbers groups;
+  return groups.of(name, [](const char* text) {
+    char space[4096];
+    group entry;
+    group* found = nullptr;
+    ::getgrnam_r(text, &entry, space, sizeof space, &found);
+    return found ? found->gr_gid : static_cast<gid_t>(-1);
+  });
+}
+
+void applyAttributes(const DiskPlace& place, const Value& attributes) {
+  const auto* entries = attributes.dictionary();
+  if (!entries || ::geteuid() != 0) return;
+  uid_t owner = userNamed((*entries)[platform::FXFileOwnerAccountName]);
+  gid_t group = groupNamed((*entries)[platform::FXFileGroupOwnerAccountName]);
+  if (owner == static_cast<uid_t>(-1) && group == static_cast<gid_t>(-1)) return;
+  // What cannot be applied is left: the file counts, not its owner.
+  [[maybe_unused]] int ignored = ::fchownat(place.directory(), place.name(), owner, group, AT_SYMLINK_NOFOLLOW);
+}
+
+/// Up to `count` bytes into `chunk`; fewer at the end only.
+int readChunk(int file, std::size_t count, Bytes& chunk) {
+  std::size_t filled = 0;
+  chunk.resize(count);
+  while (filled < count) {
+    ssize_t got = ::read(file, chunk.data() + filled, count - filled);
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0) return errno;
+    if (got == 0) break;
+    filled += static_cast<std::size_t>(got);
+  }
+  chunk.resize(filled);
+  return 0;
+}
+
+int readWhole(int file, Bytes& contents) {
+  struct stat status;
+  if (::fstat(file, &status) != 0) return errno;
+  if (static_cast<std::uint64_t>(status.st_size) > largestWholeRead) return EFBIG;
+  // One byte more than expected, so that a file that is as long as it says is read in one go.
+  if (int failure = readChunk(file, static_cast<std::size_t>(status.st_size) + 1, contents)) return failure;
+  Bytes more;
+  while (contents.size() > static_cast<std::size_t>(status.st_size)) {
+    if (int failure = readChunk(file, chunkSize, more)) return failure;
+    if (more.empty()) break;
+    contents += more;
+    if (contents.size() > largestWholeRead) return EFBIG;
+  }
+  return 0;
+}
+
+class DiskFileWriter final : public FileWriter {
+ public:
+  DiskFileWriter(FileDescriptor file, std::string_view path, std::shared_ptr<StepWatch> watch)
+      : _file(std::move(file)), _path(path), _watch(std::move(watch)) {}
+
+  bool write(BytesView bytes, ErrorRef* error) override {
+    return answerFileOperation(writeWhole(writing(), bytes), _path, error);
+  }
+  bool close(bool durable, ErrorRef* error) override {
+    int failure = durable ? syncFile(writing()) : 0;
+    _file = FileDescriptor();
+    return answerFileOperation(failure, _path, error);
+  }
+
+ private:
+  FileInWriting writing() const { return {_file.get(), _path, _watch.get()}; }
+
+  FileDescriptor _file;
+  const std::string _path;
+  const std::shared_ptr<StepWatch> _watch;
+};
+
+class DiskFileReader final : public FileReader {
+ public:
+  DiskFileReader(FileDescriptor file, std::string_view path) : _file(std::move(file)), _path(path) {}
+
+  std::optional<Bytes> read(std::size_t count, ErrorRef* error) override {
+    Bytes chunk;
+    if (!answerFileOperation(readChunk(_file.get(), count, chunk), _path, error)) return std::nullopt;
+    return chunk;
+  }
+  bool seek(std::uint64_t offset, ErrorRef* error) override {
+    bool there = ::lseek(_file.get(), static_cast<off_t>(offset), SEEK_SET) >= 0;
+    return answerFileOperation(there ? 0 : errno, _path, error);
+  }
+
+ private:
+  FileDescriptor _file;
+  const std::string _path;
+};
+
+int moveBetween(const DiskPlace& from, const DiskPlace& to) {
+  if (int failure = from.moveTo(to)) return failure;
+  if (int failure = to.syncDirectory()) return failure;
+  if (int failure = from.syncDirectory()) return failure;
+  // Where things are moved to may be a directory that was made for them.
+  return to.syncDirectoryAbove();
+}
+
+int copyContents(int from, const FileInWriting& to) {
+  struct stat status;
+  if (::fstat(from, &status) != 0) return errno;
+  if ((status.st_mode & S_IXUSR) && ::fchmod(to.descriptor, 0755) != 0) return errno;
+  Bytes chunk;
+  do {
+    if (int failure = readChunk(from, chunkSize, chunk)) return failure;
+    if (int failure = writeWhole(to, chunk)) return failure;
+  } while (!chunk.empty());
+  return 0;
+}
+
+/// A flush is mostly waiting, and a disk writes out in one go what is asked for at the same time.
+constexpr std::size_t flushesAtOnce = 8;
+
+/// Calls `flush` with each index below `count`, on up to `atOnce` threads. The first error number, after which no more
+/// are begun.
+int flushAll(std::size_t count, std::size_t atOnce, const std::function<int(std::size_t index)>& flush) {
+  std::atomic<std::size_t> next{0};
+  std::atomic<int> failure{0};
+  auto work = [&] {
+    for (std::size_t i; failure == 0 && (i = next++) < count;) {
+      int number;
+      try {
+        number = flush(i);
+      } catch (const std::bad_alloc&) {
+        number = ENOMEM;
+      }
+      int none = 0;
+      if (number != 0) failure.compare_exchange_strong(none, number);
+    }
+  };
+  {
+    std::vector<std::jthread> others;
+    try {
+      while (others.size() + 1 < std::min(count, atOnce)) others.emplace_back(work);
+    } catch (const std::system_error&) {
+      // As many as there are will do.
+    }
+    work();
+  }
+  return failure;
+}
+
+}  // namespace
+
+bool DiskFileTree::removeItem(std::string_view path, ErrorRef* error) {
+  DiskPlace place;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.remove();
+  return answerFileOperation(failure, path, error);
+}
+
+int DiskFileTree::makeDirectory(std::string_view path, bool intermediates, const Value& attributes) const {
+  DiskPlace place;
+  if (int failure = find(path, intermediates, place)) return failure;
+  if (place.isRoot()) return intermediates ? 0 : EEXIST;
+  int failure = place.makeDirectory();
+  if (failure == 0) applyAttributes(place, attributes);
+  if (failure != EEXIST || !intermediates) return failure;
+  struct stat status;
+  if (int unknown = place.status(status)) return unknown;
+  return S_ISDIR(status.st_mode) ? 0 : EEXIST;
+}
+
+bool DiskFileTree::createDirectory(std::string_view path, bool withIntermediateDirectories, const Value& attributes,
+                                   ErrorRef* error) {
+  return answerFileOperation(makeDirectory(path, withIntermediateDirectories, attributes), path, error);
+}
+
+bool DiskFileTree::moveItem(std::string_view from, std::string_view to, ErrorRef* error) {
+  DiskPlace source, destination;
+  struct stat status;
+  int failure = find(from, source);
+  if (failure == 0) failure = source.isRoot() ? EBUSY : source.status(status);
+  if (failure) return answerFileOperation(failure, from, error);
+  failure = find(to, destination);
+  if (failure == 0) failure = destination.isRoot() ? EEXIST : moveBetween(source, destination);
+  return answerFileOperation(failure, to, error);
+}
+
+bool DiskFileTree::copyItem(std::string_view from, std::string_view to, ErrorRef* error) {
+  FileDescriptor source;
+  if (int failure = openFile(from, source)) return answerFileOperation(failure, from, error);
+  DiskPlace destination;
+  int failure = find(to, destination);
+  if (failure == 0)
+    failure = destination.replaceFile([&](const FileInWriting& file) { return copyContents(source.get(), file); });
+  return answerFileOperation(failure, to, error);
+}
+
+bool DiskFileTree::fileExists(std::string_view path, bool* isDirectory) {
+  auto attributes = attributesOfItem(path, nullptr);
+  if (isDirectory) *isDirectory = attributes && attributes->isDirectory;
+  return attributes.has_value();
+}
+
+std::optional<FileAttributes> DiskFileTree::attributesOfItem(std::string_view path, ErrorRef* error) {
+  DiskPlace place;
+  struct stat status;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.status(status);
+  if (!answerFileOperation(failure, path, error)) return std::nullopt;
+  bool isDirectory = S_ISDIR(status.st_mode);
+  return FileAttributes{isDirectory, isDirectory ? 0 : static_cast<std::uint64_t>(status.st_size)};
+}
+
+bool DiskFileTree::putFile(std::string_view path, BytesView contents, const Value& attributes, ErrorRef* error) {
+  DiskPlace place;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.replaceFile([&](const FileInWriting& file) { return writeWhole(file, contents); });
+  if (failure == 0) applyAttributes(place, attributes);
+  return answerFileOperation(failure, path, error);
+}
+
+int DiskFileTree::openFile(std::string_view path, FileDescriptor& file) const {
+  DiskPlace place;
+  if (int failure = find(path, place)) return failure;
+  return place.openFile(file);
+}
+
+std::optional<Bytes> DiskFileTree::readFile(std::string_view path, ErrorRef* error) {
+  FileDescriptor file;
+  Bytes contents;
+  int failure = openFile(path, file);
+  try {
+    if (failure == 0) failure = readWhole(file.get(), contents);
+  } catch (const std::bad_alloc&) {
+    failure = ENOMEM;
+  }
+  if (!answerFileOperation(failure, path, error)) return std::nullopt;
+  return contents;
+}
+
+bool DiskFileTree::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error, Durability durability) {
+  DiskPlace place;
+  int failure = find(path, place);
+  if (failure == 0) {
+    failure = place.replaceFile([&](const FileInWriting& file) {
+      int failure = writeWhole(file, contents);
+      // Before the rename, so that the new content is whole wherever the new name is.
+      return failure == 0 && durability == Durability::lasting ? syncFile(file) : failure;
+    });
+  }
+  if (failure == 0 && durability == Durability::lasting) failure = place.syncDirectory();
+  return answerFileOperation(failure, path, error);
+}
+
+int DiskFileTree::utimes(std::string_view path, int& errorNumber) {
+  DiskPlace place;
+  struct stat status;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.status(status);
+  if (failure == 0) failure = place.touch();
+  if (failure == 0) return 0;
+  errorNumber = failure;
+  return -1;
+}
+
+std::optional<std::vector<FileTree::Entry>> DiskFileTree::list(std::string_view path, ErrorRef* error) {
+  DiskPlace place;
+  FileDescriptor directory;
+  std::vector<std::string> names;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.openDirectory(directory);
+  if (failure == 0) failure = namesInDirectory(directory.get(), names);
+  if (!answerFileOperation(failure, path, error)) return std::nullopt;
+  std::sort(names.begin(), names.end());
+  std::vector<Entry> entries;
+  for (auto& name : names) {
+    struct stat status;
+    if (::fstatat(directory.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) continue;  // gone again
+    if (S_ISDIR(status.st_mode))
+      entries.push_back({std::move(name), true, 0});
+    else if (S_ISREG(status.st_mode))
+      entries.push_back({std::move(name), false, static_cast<std::uint64_t>(status.st_size)});
+  }
+  return entries;
+}
+
+std::unique_ptr<FileWriter> DiskFileTree::createNew(std::string_view path, bool executable, ErrorRef* error) {
+  DiskPlace place;
+  FileDescriptor file;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.createFile(executable, file);
+  if (!answerFileOperation(failure, path, error)) return nullptr;
+  return std::make_unique<DiskFileWriter>(std::move(file), path, _watch);
+}
+
+std::unique_ptr<FileReader> DiskFileTree::openForReading(std::string_view path, ErrorRef* error) {
+  FileDescriptor file;
+  if (!answerFileOperation(openFile(path, file), path, error)) return nullptr;
+  return std::make_unique<DiskFileReader>(std::move(file), path);
+}
+
+int DiskFileTree::flushDirectory(std::string_view path) const {
+  DiskPlace place;
+  FileDescriptor directory;
+  if (int failure = find(path, place)) return failure;
+  if (int failure = place.openDirectory(directory)) return failure;
+  return device::syncDirectory(directory.get(), path, _watch.get());
+}
+
+int DiskFileTree::flushFile(std::string_view path) const {
+  FileDescriptor file;
+  if (int failure = openFile(path, file)) return failure;
+  return syncFile({file.get(), path, _watch.get()});
+}
+
+bool DiskFileTree::syncDirectory(std::string_view path, ErrorRef* error) {
+  return answerFileOperation(flushDirectory(path), path, error);
+}
+
+bool DiskFileTree::syncItem(std::string_view path, ErrorRef* error) {
+  auto attributes = attributesOfItem(path, error);
+  if (!attributes) return false;
+  struct Item {
+    std::string path;
+    bool isDirectory;
+  };
+  std::vector<Item> items{{std::string(path), attributes->isDirectory}};
+  for (std::size_t i = 0; i < items.size(); ++i) {
+    if (!items[i].isDirectory) continue;
+    std::string directory = path == "/" && i == 0 ? "" : items[i].path;
+    auto entries = list(items[i].path, error);
+    if (!entries) return false;
+    for (const auto& entry : *entries) items.push_back({directory + '/' + entry.name, entry.isDirectory});
+  }
+  auto slash = path.rfind('/');
+  items.push_back({std::string(slash == 0 ? "/" : path.substr(0, slash)), true});
+  // Whoever watches the steps wants the same order every time.
+  int failure = flushAll(items.size(), _watch ? 1 : flushesAtOnce, [&](std::size_t i) {
+    return items[i].isDirectory ? flushDirectory(items[i].path) : flushFile(items[i].path);
+  });
+  return answerFileOperation(failure, path, error);
+}
+
+std::unique_ptr<FileTree> openDiskFileTree(const std::string& root, ErrorRef* error, std::shared_ptr<StepWatch> watch) {
+  // The folder itself is the owner's choice and may be reached through links.
+  FileDescriptor opened(::open(root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  if (!answerFileOperation(opened.isOpen() ? 0 : errno, root, error)) return nullptr;
+  return std::make_unique<DiskFileTree>(std::move(opened), std::move(watch));
+}
+
+}  // namespace device

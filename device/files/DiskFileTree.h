@@ -1,0 +1,56 @@
+#pragma once
+
+#include <memory>
+
+#include "device/files/DiskPlace.h"
+#include "device/files/FileTree.h"
+#include "device/files/StepWatch.h"
+
+namespace device {
+
+/// A file tree on a folder of the host. New files and directories have the process's default mode; an owner in the
+/// attributes is applied where the process may change owners and the host knows the name.
+class DiskFileTree final : public FileTree {
+ public:
+  /// `watch`, which may be null, is told of every step.
+  DiskFileTree(FileDescriptor root, std::shared_ptr<StepWatch> watch)
+      : _root(std::move(root)), _watch(std::move(watch)) {}
+
+  bool removeItem(std::string_view path, platform::ErrorRef* error) override;
+  bool createDirectory(std::string_view path, bool withIntermediateDirectories, const platform::Value& attributes,
+                       platform::ErrorRef* error) override;
+  bool moveItem(std::string_view from, std::string_view to, platform::ErrorRef* error) override;
+  bool copyItem(std::string_view from, std::string_view to, platform::ErrorRef* error) override;
+  bool fileExists(std::string_view path, bool* isDirectory) override;
+  std::optional<platform::FileAttributes> attributesOfItem(std::string_view path, platform::ErrorRef* error) override;
+  bool createFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes) override {
+    return putFile(path, contents, attributes, nullptr);
+  }
+  bool putFile(std::string_view path, platform::BytesView contents, const platform::Value& attributes,
+               platform::ErrorRef* error) override;
+  std::optional<platform::Bytes> readFile(std::string_view path, platform::ErrorRef* error) override;
+  bool writeAtomically(std::string_view path, platform::BytesView contents, platform::ErrorRef* error,
+                       platform::Durability durability) override;
+  int utimes(std::string_view path, int& errorNumber) override;
+
+  std::optional<std::vector<Entry>> list(std::string_view path, platform::ErrorRef* error) override;
+  std::unique_ptr<FileWriter> createNew(std::string_view path, bool executable, platform::ErrorRef* error) override;
+  std::unique_ptr<FileReader> openForReading(std::string_view path, platform::ErrorRef* error) override;
+  bool syncDirectory(std::string_view path, platform::ErrorRef* error) override;
+  bool syncItem(std::string_view path, platform::ErrorRef* error) override;
+
+ private:
+  int find(std::string_view path, DiskPlace& place) const { return find(path, false, place); }
+  int find(std::string_view path, bool makeDirectories, DiskPlace& place) const {
+    return DiskPlace::find(_root, path, makeDirectories, _watch.get(), place);
+  }
+  int makeDirectory(std::string_view path, bool intermediates, const platform::Value& attributes) const;
+  int openFile(std::string_view path, FileDescriptor& file) const;
+  int flushDirectory(std::string_view path) const;
+  int flushFile(std::string_view path) const;
+
+  const FileDescriptor _root;
+  const std::shared_ptr<StepWatch> _watch;
+};
+
+}  // namespace device

@@ -1,0 +1,82 @@
+#pragma once
+
+#include <functional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "device/files/FileDescriptor.h"
+#include "device/files/StepWatch.h"
+
+struct stat;
+
+namespace device {
+
+/// A file that is open for writing. The path is borrowed; `watch`, which may be null, is told of the steps.
+struct FileInWriting {
+  int descriptor;
+  std::string_view path;
+  StepWatch* watch;
+};
+
+/// A name in an open directory: where the resolver's walk from a root ended. No step of the walk, and nothing done at
+/// the place, follows a link. The functions answer 0 or the system's error number: ELOOP for a link, EOPNOTSUPP for
+/// what is neither a regular file nor a directory nor a link. Every change is a step that `watch` is told of.
+class DiskPlace {
+ public:
+  /// The place of a path of the device below the root. All but the last name must be directories; with
+  /// `makeDirectories` missing ones are made. The path is borrowed.
+  static int find(const FileDescriptor& root, std::string_view path, bool makeDirectories, StepWatch* watch,
+                  DiskPlace& place);
+
+  bool isRoot() const { return _isRoot; }
+  int directory() const { return _directory.get(); }
+  const char* name() const { return _name.c_str(); }
+
+  /// What is there: a regular file or a directory.
+  int status(struct stat& status) const;
+  /// 0 when a regular file may be put there: nothing or another one is there now.
+  int mayHoldFile() const;
+  int openFile(FileDescriptor& file) const;
+  int openDirectory(FileDescriptor& directory) const;
+  /// Makes the entry's presence or absence durable.
+  int syncDirectory() const;
+
+  /// Makes the directory itself durable that the entry is in. Nothing for one in the root.
+  int syncDirectoryAbove() const;
+
+  int makeDirectory() const;
+  /// A new file, open for writing; something there is EEXIST.
+  int createFile(bool executable, FileDescriptor& file) const;
+  /// To a place where nothing is.
+  int moveTo(const DiskPlace& target) const;
+  /// Sets its times to now.
+  int touch() const;
+
+  /// Puts a new file there, in place of an older one: filled under a temporary name in the same directory, then
+  /// renamed. What is to be flushed before that, `fill` flushes. On failure nothing has changed and the temporary file
+  /// is gone.
+  int replaceFile(const std::function<int(const FileInWriting& file)>& fill) const;
+  /// With everything in it. A link, or whatever else it is, goes itself.
+  int remove() const;
+
+ private:
+  /// Of the directory that the place is in.
+  std::string_view directoryPath() const;
+
+  FileDescriptor _directory;
+  std::string _name;
+  std::string_view _path;
+  StepWatch* _watch = nullptr;
+  bool _isRoot = false;
+};
+
+/// The names in an open directory, in no order.
+int namesInDirectory(int directory, std::vector<std::string>& names);
+/// All of it.
+int writeWhole(const FileInWriting& file, std::string_view bytes);
+int syncFile(const FileInWriting& file);
+/// Makes an open directory's entries durable.
+int syncDirectory(int directory, std::string_view path, StepWatch* watch);
+
+}  // namespace device

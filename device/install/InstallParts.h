@@ -1,0 +1,27 @@
+#pragma once
+
+#include <functional>
+#include <string>
+
+#include "device/events/EventQueue.h"
+#include "device/files/FileTree.h"
+#include "device/install/Containers.h"
+#include "device/install/OpenCoordinators.h"
+#include "device/records/AppRecords.h"
+#include "device/reports/InstallReports.h"
+
+namespace device {
+
+/// What every install works with. Outlives them all.
+struct InstallParts {
+  AppRecords& records;
+  FileTree& files;
+  Containers& containers;
+  OpenCoordinators& open;
+  InstallReports& reports;
+  EventQueue& events;
+  /// Told why an app's placeholder could not be written, as the plug-in passes over that in silence. May be null.
+  const std::function<void(const std::string& app, const platform::ErrorRef& reason)>& placeholderFailed;
+};
+
+}  // namespace device

@@ -1,0 +1,43 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "device/files/FileTree.h"
+#include "platform/Error.h"
+#include "platform/Value.h"
+
+namespace device {
+
+/// What a package may be at most. Everything is counted while it is written, whatever the archive says about itself.
+struct PackageLimits {
+  std::size_t entries = 100'000;  // of the archive; also files and folders, listed or not
+  std::uint64_t totalBytes = std::uint64_t{8} << 30;
+  std::size_t nameLength = 1024;  // bytes of a whole name
+  std::size_t componentLength = 255;
+  std::size_t depth = 32;  // components of a name
+};
+
+struct UnpackedPackage {
+  std::string bundle;        // name of the ".app" directory
+  std::string identifier;    // the manifest's "KBBundleIdentifier"
+  platform::Value manifest;  // a dictionary
+  std::uint64_t bytes = 0;   // of all its files
+};
+
+/// Unpacks a package, a zip archive with one "<Name>.app" folder at its top, into a directory that exists and is
+/// empty. It is not flushed. Nothing, with an error of the domain "Package"
+/// that names the package and the entry, when it is anything else than plain files and folders below that one folder,
+/// when two names differ in case only, or when a limit is passed; what has been written so far stays then, for the
+/// caller to remove.
+///
+/// Of an entry's attributes only owner execute is kept. Case is that of ASCII letters; all other characters of a name
+/// are taken as they are. Before a name gets here, libarchive makes slashes of its backslashes where it has no slash.
+std::optional<UnpackedPackage> unpackPackage(FileTree& files, std::string_view packagePath,
+                                             const std::string& directory, const PackageLimits& limits = {},
+                                             platform::ErrorRef* error = nullptr);
+
+}  // namespace device

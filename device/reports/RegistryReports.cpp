@@ -1,0 +1,87 @@
+#include "device/reports/RegistryReports.h"
+
+#include <algorithm>
+
+namespace device {
+
+namespace {
+
+using Proxies = std::vector<platform::OBApplicationProxyRef>;
+
+/// Puts the app's proxy where it belongs by its identifier, or takes the one that is there away when there is none.
+void place(Proxies& proxies, const std::string& id, const platform::OBApplicationProxyRef& proxy) {
+  auto at = std::lower_bound(proxies.begin(), proxies.end(), id, [](const auto& each, const std::string& identifier) {
+    return *each->applicationIdentifier < identifier;
+  });
+  bool isThere = at != proxies.end() && *(*at)->applicationIdentifier == id;
+  if (isThere && proxy)
+    *at = proxy;
+  else if (isThere)
+    proxies.erase(at);
+  else if (proxy)
+    proxies.insert(at, proxy);
+}
+
+std::vector<std::string> identifiers(const Proxies& proxies) {
+  std::vector<std::string> result;
+  for (const auto& proxy : proxies) result.push_back(proxy->applicationIdentifier.value_or(""));
+  return result;
+}
+
+}  // namespace
+
+void RegistryReports::addObserver(const std::weak_ptr<Observer>& observer) {
+  auto alive = observer.lock();
+  if (!alive) return;
+  _observers.add(observer);
+  _events.post(Lane::registry, [this, address = alive.get()] {
+    _observers.deliverTo(address, [this](Observer& each, const auto&) { report(each); });
+  });
+}
+
+void RegistryReports::bringUpToDate() {
+  AppRecords::Lock lock(_records);
+  for (const auto& id : _records.takeChangedApps()) {
+    const auto* app = _records.state().app(id);
+    const auto* progress = app && app->progress ? &*app->progress : nullptr;
+    place(_prioritized, id, progress && !progress->paused ? app->proxy : nullptr);
+    place(_paused, id, progress && progress->paused ? app->proxy : nullptr);
+  }
+}
+
+void RegistryReports::report(Observer& observer) {
+  bringUpToDate();
+  auto shown = [&](const Proxies& proxies) {
+    return _boundary.hasJournal() ? identifiers(proxies) : std::vector<std::string>();
+  };
+  _boundary.enter({"AppsClient", "applicationInstallsArePrioritized"},
+                  {{"prioritized", shown(_prioritized)}, {"paused", shown(_paused)}},
+                  [&] { observer.applicationInstallsArePrioritized(_prioritized, _paused); });
+}
+
+void RegistryReports::installsChanged() {
+  if (_reportPosted.exchange(true)) return;
+  _events.post(Lane::registry, [this] {
+    _reportPosted = false;
+    _observers.deliver([this](Observer& each, const auto&) { report(each); });
+  });
+}
+
+void RegistryReports::installCancelled(platform::OBApplicationProxyRef app) {
+  _events.post(Lane::registry, [this, app = std::move(app)] {
+    Proxies cancelled{app};
+    _observers.deliver([&](Observer& each, const auto&) {
+      _boundary.enter({"AppsClient", "applicationInstallsDidCancel", app->applicationIdentifier.value_or("")},
+                      {{"applications", identifiers(cancelled)}},
+                      [&] { each.applicationInstallsDidCancel(cancelled); });
+    });
+  });
+}
+
+void RegistryReports::appChanged(AppStatus status) {
+  // The owner is no caller that has to get ready first, and is told in the order of the changes, whoever made them.
+  EventQueue::OutsideCall outside;
+  _events.post(Lane::registry, [this, status = std::move(status)] { _changed(status); });
+}
+
+}  // namespace device

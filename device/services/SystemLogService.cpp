@@ -1,0 +1,45 @@
+#include "device/services/SystemLogService.h"
+
+#include <utility>
+
+namespace device {
+
+using platform::LogHandle;
+using platform::LogLevel;
+
+class SystemLogService::Handle final : public LogHandle {
+ public:
+  Handle(SystemLogService& log, std::string category) : _log(log), _category(std::move(category)) {}
+
+  bool isEnabled(LogLevel) const override { return _log.hasListener(); }
+  void write(LogLevel level, std::string_view message) override { _log.write(level, _category, message); }
+
+ private:
+  SystemLogService& _log;
+  const std::string _category;
+};
+
+const char* SystemLogService::nameOfLevel(LogLevel level) { return level == LogLevel::error ? "error" : "default"; }
+
+std::shared_ptr<LogHandle> SystemLogService::createHandle(std::string_view subsystem, std::string_view category) {
+  return _boundary.call(
+      {"SystemLog", "createHandle"}, nullptr, {{"subsystem", subsystem}, {"category", category}},
+      [&] { return makeHandle(std::string(category)); }, [&] { return makeHandle(std::string()); });
+}
+
+std::shared_ptr<LogHandle> SystemLogService::makeHandle(std::string category) {
+  return std::make_shared<Handle>(*this, std::move(category));
+}
+
+void SystemLogService::write(LogLevel level, const std::string& category, std::string_view message) {
+  Crossing crossing{"log", nameOfLevel(level)};
+  crossing.isMessage = true;
+  _boundary.call(crossing, nullptr, {{"category", category}, {"text", message}}, [&] {
+    if (!_listener) return;
+    LogRecord record{level, category, std::string(message)};
+    platform::Mutex::Lock lock(_mutex);
+    _listener(record);
+  });
+}
+
+}  // namespace device

@@ -1,0 +1,31 @@
+#pragma once
+
+#include <list>
+#include <string>
+#include <vector>
+
+#include "device/store/Store.h"
+#include "platform/TextTable.h"
+
+namespace device {
+
+/// Records by kind and key, in the order of first insertion; one that was removed and comes back is the last. Not
+/// synchronised.
+class RecordList {
+ public:
+  RecordList() = default;
+  RecordList(const RecordList&) = delete;
+  RecordList& operator=(const RecordList&) = delete;
+
+  /// An absent value removes the record, if it is there.
+  void apply(const StoreRecord& change);
+  std::vector<StoreRecord> all() const { return {_records.begin(), _records.end()}; }
+
+ private:
+  using Records = std::list<StoreRecord>;
+
+  Records _records;
+  platform::TextMap<Records::iterator> _places;  // by the kind, a zero and the key
+};
+
+}  // namespace device

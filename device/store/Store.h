@@ -1,0 +1,47 @@
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "platform/Error.h"
+#include "platform/Value.h"
+
+namespace device {
+
+class StepWatch;
+
+/// One record of what the device's services remember. An absent value removes the record.
+struct StoreRecord {
+  std::string kind;  // "app", "coordinator", "uninstalled", "setting", …
+  std::string key;
+  platform::Value value;
+};
+
+/// What the services remember over a restart: plain records, each changed one written through. A commit is atomic and,
+/// on true, durable. Operations from any thread.
+class Store {
+ public:
+  virtual ~Store() = default;
+  /// Every record, in the order of first insertion. Nothing lost: an unreadable store is an error when it is opened.
+  virtual std::vector<StoreRecord> load() = 0;
+  virtual bool commit(const std::vector<StoreRecord>& changes, platform::ErrorRef* error = nullptr) = 0;
+  /// The same for changes that a loss of power may take back: atomic, in order with every other change, and kept when
+  /// the process dies; durable with the next commit. Costs no flush.
+  virtual bool write(const std::vector<StoreRecord>& changes, platform::ErrorRef* error = nullptr) {
+    return commit(changes, error);
+  }
+};
+
+/// One SQLite file, made when it is not there. Null with an error when it is none of ours or cannot be read. One
+/// process at a time: while it is open, nobody else can open it. `watch`, if there is one, is told of every commit and
+/// write; each is one step, whole or not at all, so that what the watch answers after it does not count.
+std::unique_ptr<Store> openDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr,
+                                         std::shared_ptr<StepWatch> watch = nullptr);
+/// A store in memory that begins with what the file holds, as its last commit left it. The file, and what else belongs
+/// to it, is only read, also while another process has it open. Null with an error as above.
+std::unique_ptr<Store> copyDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr);
+/// Forgets everything when it goes.
+std::unique_ptr<Store> makeMemoryStore();
+
+}  // namespace device

@@ -1,0 +1,57 @@
+#pragma once
+
+#include <chrono>
+#include <condition_variable>
+#include <functional>
+#include <mutex>
+
+#include "platform/Clock.h"
+#include "platform/Mutex.h"
+
+namespace platform {
+
+/// What threads that hold a `Mutex` wait for. A waiter lets the mutex go meanwhile and holds it again whenever
+/// `satisfied` runs and on return. `satisfied` touches what the mutex guards, so it says that it needs it:
+///
+///     _changed.wait(_mutex, [this]() REQUIRES(_mutex) { return _done; });
+///
+/// Notifying needs no mutex; every waiter of one condition uses the same one.
+class Condition {
+ public:
+  void notifyOne() { _changed.notify_one(); }
+  void notifyAll() { _changed.notify_all(); }
+
+  template <class Satisfied>
+  void wait(Mutex& mutex, Satisfied&& satisfied) REQUIRES(mutex) {
+    Waiting waiting(mutex);
+    _changed.wait(waiting.lock, satisfied);
+  }
+
+  /// As the clock waits: answers what `satisfied` last said.
+  bool waitUntil(Mutex& mutex, Clock& clock, Clock::Instant deadline, const std::function<bool()>& satisfied)
+      REQUIRES(mutex) {
+    Waiting waiting(mutex);
+    return clock.waitUntil(waiting.lock, _changed, deadline, satisfied);
+  }
+
+  /// Until somebody notifies, the time on the machine's own clock is over, or for no reason at all.
+  void waitFor(Mutex& mutex, std::chrono::nanoseconds time) REQUIRES(mutex) {
+    Waiting waiting(mutex);
+    _changed.wait_for(waiting.lock, time);
+  }
+
+ private:
+  /// The mutex, which its holder keeps, in the shape in which the library waits with it.
+  struct Waiting {
+    explicit Waiting(Mutex& mutex) : lock(mutex._mutex, std::adopt_lock) {}
+    ~Waiting() { lock.release(); }
+    Waiting(const Waiting&) = delete;
+    Waiting& operator=(const Waiting&) = delete;
+
+    std::unique_lock<std::mutex> lock;
+  };
+
+  std::condition_variable _changed;
+};
+
+}  // namespace platform

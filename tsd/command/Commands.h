@@ -1,0 +1,114 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "device/LocalDevice.h"
+#include "tsd/ExitCode.h"
+#include "tsd/OptionTable.h"
+#include "tsd/daemon/CommandContext.h"
+#include "tsd/sample/SampleHost.h"
+#include "tsd/sync/SyncOptions.h"
+
+namespace tsd {
+
+ExitCode runSample(const CommandContext& context, const SampleOptions& options);
+
+struct DeviceOnlyOptions {
+  std::string device;
+};
+ExitCode runInit(const CommandContext& context, const DeviceOnlyOptions& options);
+ExitCode runRuns(const CommandContext& context, const DeviceOnlyOptions& options);
+ExitCode runStatus(const CommandContext& context, const DeviceOnlyOptions& options);
+ExitCode runBackup(const CommandContext& context, const DeviceOnlyOptions& options);
+ExitCode runClear(const CommandContext& context, const DeviceOnlyOptions& options);
+
+ExitCode runSync(const CommandContext& context, const SyncOptions& options);
+
+struct PlanOptions {
+  std::string device;
+  std::string host;
+};
+ExitCode runPlan(const CommandContext& context, const PlanOptions& options);
+
+struct WhyOptions {
+  std::string device;
+  std::string app;        // its identifier, name, or a part that is its alone
+  std::uint64_t run = 0;  // the number of the run to tell of; 0: the last that says something of the app
+  bool all = false;       // all that do
+};
+ExitCode runWhy(const CommandContext& context, const WhyOptions& options);
+
+struct RestoreOptions {
+  std::string device;
+  std::string host;
+  std::int32_t type = 2;
+  bool inDaemon = false;
+};
+ExitCode runRestore(const CommandContext& context, const RestoreOptions& options);
+
+struct HomeOptions {
+  std::string device;
+  std::string file;  // of the picture; "-" for standard output, empty for one of text
+  bool dark = false;
+};
+ExitCode runHome(const CommandContext& context, const HomeOptions& options);
+
+struct ReportOptions {
+  std::string device;
+  std::uint64_t run = 0;  // its number; 0: the last sync or restore
+  std::string file;       // of the page; "-" for standard output
+  std::string version;    // of the program
+};
+ExitCode runReport(const CommandContext& context, const ReportOptions& options);
+
+struct WatchOptions {
+  std::string device;
+  bool untilIdle = false;
+};
+ExitCode runWatch(const CommandContext& context, const WatchOptions& options);
+
+struct QueryOptions {
+  std::string device;
+  std::string question;  // "metrics", "accounts", "vantor-ids" or "disabled-asset-types"
+};
+ExitCode runQuery(const CommandContext& context, const QueryOptions& options);
+
+struct SetOptions {
+  std::string device;
+  std::vector<std::string> settings;  // KEY=VALUE; none: they are only shown
+};
+ExitCode runSet(const CommandContext& context, const SetOptions& options);
+
+struct UninstallOptions {
+  std::string device;
+  std::string app;
+};
+ExitCode runUninstall(const CommandContext& context, const UninstallOptions& options);
+
+struct StoreOptions {
+  std::string device;
+  std::string app;
+  bool finish = false;
+  std::string package;  // of --finish; empty: the store has one of its own
+  device::StoreInstall install;
+};
+ExitCode runStore(const CommandContext& context, const StoreOptions& options);
+
+struct CompletionOptions {
+  std::string shell;  // "bash", "zsh" or "fish"
+};
+ExitCode runCompletion(const CommandContext& context, const OptionTable& table, const CompletionOptions& options);
+
+struct PointsOptions {};
+ExitCode runPoints(const CommandContext& context, const OptionTable& table, const PointsOptions& options);
+
+struct ManualOptions {
+  std::string folder;
+};
+ExitCode runManual(const CommandContext& context, const OptionTable& table, const ManualOptions& options);
+
+}  // namespace tsd

@@ -1,0 +1,22 @@
+#include "tsd/CommandError.h"
+#include "tsd/command/Commands.h"
+#include "tsd/daemon/DeviceLock.h"
+#include "tsd/terminal/Output.h"
+
+namespace tsd {
+
+ExitCode runInit(const CommandContext& context, const DeviceOnlyOptions& options) {
+  platform::ErrorRef error;
+  if (!device::createDevice(options.device, &error)) throw CommandError(textOf(error));
+  const DeviceLock made(options.device);  // leaves its file, so that whoever only looks at the device can lock it
+  if (context.options.json) {
+    auto document = startDocument(context.options.command);
+    document.dictionary()->set("result", "done");
+    writeDocument(document);
+  } else {
+    writeOutput(options.device + ": an empty device\n");
+  }
+  return ExitCode::done;
+}
+
+}  // namespace tsd

@@ -1,0 +1,62 @@
+#include <algorithm>
+#include <filesystem>
+
+#include "tsd/CommandError.h"
+#include "tsd/command/Commands.h"
+#include "tsd/conduit/WholeFile.h"
+#include "tsd/daemon/DeviceView.h"
+#include "tsd/history/RunHistory.h"
+#include "tsd/report/ReportDocument.h"
+#include "tsd/report/ReportPage.h"
+#include "tsd/terminal/Output.h"
+
+namespace tsd {
+namespace {
+
+/// The run of that number, or the last that was a sync or a restore, or else the last.
+RunSummary chosenRun(const std::string& device, const std::vector<RunSummary>& runs, std::uint64_t number) {
+  if (runs.empty()) throw CommandError(device + ": the device has no kept run to report on");
+  auto fits = [&](const RunSummary& run) {
+    return number ? run.number == number : run.command == "sync" || run.command == "restore";
+  };
+  auto found = std::find_if(runs.rbegin(), runs.rend(), fits);
+  if (found != runs.rend()) return *found;
+  if (!number) return runs.back();
+  throw CommandError(device + ": there is no run " + std::to_string(number) + ", those that are kept are " +
+                     std::to_string(runs.front().number) + " to " + std::to_string(runs.back().number));
+}
+
+}  // namespace
+
+ExitCode runReport(const CommandContext& context, const ReportOptions& options) {
+  DeviceView view(context, options.device);
+  auto runs = keptRuns(options.device + "/runs");
+  ReportSubject subject;
+  subject.run = chosenRun(options.device, runs, options.run);
+  subject.isLast = subject.run.number == runs.back().number;
+  subject.isRunning = view.holder().has_value();
+  subject.now = view.status();
+  subject.version = options.version;
+  std::error_code problem;
+  subject.deviceName = std::filesystem::weakly_canonical(options.device, problem).filename().string();
+  if (subject.deviceName.empty()) subject.deviceName = options.device;
+  std::string page = reportPage(reportDocument(subject, view.device()));
+  if (options.file == "-") {
+    writeOutput(page);
+    return ExitCode::done;
+  }
+  writeWholeFile(options.file, page);
+  if (context.options.json) {
+    auto document = startDocument(context.options.command);
+    document.dictionary()->set("result", "done");
+    document.dictionary()->set("file", options.file);
+    document.dictionary()->set("run", subject.run.number);
+    writeDocument(document);
+  } else {
+    writeOutput(printable(options.file) + ": run " + std::to_string(subject.run.number) + ", " +
+                printable(subject.run.command) + ".\n");
+  }
+  return ExitCode::done;
+}
+
+}  // namespace tsd

@@ -1,0 +1,85 @@
+#include "device/records/Settings.h"
+#include "tsd/CommandError.h"
+#include "tsd/command/Commands.h"
+#include "tsd/daemon/DeviceSession.h"
+#include "tsd/daemon/DeviceView.h"
+#include "tsd/terminal/Output.h"
+#include "tsd/terminal/Suggestion.h"
+
+namespace tsd {
+namespace {
+
+struct Setting {
+  std::string key;
+  std::string value;
+};
+
+std::vector<Setting> parse(const std::vector<std::string>& texts) {
+  std::vector<Setting> settings;
+  for (const auto& text : texts) {
+    std::size_t equals = text.find('=');
+    if (equals == 0 || equals == std::string::npos) {
+      throw CommandError(ExitCode::usage, "'" + text + "': KEY=VALUE is expected");
+    }
+    settings.push_back({text.substr(0, equals), text.substr(equals + 1)});
+  }
+  return settings;
+}
+
+const std::vector<std::string> keys{"app-installation",     "app-removal",  "icon-size",
+                                    "backup-placeholders",  "backup-error", "device-service-prioritize",
+                                    "device-service-cancel"};
+
+void apply(device::LocalDevice& device, const std::vector<Setting>& settings) {
+  for (const auto& setting : settings) {
+    platform::ErrorRef error;
+    if (device.set(setting.key, setting.value, &error)) continue;
+    bool unknown = error && error->code() == static_cast<std::int64_t>(device::LocalDeviceError::unknownSetting);
+    throw CommandError(unknown ? ExitCode::usage : ExitCode::failed,
+                       textOf(error) + (unknown ? didYouMean(setting.key, keys) : ""));
+  }
+}
+
+/// Throws when a setting is not known, so that the device gets all of them or none.
+void rehearse(const std::vector<Setting>& settings) {
+  auto device = device::makeMemoryDevice(device::makeManualEventQueue(), {});
+  tsd::apply(*device, settings);
+  device->events().drain();
+  device->events().stop();
+}
+
+ExitCode show(const CommandContext& context, device::LocalDevice& device, const std::vector<std::string>& keys) {
+  auto values = platform::Value::makeDictionary();
+  std::string text;
+  for (const auto& key : keys) {
+    values.dictionary()->set(key, device.setting(key));
+    text += key + "=" + device.setting(key) + "\n";
+  }
+  if (!context.options.json) {
+    writeOutput(text);
+    return ExitCode::done;
+  }
+  auto document = startDocument(context.options.command);
+  document.dictionary()->set("result", "done");
+  document.dictionary()->set("settings", values);
+  writeDocument(document);
+  return ExitCode::done;
+}
+
+}  // namespace
+
+ExitCode runSet(const CommandContext& context, const SetOptions& options) {
+  if (options.settings.empty()) {
+    DeviceView view(context, options.device);
+    return show(context, view.device(), device::settingKeys());
+  }
+  auto settings = parse(options.settings);
+  rehearse(settings);
+  DeviceSession session(context, {.folder = options.device});
+  tsd::apply(session.device(), settings);
+  std::vector<std::string> keys;
+  for (const auto& setting : settings) keys.push_back(setting.key);
+  return show(context, session.device(), keys);
+}
+
+}  // namespace tsd

@@ -1,0 +1,82 @@
+#include <cstdlib>
+
+#include "tsd/CommandError.h"
+#include "tsd/command/Commands.h"
+#include "tsd/conduit/FileConduit.h"
+#include "tsd/sync/HostTodo.h"
+#include "tsd/sync/SyncRun.h"
+#include "tsd/terminal/Output.h"
+
+namespace tsd {
+
+using platform::Value;
+
+namespace {
+
+/// The document of the last sync, and with several all of them under "runs".
+Value document(const std::string& command, const std::vector<SyncReport>& reports) {
+  Value document = reports.back().document(command);
+  if (reports.size() == 1) return document;
+  Value runs = Value::makeArray();
+  for (const auto& report : reports) runs.array()->append(report.document(command));
+  document.dictionary()->set("runs", runs);
+  return document;
+}
+
+void show(const CommandContext& context, const std::vector<SyncReport>& reports) {
+  for (const auto& report : reports) {
+    if (!report.message.empty()) context.console.message(report.message);
+  }
+  if (context.options.json) return writeDocument(document(context.options.command, reports));
+  for (std::size_t run = 0; run < reports.size(); ++run) {
+    if (reports.size() > 1) writeOutput("Sync " + std::to_string(run + 1) + "\n");
+    writeOutput(reports[run].text());
+  }
+}
+
+}  // namespace
+
+ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
+  requireHostFolder(options.host);
+  const auto wanted = readHostTodoList(options.host, context.console);
+  StopSignal stop;
+  Progress progress(context.console, context.options.progress);
+  StopSignal::Subscription told(stop, [&] {
+    context.console.message("stopping; a second signal ends at once");
+    progress.headline("Ending the sync in order");
+  });
+  AppWatch watch(progress);
+  Verdicts verdicts;
+  TransferQueue queue({options.host + "/Packages", options.reports, options.transfers}, progress, stop);
+  EarlyEnd earlyEnd(stop);
+  DeviceSession session(context, {.folder = options.device,
+                                  .deviceService = &queue,
+                                  .changed = watch.listener(),
+                                  .use = DeviceUse::kept,
+                                  .earlyEnd = &earlyEnd});
+  session.device().boundary().addJournal(
+      {[&verdicts](const device::CallRecord& record) { verdicts.hear(record); }, device::JournalDetail::brief});
+  StopSignal::Subscription putsOff(stop, [&] { session.device().putOffInstalls(); });
+  Daemon daemon(session.device(), session.loadPlugin(stop), &earlyEnd);
+  TransferQueue::Serving serving(queue, session.device(), daemon);
+  daemon.postStartupNotification();
+
+  std::vector<SyncReport> reports;
+  ExitCode code = ExitCode::done;
+  while (reports.size() < options.repeat) {
+    reports.push_back(SyncRun({context, options, session, daemon, queue, watch, verdicts, progress, stop}).run(wanted));
+    if (code == ExitCode::done) code = reports.back().code;
+    if (reports.back().code == ExitCode::cancelled || reports.back().code == ExitCode::deadline) break;
+  }
+  stop.letFinish();
+  context.kept->conclude(reports.back().apps, reports.back().message);
+  show(context, reports);
+  // A device that has not gone quiet by its deadline cannot be closed in order; the next one to open it tidies up.
+  if (code == ExitCode::deadline) {
+    context.kept->end(code);
+    std::_Exit(static_cast<int>(code));
+  }
+  return code;
+}
+
+}  // namespace tsd

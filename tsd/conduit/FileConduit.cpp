@@ -1,0 +1,174 @@
+#include "tsd/conduit/FileConduit.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <memory>
+
+#include "platform/DevicePaths.h"
+#include "tsd/CommandError.h"
+
+namespace tsd {
+namespace {
+
+constexpr std::size_t chunkSize = std::size_t{256} << 10;
+
+struct CloseDirectory {
+  void operator()(DIR* directory) const { ::closedir(directory); }
+};
+using Directory = std::unique_ptr<DIR, CloseDirectory>;
+
+/// The host is to know at once that a device takes no more; a name that no device takes concerns its file only.
+bool isAboutName(const platform::ErrorRef& error) {
+  return error && (error->code() == EINVAL || error->code() == ENAMETOOLONG || error->code() == EILSEQ);
+}
+
+/// The names in a directory, sorted.
+std::vector<std::string> namesIn(DIR* directory, const std::string& path) {
+  std::vector<std::string> names;
+  errno = 0;
+  while (const dirent* entry = ::readdir(directory)) {
+    if (isFileName(entry->d_name)) names.emplace_back(entry->d_name);
+    errno = 0;
+  }
+  if (errno != 0) throw CommandError(path + ": " + std::strerror(errno));
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+/// Whether the host has a todo list. Throws when it is none that can be read.
+bool hasTodoList(int directory, const std::string& hostFolder) {
+  std::string path = hostFolder + "/" + std::string(platform::todoListName);
+  struct stat facts {};
+  if (::fstatat(directory, std::string(platform::todoListName).c_str(), &facts, AT_SYMLINK_NOFOLLOW) != 0) {
+    if (errno == ENOENT) return false;
+    throw CommandError(path + ": " + std::strerror(errno));
+  }
+  if (!S_ISREG(facts.st_mode)) throw CommandError(path + ": " + sortOfFile(facts.st_mode) + ", no file");
+  platform::ErrorRef error;
+  if (!HostFile::openAt(directory, std::string(platform::todoListName), &error))
+    throw CommandError(path + ": " + textOf(error));
+  return true;
+}
+
+}  // namespace
+
+bool FileConduit::pushStaging(const std::string& hostFolder) {
+  Directory directory(::opendir(hostFolder.c_str()));
+  if (!directory) throw CommandError(hostFolder + ": " + std::strerror(errno));
+  bool hasList = hasTodoList(::dirfd(directory.get()), hostFolder);
+  // What an interrupted session left there is not this session's.
+  if (_files.fileExists(platform::stagingDirectory)) {
+    platform::ErrorRef error;
+    if (!_files.removeItem(platform::stagingDirectory, &error))
+      throw CommandError("the staging directory: " + textOf(error));
+  }
+  if (!hasList) return false;
+  _pushedFiles = 0;
+  _pushedBytes = 0;
+  try {
+    pushDirectory({::dirfd(directory.get()), hostFolder, std::string(platform::stagingDirectory), 0});
+  } catch (...) {
+    _files.removeItem(platform::stagingDirectory);
+    throw;
+  }
+  return true;
+}
+
+void FileConduit::pushDirectory(const Level& level) {
+  platform::ErrorRef error;
+  if (!_files.createDirectory(level.devicePath, true, {}, &error)) {
+    if (level.depth == 0) throw CommandError("the staging directory: " + textOf(error));
+    if (!isAboutName(error)) throw CommandError(level.hostPath + ": " + textOf(error));
+    refuse(level.hostPath, textOf(error));
+    return;
+  }
+  // A second descriptor, as the stream closes its own.
+  int descriptor = ::openat(level.directory, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  Directory directory(descriptor < 0 ? nullptr : ::fdopendir(descriptor));
+  if (!directory) throw CommandError(level.hostPath + ": " + std::strerror(errno));
+  for (const auto& name : namesIn(directory.get(), level.hostPath)) {
+    if (level.depth == 0 && (name == packagesName || name == restoreName)) continue;
+    pushItem(level, name);
+  }
+}
+
+void FileConduit::checkStopped() const {
+  if (_isStopped && _isStopped()) throw CommandError(ExitCode::cancelled, "stopped while the host's files were taken");
+}
+
+void FileConduit::pushItem(const Level& level, const std::string& name) {
+  checkStopped();
+  std::string hostPath = level.hostPath + "/" + name;
+  std::string devicePath = level.devicePath + "/" + name;
+  struct stat facts {};
+  if (::fstatat(level.directory, name.c_str(), &facts, AT_SYMLINK_NOFOLLOW) != 0) {
+    return refuse(hostPath, std::strerror(errno));
+  }
+  if (S_ISDIR(facts.st_mode)) {
+    if (level.depth + 1 > maximumDepth) {
+      return refuse(hostPath, "nested more than " + std::to_string(maximumDepth) + " deep");
+    }
+    int directory = ::openat(level.directory, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+    if (directory < 0) return refuse(hostPath, std::strerror(errno));
+    Directory owner(::fdopendir(directory));
+    return pushDirectory({directory, hostPath, devicePath, level.depth + 1});
+  }
+  if (!S_ISREG(facts.st_mode)) return refuse(hostPath, std::string(sortOfFile(facts.st_mode)) + ", no regular file");
+  platform::ErrorRef error;
+  auto file = HostFile::openAt(level.directory, name, &error);
+  if (!file) return refuse(hostPath, textOf(error));
+  // The rest comes again with the next sync, should power be lost. A torn list would be taken for the host's.
+  bool isTodoList = level.depth == 0 && name == platform::todoListName;
+  if (auto refusal = copy(*file, hostPath, devicePath, isTodoList)) refuse(hostPath, textOf(refusal));
+}
+
+platform::ErrorRef FileConduit::copy(HostFile& file, const std::string& hostPath, std::string_view devicePath,
+                                     bool durable) {
+  if (++_pushedFiles > maximumFiles) {
+    throw CommandError(hostPath + ": more than " + std::to_string(maximumFiles) + " files are not taken");
+  }
+  platform::ErrorRef error;
+  auto writer = _files.createNew(devicePath, false, &error);
+  if (!writer && isAboutName(error)) return error;
+  if (!writer) throw CommandError(hostPath + ": " + textOf(error));
+  while (true) {
+    checkStopped();
+    auto bytes = file.read(chunkSize, &error);
+    if (!bytes) throw CommandError(hostPath + ": " + textOf(error));
+    if (bytes->empty()) break;
+    _pushedBytes += bytes->size();
+    if (_pushedBytes > maximumBytes) {
+      throw CommandError(hostPath + ": more than " + std::to_string(maximumBytes) + " bytes are not taken");
+    }
+    if (!writer->write(*bytes, &error)) throw CommandError(hostPath + ": " + textOf(error));
+  }
+  if (!writer->close(durable, &error)) throw CommandError(hostPath + ": " + textOf(error));
+  return nullptr;
+}
+
+void FileConduit::pushFile(const std::string& hostFile, std::string_view devicePath) {
+  platform::ErrorRef error;
+  auto file = HostFile::open("", hostFile, &error);
+  if (!file) throw CommandError(hostFile + ": " + textOf(error));
+  std::string parent(devicePath.substr(0, devicePath.rfind('/')));
+  if (!_files.createDirectory(parent, true, {}, &error)) throw CommandError(parent + ": " + textOf(error));
+  if (_files.fileExists(devicePath) && !_files.removeItem(devicePath, &error)) {
+    throw CommandError(std::string(devicePath) + ": " + textOf(error));
+  }
+  _pushedFiles = 0;
+  _pushedBytes = 0;
+  if (auto refusal = copy(*file, hostFile, devicePath, true)) throw CommandError(hostFile + ": " + textOf(refusal));
+  if (!_files.syncDirectory(parent, &error)) throw CommandError(parent + ": " + textOf(error));
+}
+
+void FileConduit::refuse(const std::string& hostPath, const std::string& why) {
+  _console.message(hostPath + ": not pushed: " + why);
+}
+
+}  // namespace tsd

@@ -1,0 +1,116 @@
+#include "tsd/daemon/DeviceSession.h"
+
+#include "device/boundary/Journal.h"
+#include "tsd/CommandError.h"
+#include "tsd/history/LogLine.h"
+
+namespace tsd {
+
+DeviceSession::DeviceSession(const CommandContext& context, const Setup& setup) : _context(context) {
+  if (setup.use == DeviceUse::copy)
+    DeviceLock::requireDevice(setup.folder);
+  else
+    _lock.emplace(setup.folder);
+  if (setup.use == DeviceUse::kept && !context.kept)
+    context.kept.emplace(setup.folder, context.options, context.console);
+  if (!context.options.log.empty()) _log.emplace(context.options.log);
+  if (!context.options.calls.empty()) _calls.emplace(context.options.calls);
+  if (!context.options.trace.empty()) _trace.emplace(context.options.trace);
+  platform::ErrorRef error;
+  _device = setup.use == DeviceUse::copy
+                ? device::openDeviceCopy(setup.folder, device::makeManualEventQueue(), deviceOptions(setup), &error)
+                : device::openDevice(setup.folder, device::makeThreadedEventQueue(), deviceOptions(setup), &error);
+  if (!_device) throw CommandError(setup.folder + ": " + textOf(error));
+}
+
+DeviceSession::~DeviceSession() {
+  unloadPlugin();
+  _device->events().stop();
+  for (const auto& rule : _device->boundary().idleRules())
+    _context.console.message("--inject " + rule.text + ": never came to its turn");
+  if (_log && _log->failed()) _context.console.message(_context.options.log + ": not every line could be written");
+  if (_calls && _calls->failed())
+    _context.console.message(_context.options.calls + ": not every line could be written");
+  if (_trace && _trace->failed())
+    _context.console.message(_context.options.trace + ": not every line could be written");
+}
+
+void DeviceSession::unloadPlugin() {
+  _client.reset();
+  _device->events().drain();
+}
+
+void DeviceSession::settle() {
+  _device->events().drain();
+  platform::ErrorRef error;
+  if (!_device->flush(&error)) throw CommandError("not everything could be stored: " + textOf(error));
+  platform::Mutex::Lock lock(_mutex);
+  if (!_complaint.empty()) throw CommandError("not everything could be done: " + _complaint);
+}
+
+void DeviceSession::complain(const std::string& text) {
+  _context.console.message(text);
+  platform::Mutex::Lock lock(_mutex);
+  if (_complaint.empty()) _complaint = text;
+}
+
+device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
+  device::DeviceOptions options;
+  options.mainBundleIdentifier = setup.mainBundleIdentifier;
+  options.deviceService = setup.deviceService;
+  options.changed = setup.changed;
+  options.rules = _context.options.rules;
+  if (setup.earlyEnd) {
+    options.declines = [earlyEnd = setup.earlyEnd](std::string_view service, std::string_view operation) {
+      return earlyEnd->declines(service, operation);
+    };
+  }
+  options.fileFailed = [this](std::string_view operation, std::string_view path, std::string_view reason) {
+    complain(std::string(path) + ": " + std::string(operation) + " failed: " + std::string(reason));
+  };
+  options.recovers = setup.use != DeviceUse::copy || !DeviceLock::holderOf(setup.folder);
+  KeptRun* kept = setup.use == DeviceUse::kept ? &*_context.kept : nullptr;
+  if (_log || kept) {
+    options.log = [this, kept](const device::LogRecord& record) {
+      if (_log) _log->write(logLine(record));
+      if (kept) kept->hear(record);
+    };
+  }
+  if (kept) {
+    options.journals.push_back(
+        {[kept](const device::CallRecord& record) { kept->hear(record); }, device::JournalDetail::brief});
+  }
+  if (_calls) {
+    options.journals.push_back(
+        {[this](const device::CallRecord& record) { _calls->write(device::journalLine(record)); }});
+  }
+  if (_trace) {
+    options.journals.push_back(
+        {[this](const device::CallRecord& record) { _trace->hear(record); }, device::JournalDetail::brief});
+  }
+  return options;
+}
+
+platform::TSClient& DeviceSession::loadPlugin() { return makeClient(_device->platform()); }
+
+platform::TSClient& DeviceSession::loadPlugin(const StopSignal& stop, CountdownClock::Tick tick) {
+  const auto& services = _device->platform();
+  _clock.emplace(services.clock, stop, std::move(tick));
+  _platform.emplace(platform::Platform{
+      services.process, *_clock, services.fileSystem, services.propertyLists, services.systemLog, services.support,
+      services.deviceService, services.installCoordination, services.workspace, services.installer, services.backup,
+      services.restrictions, services.homeScreen, services.iconRenderer, services.imageEncoder, services.transactionLog,
+      services.notifications});
+  return makeClient(*_platform);
+}
+
+platform::TSClient& DeviceSession::makeClient(const platform::Platform& platform) {
+  if (!_loader) {
+    const std::string& chosen = _context.options.plugin;
+    _loader.emplace(chosen.empty() ? PluginLoader::defaultFile() : chosen);
+  }
+  _client = _loader->create(platform);
+  return *_client;
+}
+
+}  // namespace tsd

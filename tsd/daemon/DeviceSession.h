@@ -1,0 +1,83 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "device/LocalDevice.h"
+#include "platform/DeviceNames.h"
+#include "platform/Mutex.h"
+#include "platform/Platform.h"
+#include "platform/TSClient.h"
+#include "tsd/daemon/CommandContext.h"
+#include "tsd/daemon/DeviceLock.h"
+#include "tsd/daemon/PluginLoader.h"
+#include "tsd/history/LineFile.h"
+#include "tsd/history/TraceFile.h"
+#include "tsd/stopping/CountdownClock.h"
+#include "tsd/stopping/EarlyEnd.h"
+
+namespace tsd {
+
+/// What a command does with a device: uses it; uses it in a run that the device keeps; or uses a copy of it in memory,
+/// whose events run on the caller's thread when it waits, and whose waits take no time. The copy is of what the store
+/// holds now, whoever is using the device, who is not disturbed; of one that nobody uses it is what the next to open it
+/// will find.
+enum class DeviceUse : std::uint8_t { plain, kept, copy };
+
+/// A device folder in use by this process: locked unless it is a copy, opened, with the log and the journal that the
+/// common options ask for, and on demand with a plug-in object on it. On the way out the plug-in goes first, then
+/// everything that was posted runs, then the device closes.
+class DeviceSession {
+ public:
+  struct Setup {
+    std::string folder;
+    std::string mainBundleIdentifier{platform::daemonBundleIdentifier};
+    platform::TSDeviceService* deviceService = nullptr;
+    std::function<void(const device::AppStatus&)> changed{};
+    DeviceUse use = DeviceUse::plain;
+    const EarlyEnd* earlyEnd = nullptr;  // what the device declines for; outlives the session
+  };
+
+  /// Throws a `CommandError` when any of it fails.
+  DeviceSession(const CommandContext& context, const Setup& setup);
+  ~DeviceSession();
+  DeviceSession(const DeviceSession&) = delete;
+  DeviceSession& operator=(const DeviceSession&) = delete;
+
+  device::LocalDevice& device() { return *_device; }
+  device::FileTree& files() { return _device->files(); }
+
+  /// Loads the plug-in and makes its object. At most once.
+  platform::TSClient& loadPlugin();
+  /// The same; the plug-in's waits end when a stop is wanted, and `tick` tells of them (see `CountdownClock`).
+  platform::TSClient& loadPlugin(const StopSignal& stop, CountdownClock::Tick tick = nullptr);
+  /// Lets the plug-in's object go, and everything run that was posted for it.
+  void unloadPlugin();
+  /// Everything that was posted runs, and what the device has in memory only is stored. Throws a `CommandError` when
+  /// the store refuses, or a file operation has failed, which the plug-in may have passed over in silence.
+  void settle();
+
+ private:
+  platform::TSClient& makeClient(const platform::Platform& platform);
+  device::DeviceOptions deviceOptions(const Setup& setup);
+  /// From any thread.
+  void complain(const std::string& text);
+
+  const CommandContext& _context;
+  std::optional<PluginLoader> _loader;
+  std::optional<DeviceLock> _lock;  // none of a copy
+  std::optional<LineFile> _log;
+  std::optional<LineFile> _calls;
+  std::optional<TraceFile> _trace;
+  platform::Mutex _mutex;
+  std::string _complaint GUARDED_BY(_mutex);  // the first one. Outlives the device, which may have one as it goes
+  std::unique_ptr<device::LocalDevice> _device;
+  std::optional<CountdownClock> _clock;
+  std::optional<platform::Platform> _platform;  // the device's with that clock
+  std::shared_ptr<platform::TSClient> _client;
+};
+
+}  // namespace tsd

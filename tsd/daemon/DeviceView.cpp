@@ -1,0 +1,39 @@
+#include "tsd/daemon/DeviceView.h"
+
+#include "tsd/terminal/Output.h"
+
+namespace tsd {
+
+namespace {
+
+RunProgress progressOf(const std::string& device) {
+  RunProgress progress(device);
+  progress.refresh();
+  return progress;
+}
+
+}  // namespace
+
+DeviceView::DeviceView(const CommandContext& context, const std::string& folder)
+    : DeviceView(context, folder, progressOf(folder)) {}
+
+DeviceView::DeviceView(const CommandContext& context, const std::string& folder, const RunProgress& progress)
+    : _holder(DeviceLock::holderOf(folder)),
+      _session(context, {.folder = folder, .use = DeviceUse::copy}),
+      _status(_session.device().status()) {
+  progress.addTo(_status);
+}
+
+std::string DeviceView::holderText() const {
+  return _holder ? wrappedLine("", "Process " + _holder->process + " is at work on it: " + _holder->command + ".") : "";
+}
+
+void DeviceView::addHolder(platform::Value& document) const {
+  if (!_holder) return;
+  platform::Value busy = platform::Value::makeDictionary();
+  busy.dictionary()->set("process", _holder->process);
+  busy.dictionary()->set("command", _holder->command);
+  document.dictionary()->set("busy", busy);
+}
+
+}  // namespace tsd

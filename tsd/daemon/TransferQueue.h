@@ -1,0 +1,115 @@
+#pragma once
+
+#include <cstdint>
+#include <deque>
+#include <functional>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "device/LocalDevice.h"
+#include "platform/Clock.h"
+#include "platform/Condition.h"
+#include "platform/Mutex.h"
+#include "platform/StringSet.h"
+#include "platform/TSDeviceService.h"
+#include "tsd/daemon/AssetReport.h"
+#include "tsd/daemon/PackageTransfer.h"
+
+namespace tsd {
+
+/// The daemon's transfers of packages, several in flight, each on a thread of its own ("transfer-1", …), and the
+/// service through which the plug-in asks for one to come first or to end.
+///
+/// Made before the device, as the device hands the plug-in's requests to it; serves it as long as a `Serving` lives.
+/// From the daemon's thread, but for what the plug-in asks, which comes from any.
+class TransferQueue : public platform::TSDeviceService {
+ public:
+  using End = PackageTransfer::End;
+  using Result = PackageTransfer::Result;
+  struct Setup {
+    std::string packagesFolder;  // on the host
+    AssetReports reports;
+    std::size_t inFlight = 1;
+  };
+
+  /// Starts its threads, so that none can be missing once something has begun. Throws a `CommandError` when the system
+  /// has no thread left.
+  TransferQueue(Setup setup, Progress& progress, const StopSignal& stop);
+  ~TransferQueue() override;
+  TransferQueue(const TransferQueue&) = delete;
+  TransferQueue& operator=(const TransferQueue&) = delete;
+
+  /// The device whose packages the queue carries, and the daemon that is told of them. On the way out nothing more is
+  /// taken, and what is in flight ends.
+  class Serving {
+   public:
+    Serving(TransferQueue& queue, device::LocalDevice& device, Daemon& daemon);
+    ~Serving();
+    Serving(const Serving&) = delete;
+    Serving& operator=(const Serving&) = delete;
+
+   private:
+    TransferQueue& _queue;
+  };
+
+  /// A sync begins, and what the last one transferred is forgotten: until `start`, requests are about transfers that
+  /// are still to come.
+  void expect();
+  /// Transfers the assets in this order, but for those that were asked for first meanwhile. Throws a `CommandError`
+  /// when there is no place for packages; nothing has been transferred then.
+  void start(const std::vector<platform::TSAssetRef>& assets);
+  /// True when the last transfer has ended, false when the deadline came first.
+  bool waitUntil(platform::Clock::Instant deadline);
+  /// Takes none any more and waits for those in flight. Who asked for one that never came is told.
+  void finish();
+
+  Result result(const std::string& identifier) const;
+  const AssetReport& report(const std::string& identifier) const;
+
+  bool respondsToPrioritizeAsset() const override { return true; }
+  void prioritizeAsset(const platform::TSAssetRef& asset, std::function<void(platform::ErrorRef)> completion) override;
+  bool respondsToCancelAssetTransferForFailedAsset() const override { return true; }
+  void cancelAssetTransferForFailedAsset(const platform::TSAssetRef& asset) override;
+
+ private:
+  using TransferRef = std::shared_ptr<PackageTransfer>;
+  using Completion = std::function<void(platform::ErrorRef)>;
+  /// That a transfer which is still to come goes first.
+  struct Wish {
+    std::string identifier;
+    Completion completion;
+  };
+
+  void work(std::size_t number);
+  void endThreads();
+  TransferRef takeNext();
+  /// False when there is no such transfer, or it is over; one in flight is first already.
+  bool moveToFront(const std::string& identifier) REQUIRES(_mutex);
+  void answer(const Wish& wish, bool outstanding, device::LocalDevice& device) const;
+
+  const Setup _setup;
+  Progress& _progress;
+  const StopSignal& _stop;
+
+  mutable platform::Mutex _mutex;
+  platform::Condition _changed;
+  device::LocalDevice* _device GUARDED_BY(_mutex) = nullptr;  // while it is served
+  Daemon* _daemon GUARDED_BY(_mutex) = nullptr;               // the same
+  bool _expects GUARDED_BY(_mutex) = false;                   // from `expect` to `start`
+  std::vector<Wish> _wishes GUARDED_BY(_mutex);               // in the order in which they came
+  platform::StringSet _unwanted GUARDED_BY(_mutex);           // cancelled before they came
+  std::deque<TransferRef> _waiting GUARDED_BY(_mutex);
+  std::map<std::string, TransferRef, std::less<>> _transfers GUARDED_BY(_mutex);
+  std::map<std::string, Result, std::less<>> _results GUARDED_BY(_mutex);
+  std::size_t _working GUARDED_BY(_mutex) = 0;  // threads that have not run out of transfers
+  std::size_t _taking GUARDED_BY(_mutex) = 0;   // threads that take part
+  std::uint64_t _round GUARDED_BY(_mutex) = 0;  // grows with every start
+  bool _over GUARDED_BY(_mutex) = false;        // the threads end
+  std::vector<std::thread> _threads;
+};
+
+}  // namespace tsd

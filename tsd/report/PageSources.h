@@ -1,0 +1,12 @@
+#pragma once
+
+#include <string_view>
+
+namespace tsd {
+
+/// The files of `tsd/report/page/`, which the build puts into the program.
+extern const std::string_view reportMarkup;
+extern const std::string_view reportStyle;
+extern const std::string_view reportScript;
+
+}  // namespace tsd

@@ -1,0 +1,35 @@
+#pragma once
+
+#include <atomic>
+#include <functional>
+
+#include "platform/Clock.h"
+#include "tsd/stopping/StopSignal.h"
+
+namespace tsd {
+
+/// The device's clock for the plug-in's waits: it tells how long a wait can still take, and when a stop is wanted it
+/// runs ahead to the deadline, so that whoever waits goes on as after a wait in vain.
+class CountdownClock : public platform::Clock {
+ public:
+  /// Told on the waiting thread, once a second while somebody waits, with the whole seconds that are left. May be null.
+  using Tick = std::function<void(long long secondsLeft)>;
+
+  /// The clock and the signal outlive it.
+  CountdownClock(platform::Clock& clock, const StopSignal& stop, Tick tick)
+      : _clock(clock), _stop(stop), _tick(std::move(tick)) {}
+
+  Instant now() override;
+  bool waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
+                 const std::function<bool()>& satisfied) override;
+
+ private:
+  void runAheadTo(Instant instant);
+
+  platform::Clock& _clock;
+  const StopSignal& _stop;
+  const Tick _tick;
+  std::atomic<Instant> _reached{Instant::min()};  // it never is before this
+};
+
+}  // namespace tsd

@@ -1,0 +1,20 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "tsd/daemon/Daemon.h"
+
+namespace tsd {
+
+/// What came of the first calls of a sync, up to the reconciliation.
+struct SyncOpening {
+  std::vector<std::string> deleted;  // what the host is told was removed on the device
+  std::string problem;               // why the plug-in refused a step; empty: it did not
+};
+
+/// Asks the plug-in whether it serves apps, prepares the sync, asks what was deleted, and has the host's files taken
+/// over.
+SyncOpening openSync(Daemon& daemon);
+
+}  // namespace tsd

@@ -1,0 +1,78 @@
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <map>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "tsd/ExitCode.h"
+#include "tsd/daemon/AppWatch.h"
+#include "tsd/daemon/CommandContext.h"
+#include "tsd/daemon/Daemon.h"
+#include "tsd/daemon/DeviceSession.h"
+#include "tsd/daemon/TransferQueue.h"
+#include "tsd/history/Verdicts.h"
+#include "tsd/stopping/StopSignal.h"
+#include "tsd/sync/SyncOptions.h"
+#include "tsd/sync/SyncReport.h"
+#include "tsd/terminal/Progress.h"
+
+namespace tsd {
+
+/// Everything that takes part in a sync. The parts outlive the run.
+struct SyncParts {
+  const CommandContext& context;
+  const SyncOptions& options;
+  DeviceSession& session;
+  Daemon& daemon;
+  TransferQueue& queue;
+  AppWatch& watch;
+  Verdicts& verdicts;
+  Progress& progress;
+  StopSignal& stop;
+};
+
+/// One sync from the host's files to its report, on the daemon's thread. Run once.
+class SyncRun {
+ public:
+  explicit SyncRun(const SyncParts& parts) : _parts(parts) {}
+
+  /// `wanted` is the host's todo list.
+  SyncReport run(const std::vector<TodoEntry>& wanted);
+
+ private:
+  bool pushHost();
+  void sync();
+  bool begin();
+  void requestPackages();
+  void recordPackagePaths();
+  void transferPackages();
+  bool transferPhaseSucceeded() const;
+  void awaitOutcomes();
+  void sendInstallReports();
+  void removeLeftPackages();
+  void fillReport();
+
+  /// Reads the todo list again when anything changed since, and tells the display of outcomes that are new.
+  void showOutcomes(bool always);
+  std::string whyBroken() const;
+  ExitCode code() const;
+  std::set<std::string> appsOnDevice() const;
+
+  const SyncParts _parts;
+  SyncReport _report;
+  std::chrono::steady_clock::time_point _began;
+  std::set<std::string> _before;   // apps on the device
+  std::vector<TodoEntry> _wanted;  // the todo list as the host gave it
+  std::vector<platform::TSAssetRef> _assets;
+  std::map<std::string, std::string> _reportedReasons;  // of installs that the daemon reported as failed
+  std::vector<TodoEntry> _todo;                         // as it was read last
+  std::uint64_t _changesRead = 0;                       // of the watch, when the list was read last
+  bool _isTaken = false;  // the host's list is on the device; what lies there before is an earlier sync's
+  bool _deadlinePassed = false;
+  bool _phase = false;  // what the transfer phase is said to have ended with
+};
+
+}  // namespace tsd

@@ -1,0 +1,49 @@
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/Mutex.h"
+#include "tsd/terminal/TerminalText.h"
+
+namespace tsd {
+
+/// Standard error: messages above, and below them, on a terminal, a few lines that are redrawn in place.
+/// From any thread; never fails.
+class Console {
+ public:
+  Console() = default;
+  Console(const Console&) = delete;
+  Console& operator=(const Console&) = delete;
+
+  /// One line, whole.
+  void line(std::string_view text);
+  /// "tsd: " and the text, one line.
+  void message(std::string_view text);
+  /// Replaces the lines that are redrawn in place; none takes them away. A line that is too wide for the terminal is
+  /// cut by it; that the terminal has become narrower since the last time is allowed for.
+  void setRegion(std::vector<TerminalLine> lines);
+
+  struct Size {
+    std::size_t rows;
+    std::size_t columns;
+  };
+  static bool isTerminal();
+  /// Whether the person wants colours on a terminal.
+  static bool wantsColours();
+  static Size size();
+
+ private:
+  std::string toRegionsBegin() const REQUIRES(_mutex);
+  std::string drawRegion() const REQUIRES(_mutex);
+
+  platform::Mutex _mutex;
+  std::vector<TerminalLine> _region GUARDED_BY(_mutex);
+};
+
+/// Writes to standard output; throws a `CommandError` when that fails.
+void writeOutput(std::string_view text);
+
+}  // namespace tsd

@@ -1,0 +1,61 @@
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/Value.h"
+#include "tsd/CommonOptions.h"
+#include "tsd/ExitCode.h"
+
+namespace tsd {
+
+/// The beginning of a command's JSON document: its schema number and, unless empty, the command's name.
+platform::Value startDocument(std::string_view command);
+/// Writes the document to standard output.
+void writeDocument(const platform::Value& document);
+/// The document of a command that could not go on.
+void writeFailure(const CommonOptions& options, ExitCode code, std::string_view message);
+
+/// What a document says the result was: "done", "partial" (some apps failed, or a deadline passed), "failed" or
+/// "cancelled".
+const char* nameOfResult(ExitCode code);
+/// The same for people: "done", "not complete", "failed" or "cancelled".
+std::string wordsOfEnd(ExitCode code);
+
+/// An array of strings.
+platform::Value arrayOf(const std::vector<std::string>& texts);
+
+/// An error's one-line description without its domain and code, where words follow them; the plug-in's own codes, which
+/// have none, in words.
+std::string reasonForPeople(std::string_view description);
+
+/// The front and the text on a line no wider than the terminal that standard output is (80 columns where it is none),
+/// and, indented by the front's width as far as that leaves room, as many more as the text needs. The front is
+/// printable.
+std::string wrappedLine(const std::string& front, std::string_view text);
+/// The same, but in one line where standard output is no terminal, for whoever searches in it; further lines are
+/// indented a little.
+std::string noteLine(const std::string& front, std::string_view text);
+
+/// A table for people: columns as wide as their content, the whole no wider than a line (see `wrappedLine`) as long as
+/// the columns that may be shortened allow it.
+class Table {
+ public:
+  struct Column {
+    std::string title;
+    std::size_t least = 0;  // may be shortened to this width; 0: never
+  };
+  explicit Table(std::vector<Column> columns) : _columns(std::move(columns)) {}
+  void add(std::vector<std::string> cells) { _rows.push_back(std::move(cells)); }
+  bool empty() const { return _rows.empty(); }
+  std::string text() const;
+
+ private:
+  std::vector<std::size_t> widths() const;
+
+  std::vector<Column> _columns;
+  std::vector<std::vector<std::string>> _rows;
+};
+
+}  // namespace tsd
