@@ -143,7 +143,7 @@ Decision Rehearsal::removal(const std::string& id) const {
     return Decision{id, "", "", wordsOf(outcome), outcome, 0, rule, fact};
   };
   if (!_before.count(id)) return be(Outcome::absent, "it is not on the device");
-  const auto verdict = _verdicts.of(id).last;
+  const auto verdict = _verdicts.of(id).removal;
   if (verdict && verdict->kind == AppEvent::Kind::removed) return be(Outcome::removed, "the host wants it removed");
   if (verdict && verdict->kind == AppEvent::Kind::removalFailed)
     return be(Outcome::failed, verdict->text, verdict->fact);
@@ -153,7 +153,7 @@ Decision Rehearsal::removal(const std::string& id) const {
 
 Decision Rehearsal::other(const std::string& id, const TodoEntry* entry) const {
   Decision decision{id, "", "", "", Outcome::notRequested};
-  const auto verdict = _verdicts.of(id).last;
+  const auto verdict = _verdicts.of(id).ofInstall();
   auto settled = verdict ? outcomeOf(verdict->kind) : std::nullopt;
   auto before = _before.find(id);
   auto wish = _wishes.find(id);
@@ -165,7 +165,7 @@ Decision Rehearsal::other(const std::string& id, const TodoEntry* entry) const {
                                                            : "nothing is to be done for its entry of the todo list";
     if (decision.outcome == Outcome::unchanged)
       decision.fact = entry->operation.empty() ? "no operation" : entry->operation;
-  } else if (settled && *settled != Outcome::removed) {
+  } else if (settled) {
     decision.outcome = *settled;
     decision.rule = verdict->text;
     decision.fact = verdict->fact;

@@ -101,6 +101,10 @@ void Verdicts::take(const AppEvent& event) {
     case Kind::cancelled:
       _endings.push_back({event.app, Outcome::cancelled, event.line()});
       break;
+    case Kind::removed:
+    case Kind::removalFailed:
+      if (!_declined.count(event.app)) _verdicts[event.app].removal = event;
+      break;
     default:
       // What the plug-in takes for a failure there is that its turn never came.
       if (_declined.count(event.app)) break;

@@ -18,12 +18,18 @@ namespace tsd {
 class Verdicts {
  public:
   struct Verdict {
-    std::optional<AppEvent> last;       // that settles it
+    std::optional<AppEvent> last;       // that settles its install
+    std::optional<AppEvent> removal;    // how its removal ended, which may be told before or after the former
     std::optional<AppEvent> exception;  // the rule that it passed though it might have been stopped
     std::optional<AppEvent> pathRefused;
     std::optional<AppEvent> markFailed;
     bool updates = false;
     bool isAwaited = false;  // by a restore, still
+
+    /// Why it is not installed. That it was removed first is no answer to that.
+    const std::optional<AppEvent>& ofInstall() const {
+      return !last && removal && removal->kind == AppEvent::Kind::removalFailed ? removal : last;
+    }
   };
   struct Ending {
     std::string app;

@@ -60,7 +60,7 @@ SyncOutcomes::Told SyncOutcomes::toldOfMarked(const std::string& id, const std::
     if (app && app->isOnDevice() && app->state != device::AppState::placeholder) return {Outcome::installed, ""};
     return {Outcome::failed, "it was installed, and is not on the device any more"};
   }
-  auto verdict = _facts.verdicts.of(id).last;
+  auto verdict = _facts.verdicts.of(id).ofInstall();
   if (!_requested.count(id)) {
     return {Outcome::failed,
             verdict && outcomeOf(verdict->kind) ? verdict->line() : "its install could not be prepared"};
@@ -74,10 +74,9 @@ SyncOutcomes::Told SyncOutcomes::toldOfMarked(const std::string& id, const std::
 }
 
 SyncOutcomes::Told SyncOutcomes::toldOfUnrequested(const std::string& id) const {
-  auto verdict = _facts.verdicts.of(id).last;
+  auto verdict = _facts.verdicts.of(id).ofInstall();
   auto outcome = verdict ? outcomeOf(verdict->kind) : std::nullopt;
-  // That it was removed first is no answer to the wish that it be installed.
-  if (outcome && *outcome != Outcome::removed) return {*outcome, verdict->line()};
+  if (outcome) return {*outcome, verdict->line()};
   if (!_facts.broken.empty()) return {Outcome::notReached, _facts.broken};
   if (!isFileName(id)) return {Outcome::refused, "this cannot be an app's identifier"};
   auto open = _openInstalls.find(id);
@@ -125,7 +124,7 @@ SyncOutcomes::Told SyncOutcomes::toldOfRemoval(const std::string& id) const {
     if (wasThere) return {Outcome::removed, ""};
     return {Outcome::absent, "it is not on the device"};
   }
-  auto verdict = _facts.verdicts.of(id).last;
+  auto verdict = _facts.verdicts.of(id).removal;
   if (verdict && verdict->kind == AppEvent::Kind::removalFailed) return {Outcome::failed, verdict->line()};
   std::string restricted = _facts.verdicts.removalsRestricted();
   if (!restricted.empty()) return {Outcome::notAllowed, restricted};
