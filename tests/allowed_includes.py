@@ -31,7 +31,7 @@ ROOMS = {
     "tsd": {
         "may": ["platform/", "plist/", "device/"],
         "headers": ["CommandError.h", "CommonOptions.h", "ExitCode.h", "OptionTable.h", "StartThread.h"],
-        "rooms": ["terminal", "conduit", "picture", "sample", "help", "history", "report", "stopping",
+        "rooms": ["terminal", "conduit", "host", "picture", "sample", "help", "history", "report", "stopping",
                   "daemon", "sync", "command"],
     },
 }

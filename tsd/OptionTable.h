@@ -19,7 +19,7 @@ struct OptionEntry {
   bool isCommon = false;  // one that the subcommands share
 
   /// Whether the value names something in the file system; which, its name tells.
-  bool takesFile() const { return value == "FILE"; }
+  bool takesFile() const { return value == "FILE" || value == "SOURCE"; }
   /// Whether it names an app of the device before it, or is a rule of injection.
   bool takesApp() const { return value == "APP"; }
   bool takesRule() const { return value == "RULE"; }

@@ -17,6 +17,24 @@ namespace tsd {
 
 ExitCode runSample(const CommandContext& context, const SampleOptions& options);
 
+struct HostOptions {
+  std::string action;  // "new", "add", "remove" or "check"
+  std::string host;
+  std::vector<std::string> items;  // packages and folders of apps, or identifiers
+  bool restore = false;
+  std::string demoted;  // "by-hand", "automatically" or "both"; empty: not at all
+  bool replace = false;
+  bool uninstall = false;
+};
+ExitCode runHost(const CommandContext& context, const HostOptions& options);
+
+struct PackOptions {
+  std::string folder;
+  std::string file;  // of the package
+  bool replace = false;
+};
+ExitCode runPack(const CommandContext& context, const PackOptions& options);
+
 struct DeviceOnlyOptions {
   std::string device;
 };

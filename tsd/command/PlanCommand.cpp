@@ -11,8 +11,8 @@
 #include "tsd/daemon/TodoList.h"
 #include "tsd/history/Outcome.h"
 #include "tsd/history/Verdicts.h"
+#include "tsd/host/PackageForecast.h"
 #include "tsd/sync/HostTodo.h"
-#include "tsd/sync/PackageForecast.h"
 #include "tsd/sync/SyncOpening.h"
 #include "tsd/terminal/Output.h"
 

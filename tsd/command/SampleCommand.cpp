@@ -12,8 +12,7 @@ using platform::Value;
 namespace {
 
 const char* restoreSort(std::size_t place) {
-  bool byHand = SampleHost::isDemotedByHand(place);
-  bool automatically = SampleHost::isDemotedAutomatically(place);
+  const auto [byHand, automatically] = SampleHost::demotionAt(place);
   return byHand && automatically ? "demoted, both lists"
          : byHand                ? "demoted by hand"
          : automatically         ? "demoted automatically"

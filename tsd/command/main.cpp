@@ -16,6 +16,7 @@
 #include "tsd/CommandError.h"
 #include "tsd/OptionTable.h"
 #include "tsd/command/Commands.h"
+#include "tsd/help/HelpText.h"
 #include "tsd/terminal/Output.h"
 #include "tsd/terminal/Suggestion.h"
 
@@ -38,37 +39,6 @@ const std::map<std::string, ProgressMode> progressModes{{"auto", ProgressMode::a
 
 constexpr const char* commonGroup = "Common";
 constexpr const char* version = TSD_VERSION;
-
-const std::vector<ExitCodeEntry> exitCodes{
-    {ExitCode::done, "done"},
-    {ExitCode::failed, "failed"},
-    {ExitCode::usage, "usage"},
-    {ExitCode::someFailed, "some apps are not as the host wants them"},
-    {ExitCode::cancelled, "cancelled by a signal"},
-    {ExitCode::deadline, "a deadline passed"},
-    {ExitCode::busy, "the device is in use"},
-};
-
-/// In lines for the right column of a help text on a terminal of 80 columns, or of another width.
-std::string wrapped(const std::string& text, std::size_t width = 50) {
-  std::string result;
-  std::size_t lineLength = 0;
-  for (std::size_t start = 0; start < text.size();) {
-    std::size_t end = std::min(text.find(' ', start), text.size());
-    std::size_t word = end - start;
-    if (lineLength > 0 && lineLength + 1 + word > width) {
-      result += '\n';
-      lineLength = 0;
-    } else if (lineLength > 0) {
-      result += ' ';
-      ++lineLength;
-    }
-    result += text.substr(start, word);
-    lineLength += word;
-    start = end + 1;
-  }
-  return result;
-}
 
 /// Lets the option take these values only.
 CLI::Option* takeOneOf(Invocation& invocation, CLI::Option* option, const std::vector<std::string>& words) {
@@ -156,11 +126,48 @@ void addSample(CLI::App& program, Invocation& invocation) {
                            std::uint64_t{1} << 31);
   addNumber<std::size_t>(command, "--files", options->files,
                          "Files of each package (3 to 12, and 40 in one of eight packages)", 3, 1000);
+  addNumber<std::size_t>(command, "--restored", options->restored,
+                         "Apps in the restore list, as far as there are so many (5)", 0, 100000);
   addNumber(command, "--seed", options->seed, "The same seed gives the same folder (1)");
   command->add_flag("--demo", options->demo,
                     wrapped("Make three entries special: a damaged package, a bad identifier and an app to remove. "
                             "Packages/older then holds older versions of the first app and of the one to remove, to "
                             "be put on the device with 'tsd store DEVICE APP --finish --package FILE'"));
+}
+
+void addHostEditor(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<HostOptions>();
+  auto* command = addCommand(program, invocation, "host", "Make, change or check a host's folder", runHost, options);
+  auto* action = command->add_option("ACTION", options->action,
+                                     wrapped("new: an empty host; add: put apps into it; remove: take apps out of it; "
+                                             "check: find what a sync would stumble over, each package read whole"));
+  takeOneOf(invocation, action, {"new", "add", "remove", "check"})->required()->option_text(" ");
+  addHost(command, options->host);
+  command
+      ->add_option("SOURCE", options->items,
+                   wrapped("What is added: packages, or folders that one is made of; what is removed: identifiers"))
+      ->option_text("...");
+  command->add_flag("--restore", options->restore, wrapped("Of add: put the apps into the restore list too"));
+  auto* demoted = command->add_option("--demoted", options->demoted,
+                                      wrapped("Of add: into the restore list, and into the list of demoted apps as "
+                                              "by-hand, automatically or both"));
+  takeOneOf(invocation, demoted, {"by-hand", "automatically", "both"})->option_text("HOW");
+  command->add_flag("--replace", options->replace, wrapped("Of add: what the host has of these apps goes"));
+  command->add_flag("--uninstall", options->uninstall,
+                    wrapped("Of remove: leave an entry in the todo list that removes the app from devices"));
+}
+
+void addPack(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<PackOptions>();
+  auto* command = addCommand(program, invocation, "pack", "Make a package of an app's folder", runPack, options);
+  command
+      ->add_option("FOLDER", options->folder,
+                   wrapped("A NAME.app folder, one with nothing but that in it, or another with an Info.plist"))
+      ->required()
+      ->check(checkFolder)
+      ->option_text(" ");
+  command->add_option("-o,--output", options->file, "The package")->required()->check(checkFile)->option_text("FILE");
+  command->add_flag("--replace", options->replace, "An older file of that name goes");
 }
 
 template <class Options>
@@ -370,7 +377,7 @@ OptionEntry entryOf(const CLI::Option& option, const Invocation& invocation) {
 }
 
 OptionTable tableOf(const CLI::App& program, const Invocation& invocation) {
-  OptionTable table{program.get_name(), version, program.get_description(), exitCodes, {}, {}, {}};
+  OptionTable table{program.get_name(), version, program.get_description(), exitCodes(), {}, {}, {}};
   table.points = device::injectionPoints();
   table.actions = device::injectionActions();
   for (const auto* command : program.get_subcommands({})) {
@@ -435,12 +442,14 @@ void addHelp(CLI::App& program, Invocation& invocation) {
 void addCommands(CLI::App& program, Invocation& invocation) {
   program.require_subcommand(1);
   std::string codes;
-  for (const auto& each : exitCodes) {
+  for (const auto& each : exitCodes()) {
     codes += (codes.empty() ? "Exit codes: " : ", ") + std::to_string(static_cast<int>(each.code)) + ' ' + each.meaning;
   }
   program.footer(wrapped(codes + '.', 78));
   program.set_version_flag("--version", std::string("tsd ") + version);
   addSample(program, invocation);
+  addHostEditor(program, invocation);
+  addPack(program, invocation);
   addDeviceCommand(program, invocation, "init", "Make an empty device", runInit);
   addSync(program, invocation);
   addPlan(program, invocation);

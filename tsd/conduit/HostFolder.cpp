@@ -43,10 +43,10 @@ std::vector<std::string> namesIn(const std::string& folder) {
   return names;
 }
 
-/// Throws when a file stands where nobody looks for it, as its name is nearly that of one that is missing.
+/// Appends a sentence about each file whose name is nearly that of one of the known ones that is missing.
 template <std::size_t count>
-void refuseMisspelled(const std::string& folder, const std::vector<std::string>& present,
-                      const std::array<std::string_view, count>& known) {
+void findMisspelled(const std::string& folder, const std::vector<std::string>& present,
+                    const std::array<std::string_view, count>& known, std::vector<std::string>& found) {
   auto isPresent = [&](std::string_view name) { return std::binary_search(present.begin(), present.end(), name); };
   std::vector<std::string> missing;
   for (auto name : known) {
@@ -55,7 +55,7 @@ void refuseMisspelled(const std::string& folder, const std::vector<std::string>&
   for (const auto& name : present) {
     if (std::find(known.begin(), known.end(), name) != known.end()) continue;
     if (auto meant = didYouMean(name, missing); !meant.empty())
-      throw CommandError(folder + "/" + name + ": not a file that a host has" + meant);
+      found.push_back(folder + "/" + name + ": not a file that a host has" + meant);
   }
 }
 
@@ -65,19 +65,25 @@ const char* nameOf(platform::Value::Kind kind) {
 
 }  // namespace
 
+std::vector<std::string> misspelledFiles(const std::string& folder) {
+  std::vector<std::string> found;
+  findMisspelled(folder, namesIn(folder), hostNames, found);
+  const std::string restore = folder + "/" + std::string(restoreName);
+  if (std::error_code problem; std::filesystem::is_directory(std::filesystem::symlink_status(restore, problem)))
+    findMisspelled(restore, namesIn(restore), restoreNames, found);
+  return found;
+}
+
 void requireHostFolder(const std::string& folder) {
   const auto names = namesIn(folder);
   auto has = [&](std::string_view name) { return std::binary_search(names.begin(), names.end(), name); };
   if (has("device.db") && has("fs")) throw CommandError(folder + ": this is a device, not a host");
-  refuseMisspelled(folder, names, hostNames);
+  if (auto misspelled = misspelledFiles(folder); !misspelled.empty()) throw CommandError(misspelled.front());
   if (std::none_of(hostNames.begin(), hostNames.end(), has)) {
     throw CommandError(folder + ": nothing of a host is in it: no " + std::string(todoListName) + ", " +
                        std::string(iconLayoutName) + ", " + std::string(packagesName) + " or " +
                        std::string(restoreName));
   }
-  const std::string restore = folder + "/" + std::string(restoreName);
-  if (std::error_code problem; std::filesystem::is_directory(std::filesystem::symlink_status(restore, problem)))
-    refuseMisspelled(restore, namesIn(restore), restoreNames);
 }
 
 bool isThere(const std::string& path) {

@@ -8,8 +8,8 @@
 
 #include "platform/DevicePaths.h"
 #include "platform/TodoOperation.h"
-#include "plist/PropertyList.h"
 #include "tsd/CommandError.h"
+#include "tsd/host/HostList.h"
 #include "tsd/sample/SamplePackage.h"
 
 namespace tsd {
@@ -18,7 +18,6 @@ using platform::Value;
 
 namespace {
 
-constexpr std::size_t restoredApps = 5;
 constexpr std::size_t rightsSize = 512;
 constexpr const char* olderVersion = "1.0";
 
@@ -33,13 +32,6 @@ void writeFile(const std::string& path, platform::BytesView content) {
   file.write(content.data(), static_cast<std::streamsize>(content.size()));
   file.close();
   if (!file) throw CommandError(path + ": " + std::strerror(errno ? errno : EIO));
-}
-
-platform::Bytes propertyList(const Value& value, bool binary) {
-  platform::ErrorRef error;
-  auto bytes = binary ? plist::writeBinary(value, &error) : plist::writeXML(value, &error);
-  if (!bytes) throw CommandError("a property list of the sample: " + textOf(error));
-  return std::move(*bytes);
 }
 
 SampleRole roleAt(std::size_t place, std::size_t count, bool demo) {
@@ -80,14 +72,14 @@ SampleHost::SampleHost(const SampleOptions& options) : _options(options) {
     _entries.push_back(std::move(entry));
   }
   for (std::size_t i = _layout.size(); i > 1; --i) std::swap(_layout[i - 1], _layout[numbers.below(i)]);
-  _rights = numbers.bytes(rightsSize * restoredApps);
+  _rights = numbers.bytes(rightsSize * restored().size());
 }
 
 std::vector<const SampleApp*> SampleHost::restored() const {
   std::vector<const SampleApp*> apps;
   for (const auto& entry : _entries) {
     bool sound = entry.role == SampleRole::install || entry.role == SampleRole::older;
-    if (sound && apps.size() < restoredApps) apps.push_back(&entry.app);
+    if (sound && apps.size() < _options.restored) apps.push_back(&entry.app);
   }
   return apps;
 }
@@ -111,7 +103,7 @@ void SampleHost::writeTodoList() const {
     list.array()->append(
         entry.app.todoEntry(entry.role == SampleRole::remove ? platform::todo::remove : platform::todo::install));
   }
-  writeFile(_options.host + "/" + std::string(platform::todoListName), propertyList(list, _options.seed % 2 == 0));
+  writeFile(_options.host + "/" + std::string(platform::todoListName), propertyListOf(list, _options.seed % 2 == 0));
 }
 
 void SampleHost::writeIconLayout() const {
@@ -122,14 +114,14 @@ void SampleHost::writeIconLayout() const {
     for (std::size_t n = 0; n < perPage && i < _layout.size(); ++n) page.array()->append(_layout[i++]);
     pages.array()->append(page);
   }
-  writeFile(_options.host + "/" + std::string(platform::iconLayoutName), propertyList(pages, _options.seed % 2 == 1));
+  writeFile(_options.host + "/" + std::string(platform::iconLayoutName), propertyListOf(pages, _options.seed % 2 == 1));
 }
 
 void SampleHost::writeAppFolder(const SampleApp& app, bool binary) const {
   const std::string folder = _options.host + "/" + app.id;
   makeFolder(folder);
-  writeFile(folder + "/Info.plist", propertyList(app.manifest(), binary));
-  writeFile(folder + "/" + std::string(platform::storeMetadataFileName), propertyList(app.storeMetadata(), !binary));
+  writeFile(folder + "/Info.plist", propertyListOf(app.manifest(), binary));
+  writeFile(folder + "/" + std::string(platform::storeMetadataFileName), propertyListOf(app.storeMetadata(), !binary));
   writeFile(folder + "/" + std::string(platform::artworkFileName), app.icon);
   writeFile(folder + "/" + sampleIconName, app.icon);
 }
@@ -161,27 +153,20 @@ void SampleHost::writePackages() const {
 
 void SampleHost::writeRestoreLists() const {
   Value list = Value::makeDictionary();
-  Value automatic = Value::makeArray();
-  Value byHand = Value::makeArray();
+  Value demoted = Value::makeDictionary();
+  for (const char* key : {"AutomaticDowngrades", "IntentionalDowngrades"})
+    demoted.dictionary()->set(key, Value::makeArray());
   auto apps = restored();
   for (std::size_t place = 0; place < apps.size(); ++place) {
-    Value entry = Value::makeDictionary();
-    entry.dictionary()->set("HarluneMetadata",
-                            Value::makeData(propertyList(apps[place]->storeMetadata(), place % 2 == 0)));
-    entry.dictionary()->set("ApplicationSINF",
-                            Value::makeData(platform::BytesView(_rights).substr(place * rightsSize, rightsSize)));
-    entry.dictionary()->set("PlaceholderIcon", Value::makeData(apps[place]->icon));
-    list.dictionary()->set(apps[place]->id, entry);
-    if (isDemotedByHand(place)) byHand.array()->append(apps[place]->id);
-    if (isDemotedAutomatically(place)) automatic.array()->append(apps[place]->id);
+    const auto& app = *apps[place];
+    putRestored(list, {app.id, propertyListOf(app.storeMetadata(), place % 2 == 0),
+                       platform::Bytes(_rights, place * rightsSize, rightsSize), app.icon});
+    appendDemoted(demoted, app.id, demotionAt(place));
   }
-  Value demoted = Value::makeDictionary();
-  demoted.dictionary()->set("AutomaticDowngrades", automatic);
-  demoted.dictionary()->set("IntentionalDowngrades", byHand);
   std::string folder = _options.host + "/Restore";
   makeFolder(folder);
-  writeFile(folder + "/" + std::string(platform::restoreListName), propertyList(list, true));
-  writeFile(folder + "/" + std::string(platform::demotedListName), propertyList(demoted, false));
+  writeFile(folder + "/" + std::string(platform::restoreListName), propertyListOf(list, true));
+  writeFile(folder + "/" + std::string(platform::demotedListName), propertyListOf(demoted, false));
 }
 
 }  // namespace tsd

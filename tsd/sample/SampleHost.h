@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "platform/Value.h"
+#include "tsd/host/RestoreLists.h"
 #include "tsd/sample/SampleApp.h"
 
 namespace tsd {
@@ -13,6 +14,7 @@ struct SampleOptions {
   std::string host;
   std::size_t apps = 8;
   std::uint64_t packageSize = 262144;  // bytes of one package, about
+  std::size_t restored = 5;            // apps in the restore list, as far as there are so many
   std::size_t files = 0;               // in one package, from 3 on; 0: drawn for each
   std::uint64_t seed = 1;
   bool demo = false;
@@ -39,11 +41,13 @@ class SampleHost {
   void write() const;
 
   const std::vector<Entry>& entries() const { return _entries; }
-  /// The apps of the restore list: two plain ones, one demoted by hand, one automatically, one in both lists.
+  /// The apps of the restore list: of each five two plain ones, one demoted by hand, one automatically, one in both
+  /// lists.
   std::vector<const SampleApp*> restored() const;
   /// How the app at that place of `restored()` stands in the demoted-apps list.
-  static bool isDemotedByHand(std::size_t place) { return place == 2 || place == 4; }
-  static bool isDemotedAutomatically(std::size_t place) { return place == 3 || place == 4; }
+  static Demotion demotionAt(std::size_t place) {
+    return {place % 5 == 2 || place % 5 == 4, place % 5 == 3 || place % 5 == 4};
+  }
 
  private:
   void writeTodoList() const;

@@ -1,23 +1,13 @@
 #include "tsd/sync/HostTodo.h"
 
 #include "tsd/conduit/HostFolder.h"
+#include "tsd/host/TodoProblem.h"
 
 namespace tsd {
 
 namespace {
 
 constexpr std::size_t mostNamed = 5;
-
-/// Why nobody can act on an entry; empty: somebody can.
-std::string problemOf(const platform::Value& entry) {
-  const auto* fields = entry.dictionary();
-  if (!fields) return "it is not a dictionary";
-  for (const char* key : {"identifier", "operation"}) {
-    if ((*fields)[key].isAbsent()) return std::string("it has no \"") + key + "\"";
-    if (!(*fields)[key].string()) return std::string("its \"") + key + "\" is not a text";
-  }
-  return {};
-}
 
 }  // namespace
 
@@ -26,7 +16,7 @@ std::vector<TodoEntry> readHostTodoList(const std::string& host, Console& consol
   const auto list = readHostList(path, platform::Value::Kind::array);
   std::size_t odd = 0;
   for (std::size_t place = 0; list.array() && place < list.array()->size(); ++place) {
-    std::string problem = problemOf((*list.array())[place]);
+    std::string problem = problemOfTodoEntry((*list.array())[place]);
     if (!problem.empty() && ++odd <= mostNamed)
       console.message(path + ": entry " + std::to_string(place + 1) + " is passed over: " + problem);
   }

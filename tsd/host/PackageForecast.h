@@ -2,8 +2,6 @@
 
 #include <string>
 
-#include "tsd/history/Outcome.h"
-
 namespace tsd {
 
 /// What can be told of an app's package before it is sent, by a look at its manifest.

@@ -1,4 +1,4 @@
-#include "tsd/sync/PackageForecast.h"
+#include "tsd/host/PackageForecast.h"
 
 #include <fcntl.h>
 
