@@ -8,7 +8,7 @@ namespace bench {
 void printPeakMemoryRows();
 
 /// What such a process does: the edit, on the files in the folder, after which it prints the bytes that it took at most
-/// beyond what it had before. False when it is none of the edits.
+/// beyond what it had before. False when it is not one of the edits.
 bool runEdit(const std::string& edit, const std::string& folder);
 
 }  // namespace bench

@@ -71,7 +71,7 @@ TEST_P(CoordinationContract, ACoordinatorTakesEachPieceOnceAndNothingAfterItsEnd
   EXPECT_EQ(coordinator->appAssetPromiseResponsibleClientWithError(), 0u);
   EXPECT_TRUE(coordinator->setAppAssetPromiseResponsibleClient(1));
   EXPECT_EQ(coordinator->appAssetPromiseResponsibleClientWithError(), 1u);
-  // An install does not outlive its package's promise, and a promise kept afterwards comes to nothing.
+  // An install does not outlive its package's promise, and fulfilling a promise afterwards does nothing.
   EXPECT_TRUE(package->cancelForReason(platform::makeError("Contract", 30), 3));
   package->setComplete(true);
   host().deliver();

@@ -30,7 +30,7 @@ constexpr auto anyKind = Kind::RVAppInstallCoordinator;
 constexpr auto initiating = Kind::RVInitiatingAppInstallCoordinator;
 constexpr auto updating = Kind::RVUpdatingAppInstallCoordinator;
 
-/// So many keys, of which nobody reads any: strings, numbers and containers.
+/// That many keys that nobody reads: strings, numbers and containers.
 Value dictionaryOf(std::size_t keys);
 
 /// What callbacks wrote down, from whichever thread.

@@ -128,7 +128,7 @@ std::uint64_t AppsClient::CoordinatedInstall::copyIcon(const std::string& source
     auto attributes = _platform.fileSystem.attributesOfItem(_iconPath, &attributesError);
     note(attributesError);
     if (attributes && !attributesError) size = attributes->size;
-    if (attributesError) error = attributesError;  // else what a copy that succeeded reported besides stays told
+    if (attributesError) error = attributesError;  // otherwise what a copy that succeeded reported stays the error
     say(_platform, "icon for %{public}@ at %{public}@ has a size of %llu", _bundleIdentifier, _iconPath, size);
   }
   say(_platform, "Copied icon from %{public}@ to %{public}@ with error %{public}@ for '%{public}@', sizeOnDisk:%llu",

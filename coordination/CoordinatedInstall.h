@@ -29,7 +29,7 @@ class AppsClient::CoordinatedInstall {
   /// The size of the icon copied into the placeholder's directory; 0 when there is none.
   std::uint64_t stageIcon();
   std::uint64_t copyIcon(const std::string& source);
-  /// What fails in here leaves the placeholder as it is then; it is attached all the same.
+  /// A failure in here leaves the placeholder as it is at that moment; it is attached all the same.
   void configurePlaceholder(std::uint64_t iconSize);
   bool setAttributes();
   void cancel();
@@ -43,7 +43,7 @@ class AppsClient::CoordinatedInstall {
     note(error);
     return succeeded;
   }
-  /// Keeps the error that a call answered, if it did, as the last one of this preparation.
+  /// Keeps the error that a call answered, if any, as the last one of this preparation.
   void note(const ErrorRef& error);
 
   AppsClient& _client;

@@ -38,7 +38,7 @@ using TransferPromiseRef = std::shared_ptr<platform::RVPromisedTransferToPath>;
 
 /// The plug-in of the data class "Application": one object for the life of the daemon's process.
 ///
-/// It is passive: it starts no thread and waits nowhere but in `outstandingAssetTransfers` (for the registry's
+/// It is passive: it starts no thread and waits only in `outstandingAssetTransfers` (for the registry's
 /// first report) and at the end of a restore (for placeholders). Calls come from the daemon's threads,
 /// callbacks from the services' threads, at the same time. Nothing is thrown out of a public operation.
 ///
@@ -140,14 +140,14 @@ class AppsClient final : public platform::TSClient,
 
   /// The array in the property list at the path; absent when there is none.
   static Value _loadPlist(const Platform& platform, std::string_view path, ErrorRef* error = nullptr);
-  /// Sets the operation of the identifier's first entry in the todo list. Without an identifier no entry is meant.
+  /// Sets the operation of the identifier's first entry in the todo list. Without an identifier nothing is changed.
   void changeAssetID(std::optional<std::string_view> identifier, std::string_view toDo) EXCLUDES(_listFilesQueue);
-  /// The items in home-screen order, then the others. Those that the home screen named leave the dictionary.
+  /// The items in home-screen order, then the others. Those that the home screen names are taken out of `items`.
   static std::vector<std::shared_ptr<const Candidate>> _orderTheItems(const Platform& platform, Candidates& items);
 
   // ---- Preparation (core/SyncPreparation.cpp) ----
 
-  /// The array of what `installedAssets` answers.
+  /// The array in the answer of `installedAssets`.
   Value _deletions() EXCLUDES(_transferStateGuard);
 
   // ---- Reconciliation (core/Reconcile.cpp) ----
@@ -173,7 +173,7 @@ class AppsClient final : public platform::TSClient,
   Value _restoreStatePropertyForKey(std::string_view key, std::string_view identifier,
                                     const std::optional<std::string>& version);
   /// Removes the app's records of all versions, and with the last record the file; a file that is no property list goes
-  /// too. Without an identifier no record is meant.
+  /// too. Without an identifier nothing is removed.
   void cleanRestoreStateForIdentifier(std::optional<std::string_view> identifier) EXCLUDES(_listFilesQueue);
 
   // ---- AppInstallUsingCoordination ----
@@ -203,7 +203,7 @@ class AppsClient final : public platform::TSClient,
   // Preparing an install (coordination/CoordinatedInstall.cpp)
 
   class CoordinatedInstall;
-  /// True when the app's coordinator holds a placeholder promise. Otherwise the plug-in's coordinator for the app, had
+  /// True when the app's coordinator holds a placeholder promise. Otherwise the plug-in's coordinator for the app, if
   /// it got one, is cancelled, and so is a placeholder that could not be attached; files in the placeholder's directory
   /// stay. Throws nothing.
   bool prepareAppForInstallUsingCoordination(const TSAssetRef& asset, bool existingApp);
@@ -239,7 +239,7 @@ class AppsClient final : public platform::TSClient,
     std::optional<BytesView> sinfData;
     std::optional<BytesView> iconData;
   };
-  /// True when the app is prepared, or was before. Otherwise what was set up is cancelled and the app not awaited.
+  /// True when the app is prepared, or was already. Otherwise what was set up is cancelled and the app is not awaited.
   /// Throws nothing.
   bool prepareAppForRestoreUsingCoordination(const RestoreInput& input, std::uint64_t demotionStatus);
   bool _prepareDemotedAppForRestoreWithBundleId(const RestoreInput& input, std::uint64_t demotionStatus);
@@ -251,7 +251,7 @@ class AppsClient final : public platform::TSClient,
 
   void shiftwellSetPlaceHolderPromiseForRestoreAppBundle(std::string_view bundleIdentifier) EXCLUDES(_restoreQueue);
   void shiftwellCancelledCoordinatorForRestoreAppBundle(std::string_view bundleIdentifier) EXCLUDES(_restoreQueue);
-  /// No identifier: the service does not know the app; such a report is ignored like one of an app nobody awaits.
+  /// No identifier: the service does not know the app; such a report is ignored, like one about an app nobody awaits.
   void rcDidInstallPlaceHolderForAppBundle(std::optional<std::string_view> bundleIdentifier) EXCLUDES(_restoreQueue);
   /// Blocks until every awaited placeholder is installed or cancelled, for at most 5 seconds of the clock for each.
   void _waitForPlaceholderInstalls() EXCLUDES(_restoreQueue);
@@ -292,7 +292,7 @@ class AppsClient final : public platform::TSClient,
   /// Written on `_restoreQueue` only; atomic so that a waiter reads a whole number outside it.
   std::atomic<std::int64_t> _restoringPlaceholderCount{0};
 
-  /// False after an `installedAssets` that failed: the apps of the last sync are to be looked through once more.
+  /// False after an `installedAssets` that failed: the apps of the last sync have to be looked through once more.
   bool _deletionsReported GUARDED_BY(_transferStateGuard) = true;
   /// Guards the three fields that the daemon's calls share; held for the field alone.
   platform::Mutex _transferStateGuard;

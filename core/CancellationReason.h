@@ -6,7 +6,7 @@
 
 namespace appsync {
 
-/// Why the plug-in ends something of the install-coordination service; errors of the daemon's domain.
+/// Why the plug-in cancels something of the install-coordination service: errors of the daemon's domain.
 enum class CancellationCode : std::int64_t {
   installPreparationFailed = 1,
   restorePreparationFailed = 29,

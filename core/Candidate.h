@@ -28,7 +28,7 @@ struct Candidate {
 };
 using CandidateRef = std::shared_ptr<const Candidate>;
 
-/// Candidates by identifier, in the order in which the identifiers first came.
+/// Candidates by identifier, in the order in which the identifiers were first set.
 class Candidates {
  public:
   /// Replaces an older candidate of the identifier in its place.

@@ -39,7 +39,7 @@ void AppsClient::changeAssetID(std::optional<std::string_view> identifier, std::
   writePropertyList(_platform, todoList, PropertyListFormat::binary, todoListPath);
 }
 
-/// A buffer of the home screen's, given back in the end.
+/// A buffer of the home screen, given back at the end.
 struct LentBuffer {
   explicit LentBuffer(const Platform& platform) : platform(platform) {}
   ~LentBuffer() {

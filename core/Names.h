@@ -2,7 +2,7 @@
 
 #include <string_view>
 
-/// Names that only the plug-in gives. Those that others know too are in `platform/DevicePaths.h` and
+/// Names that only the plug-in uses. Those that others know too are in `platform/DevicePaths.h` and
 /// `platform/DeviceNames.h`.
 namespace appsync {
 

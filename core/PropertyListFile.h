@@ -17,15 +17,16 @@ namespace appsync {
 platform::Value readDictionary(const platform::Platform& platform, const std::optional<std::string>& path);
 
 /// What the list files at the path hold: a value of the kind; absent without a message when there is no byte to read.
-/// `unparsable` and `ofAnotherKind` are said of what cannot be taken. The error is the file layer's or the reader's.
+/// `unparsable` and `ofAnotherKind` are the messages about what cannot be used. The error is the file layer's or the
+/// reader's.
 platform::Value readList(const platform::Platform& platform, std::string_view path, platform::Value::Kind kind,
                          platform::MessageFormat<> unparsable, platform::MessageFormat<> ofAnotherKind,
                          platform::ErrorRef* error);
 
-/// Serialises the value and writes it over the file. False when either fails; the old file is then as it was.
+/// Serialises the value and replaces the file. False when either fails; the old file is then as it was.
 bool writePropertyList(const platform::Platform& platform, const platform::Value& value,
                        platform::PropertyListFormat format, std::string_view path);
-/// The same as XML. What XML cannot carry, such as a control character, is written as binary rather than not at all;
+/// The same in XML. What XML cannot carry, such as a control character, is written in binary rather than not at all;
 /// whoever reads such a file takes either.
 bool writePropertyListAsXML(const platform::Platform& platform, const platform::Value& value, std::string_view path);
 

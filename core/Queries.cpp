@@ -16,7 +16,7 @@ namespace appsync {
 
 using namespace platform;
 
-/// What kind a metadata entry must be of.
+/// Of what kind a metadata entry must be.
 enum class EntryKind { string, number, dictionary };
 
 static bool isOfKind(const Value& value, EntryKind kind) {

@@ -22,7 +22,7 @@ constexpr std::string_view messagePrefix = "com.vantor.tsd.appsync|";
 constexpr char yesOrNo(bool value) { return value ? 'y' : 'n'; }
 
 /// Formats and writes one message; does neither when nobody listens. A message for which memory or the log fails is
-/// lost, and nothing else: what it tells of goes on.
+/// lost, and nothing else: the work it tells of goes on.
 template <class... Arguments>
 void log(const Platform& platform, LogCategory category, platform::LogLevel level, std::string_view prefix,
          platform::MessageFormat<std::type_identity_t<Arguments>...> format, const Arguments&... arguments) noexcept {
@@ -58,12 +58,12 @@ void sayError(const Platform& platform, platform::MessageFormat<std::type_identi
   log(platform, LogCategory::plugin, platform::LogLevel::error, messagePrefix, format, arguments...);
 }
 
-/// What an entry point does with an exception that must not leave it (out of memory, mostly): it is told, not passed
-/// on.
+/// What an entry point does with an exception that must not leave it (mostly for want of memory): it is logged, not
+/// passed on.
 void swallowException(const Platform& platform, std::string_view operation) noexcept;
 
 /// Runs work whose failure must not keep what follows from being done. False when the body answers so, and when an
-/// exception ends it, which is told as above.
+/// exception ends it, which is logged as above.
 template <class Body>
 bool contained(const Platform& platform, std::string_view work, Body&& body) noexcept try {
   if constexpr (std::is_void_v<std::invoke_result_t<Body&>>) {

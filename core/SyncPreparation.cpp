@@ -34,7 +34,7 @@ struct TodoState {
   bool installed = false;
   bool failed = false;
 
-  /// The host expects to install the app still.
+  /// The host still expects to install the app.
   bool isPending() const { return found && !installed && !failed; }
 };
 
@@ -52,7 +52,7 @@ static TodoStates todoStatesOf(const Value& todoList) {
   return states;
 }
 
-/// The apps of the last sync that are not installed any more.
+/// The apps of the last sync that are no longer installed.
 static void addMissingApps(const Platform& platform, const Value& lastSyncList, StringSet& candidates) {
   if (!lastSyncList.array()) return;
   for (const Value& element : *lastSyncList.array()) {
@@ -71,7 +71,7 @@ Value AppsClient::installedAssets() {
   Value answer;
   contained(_platform, "installedAssets", [&] { answer = answerWith(Value::makeArray()); });
   const bool complete = contained(_platform, "installedAssets", [&] { answer = answerWith(_deletions()); });
-  // What was not reported is not to be forgotten at the end of this sync.
+  // What was not reported must not be forgotten at the end of this sync.
   Mutex::Lock lock(_transferStateGuard);
   if (!complete) _uninstalledApps.reset();
   _deletionsReported = complete;

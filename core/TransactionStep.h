@@ -17,7 +17,7 @@ enum class TransactionStep : int {
   uninstall = 7,
 };
 
-/// A record that cannot be written is lost, and nothing else, like a message.
+/// Like a message, a record that cannot be written is lost, and nothing else.
 inline void beginStep(const Platform& platform, TransactionStep step, std::string_view bundleIdentifier,
                       std::string_view description) noexcept {
   contained(platform, "logStep", [&] {

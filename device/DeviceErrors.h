@@ -11,11 +11,11 @@ namespace device {
 /// Codes of the errors of the device as a whole; their domain is "LocalDevice".
 enum class LocalDeviceError : std::int64_t {
   failed = 1,
-  notADevice = 2,      // the folder or the parts are none of a device, or a record in it makes no sense
-  notEmpty = 3,        // a device is to be made where something else is
+  notADevice = 2,      // what is there is not a device, or is damaged: a record in it cannot be understood
+  notEmpty = 3,        // a new device was to be made where something else is
   unknownSetting = 4,  // no such key, or no such value of the key
   noSuchApp = 5,
-  busyApp = 6,  // another install of the app is under way
+  busyApp = 6,  // another install of the app is running
 };
 inline platform::ErrorRef localDeviceError(LocalDeviceError code, std::string description,
                                            platform::ErrorRef underlying = nullptr) {

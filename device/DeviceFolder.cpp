@@ -16,8 +16,8 @@ using platform::setError;
 constexpr const char* databaseName = "/device.db";
 constexpr const char* treeName = "/fs";
 
-/// Whether a folder holds no more than a `createDevice` that did not come to its end: directories, and a store without
-/// a record. It is only read.
+/// Whether a folder holds only what an interrupted `createDevice` leaves: directories, and a store without a record.
+/// The folder is only read.
 static bool isUnfinished(const std::string& folder) {
   namespace fs = std::filesystem;
   const std::string database = folder + databaseName;
@@ -33,7 +33,7 @@ static bool isUnfinished(const std::string& folder) {
     if (entry->symlink_status(failure).type() != fs::file_type::directory) return false;
   }
   if (failure) return false;
-  // A journal like this one is there only until the store's file has been made.
+  // Such a journal exists only until the store's file has been made.
   if (!fs::exists(database, failure) || fs::exists(database + "-journal", failure)) return true;
   auto store = copyDatabaseStore(database);
   return store && store->load().empty();
@@ -46,7 +46,7 @@ bool createDevice(const std::string& folder, ErrorRef* error) {
   auto refuse = [&](LocalDeviceError code, const std::string& why) {
     return fail(error, localDeviceError(code, folder + ": " + why));
   };
-  // Its files would come to lie in the system's root.
+  // Its files would end up in the system's root.
   if (folder.empty()) return fail(error, localDeviceError(LocalDeviceError::failed, "a folder without a name"));
   if (fs::exists(folder, failure)) {
     if (!fs::is_directory(folder, failure)) return refuse(LocalDeviceError::notEmpty, "not a folder");

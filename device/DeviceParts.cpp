@@ -28,7 +28,7 @@ constexpr std::string_view directories[] = {
     containersDirectory,
 };
 
-/// Makes these directories durable, and the way to each of them.
+/// Makes these directories durable, and those that lead to them.
 bool syncDirectories(FileTree& files, ErrorRef* error) {
   std::set<std::string_view> parents{"/"};
   for (auto directory : directories) {
@@ -51,15 +51,15 @@ bool isDeviceStore(Store& store, ErrorRef* error) {
   for (const auto& record : store.load()) {
     if (record.kind != "device") continue;
     if (record.key == "version" && record.value.unsignedInteger() == storeVersion) return true;
-    return fail(error, localDeviceError(LocalDeviceError::notADevice, "the device is one of another version"));
+    return fail(error, localDeviceError(LocalDeviceError::notADevice, "the device is of another version"));
   }
   bool isEmpty = store.load().empty();
   return fail(error, localDeviceError(LocalDeviceError::notADevice,
-                                      isEmpty ? "the device was never finished" : "the store is none of a device"));
+                                      isEmpty ? "the device was never finished" : "the store is not a device's"));
 }
 
 bool fillDeviceParts(FileTree& files, Store& store, ErrorRef* error) {
-  // The record comes last: without it nothing is a device.
+  // The record comes last: only with it the parts are a device.
   return makeDeviceDirectories(files, error) && syncDirectories(files, error) &&
          store.commit({{"device", "version", storeVersion}}, error);
 }
@@ -69,7 +69,7 @@ bool makeDeviceParts(FileTree& files, Store& store, ErrorRef* error) {
   auto items = files.list("/", error);
   if (!items) return false;
   if (!items->empty() || !store.load().empty())
-    return fail(error, localDeviceError(LocalDeviceError::notEmpty, "what is to become a device is not empty"));
+    return fail(error, localDeviceError(LocalDeviceError::notEmpty, "the place for the new device is not empty"));
   return fillDeviceParts(files, store, error);
 }
 

@@ -6,13 +6,13 @@
 
 namespace device {
 
-/// What a file tree and a store have to be to make a device.
+/// What makes a file tree and a store a device.
 
-/// The directories that every device has; those that are there stay as they are.
+/// Makes the directories that every device has; those that are there stay as they are.
 bool makeDeviceDirectories(FileTree& files, platform::ErrorRef* error);
 /// Whether the store has the record that makes it a device's.
 bool isDeviceStore(Store& store, platform::ErrorRef* error);
-/// Makes them those of an empty device, durably, whatever part of that is done already.
+/// Makes them those of an empty device, durably, however much of that is done already.
 bool fillDeviceParts(FileTree& files, Store& store, platform::ErrorRef* error);
 
 }  // namespace device

@@ -19,8 +19,8 @@ struct LogRecord {
   std::string message;
 };
 
-/// What an install of the store's own looks like from outside; every fact can be set, also to numbers nobody has a name
-/// for.
+/// What an install that the store runs looks like from outside. Every fact can be set, also to numbers that have no
+/// name.
 struct StoreInstall {
   std::uint64_t installType = platform::installType::storeDownload;
   std::uint64_t installState = platform::installState::active;
@@ -39,7 +39,7 @@ enum class InstallOutcome : std::uint8_t { none, installed, failed, cancelled };
 
 /// "placeholder", "updating", "installed"; empty for one that is gone.
 const char* nameOfState(AppState state);
-/// "INSTALLED", "FAILED", "CANCELED"; empty for none.
+/// "INSTALLED", "FAILED", "CANCELED"; empty for `none`.
 const char* nameOfOutcome(InstallOutcome outcome);
 std::optional<InstallOutcome> outcomeOfName(std::string_view name);
 /// "initiating", "updating", "restoring", "restoring-demoted"; empty for the base kind.
@@ -66,14 +66,14 @@ struct CoordinatorStatus {
   std::uint64_t client = 0;
   bool hasPlaceholder = false;
   bool promisesPackage = false;     // somebody is to deliver the package
-  std::uint64_t packageClient = 0;  // who, where that is not the coordinator's own client; else 0
+  std::uint64_t packageClient = 0;  // who, if not the coordinator's own client; otherwise 0
   double fraction = 0;              // of the package that has come
 
   bool operator==(const CoordinatorStatus&) const = default;
 };
 /// The canonical state of a device: the same for two devices that differ only in container names.
 struct DeviceStatus {
-  std::vector<AppStatus> apps;                  // sorted by id; those that only an outcome is left of, too
+  std::vector<AppStatus> apps;                  // sorted by id; with those of which only an outcome is left
   std::vector<CoordinatorStatus> coordinators;  // sorted by app
   std::vector<std::string> home;                // flattened, in order
   /// The home screen's pages as the host set them, one for a layout without pages. Apps that it does not name stand

@@ -34,7 +34,7 @@ using platform::ErrorRef;
 using platform::setError;
 using Lock = AppRecords::Lock;
 
-/// The parts of a device in the order in which they stand on each other.
+/// The parts of a device, in the order in which they build on each other.
 class WholeDevice final : public LocalDevice {
  public:
   WholeDevice(std::unique_ptr<FileTree> files, std::unique_ptr<Store> store, std::unique_ptr<EventQueue> events,
@@ -170,12 +170,12 @@ class WholeDevice final : public LocalDevice {
     ChangeSet changes;
     changes.setNotificationState(name, state);
     Lock lock(_records);
-    // Everybody has it already, so what the store refuses now is for its next commit.
+    // Everybody has been told already, so what the store refuses now goes into its next commit.
     _records.commitLater(std::move(changes));
     _records.commit({});
   }
 
-  /// Somebody else does something in the middle of a call. What cannot be done at that moment is not.
+  /// Somebody else does something in the middle of a call. What cannot be done at that moment is left out.
   void stepIn(InjectionRule::Action action, const std::string& app) {
     switch (action) {
       case InjectionRule::Action::cancel:

@@ -39,7 +39,7 @@ bool AppsClient::_makeIconFromBundlePath(const Platform& platform, const std::op
     sayError(platform, "Couldn't finalize image");
     return false;
   }
-  // Icons are drawn anew by each sync.
+  // Each sync draws the icons anew.
   if (!platform.fileSystem.writeAtomically(saveTo, data, nullptr, Durability::fleeting)) {
     sayError(platform, "Couldn't save image file to %{public}@", saveTo);
     return false;

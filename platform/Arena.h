@@ -9,7 +9,7 @@
 
 namespace platform {
 
-/// Where the containers and texts of one document lie. Everything goes at once, with the arena.
+/// Memory for the containers and texts of one document. All of it is freed at once, with the arena.
 ///
 /// Blocks given back are handed out again for the same size, so that a document which is edited for a long time
 /// does not grow. The bytes a document was read from are kept, and texts that several values may point to are
@@ -25,9 +25,9 @@ class Arena {
 
   /// `size` bytes, aligned to 8.
   void* allocate(std::size_t size);
-  /// Makes the block that was allocated last larger in its place, if it is the last one and there is room.
+  /// Grows the block in place, if it is the one allocated last and there is room behind it.
   bool extend(void* block, std::size_t size, std::size_t newSize) noexcept;
-  /// `size` as it was given to allocate() or extend(). Nothing happens to shared bytes.
+  /// `size` as it was given to allocate() or extend(). Shared bytes are left alone.
   void recycle(const void* block, std::size_t size) noexcept;
 
   /// Bytes that several values may point to.

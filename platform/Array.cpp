@@ -31,7 +31,7 @@ void Array::reserve(std::size_t count) {
   _capacity = static_cast<std::uint32_t>(count);
 }
 
-/// Where the next value goes. It counts when _size says so.
+/// Where the next value goes. It counts once _size includes it.
 Value* Array::place() {
   if (_size == _capacity) reserve(_capacity < 4 ? 4 : std::size_t{_capacity} * 2);
   return _values + _size;

@@ -10,7 +10,7 @@
 
 namespace platform {
 
-/// What threads that hold a `Mutex` wait for. A waiter lets the mutex go meanwhile and holds it again whenever
+/// What threads that hold a `Mutex` wait for. A waiter releases the mutex meanwhile and holds it again whenever
 /// `satisfied` runs and on return. `satisfied` touches what the mutex guards, so it says that it needs it:
 ///
 ///     _changed.wait(_mutex, [this]() REQUIRES(_mutex) { return _done; });
@@ -34,14 +34,14 @@ class Condition {
     return clock.waitUntil(waiting.lock, _changed, deadline, satisfied);
   }
 
-  /// Until somebody notifies, the time on the machine's own clock is over, or for no reason at all.
+  /// Until somebody notifies or the time is over on the machine's own clock; it may also end for no reason at all.
   void waitFor(Mutex& mutex, std::chrono::nanoseconds time) REQUIRES(mutex) {
     Waiting waiting(mutex);
     _changed.wait_for(waiting.lock, time);
   }
 
  private:
-  /// The mutex, which its holder keeps, in the shape in which the library waits with it.
+  /// The mutex in the shape in which the library waits with it; whoever held it holds it afterwards too.
   struct Waiting {
     explicit Waiting(Mutex& mutex) : lock(mutex._mutex, std::adopt_lock) {}
     ~Waiting() { lock.release(); }

@@ -11,7 +11,7 @@ namespace platform {
 inline constexpr double earliestDateWithText = -63113904000;
 inline constexpr double endOfDatesWithText = 252423993600;
 
-/// Written so that what is not a number has none as well.
+/// Written so that NaN has no text either.
 constexpr bool hasText(Date date) noexcept {
   return date.seconds >= earliestDateWithText && date.seconds < endOfDatesWithText;
 }
@@ -24,7 +24,7 @@ struct DateText {
 
 /// The second the date lies in. Nothing for a date outside the range above, finite or not.
 std::optional<DateText> dateText(Date date) noexcept;
-/// Nothing for text of any other shape, or that names no moment (a 30th of February, a 60th second).
+/// Nothing for text of any other shape, or for a moment that does not exist (30 February, second 60).
 std::optional<Date> dateFromText(std::string_view text) noexcept;
 
 }  // namespace platform

@@ -13,7 +13,7 @@ namespace platform {
 /// An open-addressed table with linear probing, at most half full.
 ///
 /// A slot holds the place of an entry in the entries' block, counted from 1; 0 is free. Places and not numbers:
-/// when entries go from the front, the others keep their places. The key of the hash is the table's own, since a
+/// when entries are removed at the front, the others keep their places. The key of the hash is the table's own, since a
 /// dictionary made by one copy of this code is searched by another.
 struct DictionaryIndex {
   std::uint32_t mask;
@@ -213,7 +213,7 @@ bool Dictionary::remove(std::string_view key) {
   return true;
 }
 
-/// Gives this dictionary, which nobody will look at again, back to the arena.
+/// Gives this dictionary, which nobody will use again, back to the arena.
 void Dictionary::recycle() const noexcept {
   for (const Entry& entry : *this) {
     _arena->recycle(entry.key.data(), entry.key.size());

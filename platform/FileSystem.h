@@ -21,12 +21,12 @@ struct FileAttributes {
 
 /// What a loss of power may do to a file that was written.
 enum class Durability : std::uint8_t {
-  lasting,   // on disk when the operation returns; the file has the old content or the new afterwards
-  fleeting,  // it may take the file, or any part of it: for what is made again before it is used again
+  lasting,   // on disk when the operation returns; afterwards the file has the old content or the new
+  fleeting,  // the file, or any part of it, may be lost: for what is made anew before it is used again
 };
 
-/// File operations. Paths are absolute. Every operation from any thread; each is by itself atomic towards the others,
-/// and on disk when it returns, only where it says so. Anything but regular files and directories is refused unopened.
+/// File operations. Paths are absolute. Callable from any thread. Each operation is atomic towards the others,
+/// and on disk when it returns, only where it says so. Anything but a regular file or a directory is refused unopened.
 class FileSystem {
  public:
   virtual ~FileSystem() = default;

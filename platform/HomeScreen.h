@@ -7,7 +7,7 @@
 
 namespace platform {
 
-/// The home screen. Operations from any thread.
+/// The home screen. Callable from any thread.
 class HomeScreen {
  public:
   using Port = std::uint32_t;

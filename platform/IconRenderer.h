@@ -7,7 +7,7 @@
 
 namespace platform {
 
-/// Objects of the icon services. `KBRelease` is the going of the last reference.
+/// Objects of the icon services. Dropping the last reference is their `KBRelease`.
 class KBURL {
  public:
   virtual ~KBURL() = default;
@@ -21,7 +21,7 @@ class GYImage {
   virtual ~GYImage() = default;
 };
 
-/// Draws an app's home-screen icon. Null results are failures. Operations from any thread.
+/// Draws an app's home-screen icon. Null results are failures. Callable from any thread.
 class IconRenderer {
  public:
   virtual ~IconRenderer() = default;

@@ -20,16 +20,16 @@ enum class RVCoordinatorKind : std::uint8_t {
   RVRestoringDemotedAppInstallCoordinator,
 };
 
-/// The install-coordination service. There is at most one coordinator per app. Operations from any thread.
+/// The install-coordination service. There is at most one coordinator per app. Callable from any thread.
 /// A factory answers null when the object cannot be made.
 class InstallCoordination {
  public:
   virtual ~InstallCoordination() = default;
 
   /// Finds the app's coordinator, or creates one of the kind. A look-up through a concrete kind finds only that
-  /// kind (another one there: null, with an error), through `RVAppInstallCoordinator` any. No coordinator and none
-  /// to be created: null, without an error. `created`, when given, tells whether it was made just now. What comes
-  /// back may belong to another client.
+  /// kind (another one there: null, with an error), through `RVAppInstallCoordinator` any. Null without an
+  /// error when there is none and none is to be created. `created`, when given, tells whether it was made just now.
+  /// What comes back may belong to another client.
   virtual std::shared_ptr<RVAppInstallCoordinator> coordinatorForAppWithBundleID(
       RVCoordinatorKind kind, std::string_view bundleID, RVClientIdentifier clientID, bool createIfNotExisting,
       bool* created = nullptr, ErrorRef* error = nullptr) = 0;

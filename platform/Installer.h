@@ -9,7 +9,7 @@
 
 namespace platform {
 
-/// The installer service. Operations from any thread.
+/// The installer service. Callable from any thread.
 class Installer {
  public:
   virtual ~Installer() = default;

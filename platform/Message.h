@@ -101,7 +101,7 @@ consteval bool fits(ConversionKind kind) {
   return false;
 }
 
-/// Reads the conversion that begins at text[at] == '%': its kind, and its length in `length`. Throws, which
+/// Reads the conversion that begins at text[at] == '%': its kind, and its length into `length`. Throws, which
 /// ends the compilation, when the log has no such conversion.
 constexpr ConversionKind conversionAt(std::string_view text, std::size_t at, std::size_t& length) {
   struct Known {

@@ -16,7 +16,7 @@ enum class KBNotificationSuspensionBehavior : std::uint8_t { drop, coalesce, hol
 using KBNotificationCallback = void (*)(NotificationCenter& center, void* observer, std::string_view name,
                                         const void* object, const Value& userInfo);
 
-/// System-wide notifications: named, each with a 64-bit state. Operations from any thread.
+/// System-wide notifications: named, each with a 64-bit state. Callable from any thread.
 class NotificationCenter {
  public:
   virtual ~NotificationCenter() = default;

@@ -32,7 +32,7 @@ struct OBBundleProxy {
   std::optional<std::string> bundleContainerURL;  // path of the container around it
 };
 
-/// The registry's view of one app. Numbers are the registry's own and may be ones that nobody has a name for.
+/// The registry's view of one app. Numbers are the registry's own; some of them may have no name.
 struct OBApplicationProxy final : OBBundleProxy {
   std::optional<std::string> applicationIdentifier;
   std::optional<std::string> applicationType;  // "User", "System", …

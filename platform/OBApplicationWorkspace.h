@@ -25,7 +25,7 @@ class OBApplicationWorkspaceObserverProtocol {
 /// Base of observers that want only some of the reports.
 class OBApplicationWorkspaceObserver : public OBApplicationWorkspaceObserverProtocol {};
 
-/// The application registry. Operations from any thread; an enumeration hands out a snapshot, so that its block may
+/// The application registry. Callable from any thread; an enumeration hands out a snapshot, so that its block may
 /// call the registry.
 class OBApplicationWorkspace {
  public:

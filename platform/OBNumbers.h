@@ -2,7 +2,7 @@
 
 #include <cstdint>
 
-/// The application registry's numbers, as far as anybody has a name for them. A registry may use others.
+/// The application registry's numbers, as far as they have names. A registry may use others.
 namespace platform {
 
 /// Why an app is being installed, or was.

@@ -14,7 +14,7 @@ class Process {
   virtual ~Process() = default;
 
   virtual std::string mainBundleIdentifier() = 0;
-  /// Absolute, without a slash at its end.
+  /// Absolute, without a trailing slash.
   virtual std::string temporaryDirectory() = 0;
   virtual std::string textOfErrorNumber(int errorNumber) = 0;
   /// Gives back a buffer that a service handed out.

@@ -8,7 +8,7 @@
 
 namespace platform {
 
-/// The errors that say of bytes that they are not a property list, to any reader.
+/// The errors that say that bytes are not a property list for any reader.
 namespace propertyListError {
 constexpr const char* domain = "plist";
 constexpr std::int64_t notAPropertyList = 1;  // empty, or of no known format
@@ -23,15 +23,15 @@ class PropertyListSerialization {
   virtual ~PropertyListSerialization() = default;
 
   /// Any format, recognised by its content. Absent when the bytes are not a property list: then, and only then, the
-  /// error is one of `propertyListError`. Absent too, with any other error,
-  /// when this reader refuses what another may take, or memory runs out.
+  /// error is one of `propertyListError`. Absent, with any other
+  /// error, also when this reader refuses what another may take, or when memory runs out.
   virtual Value propertyListWithData(Bytes bytes, ErrorRef* error = nullptr) = 0;
   /// Nothing when the value cannot be written in that format.
   virtual std::optional<Bytes> dataWithPropertyList(const Value& value, PropertyListFormat format,
                                                     ErrorRef* error = nullptr) = 0;
 };
 
-/// Whether a reading failed because of the bytes themselves.
+/// Whether reading failed because of the bytes themselves.
 inline bool isNoPropertyList(const Value& root, const ErrorRef& error) {
   if (!root.isAbsent() || !error || error->domain() != propertyListError::domain) return false;
   return error->code() == propertyListError::notAPropertyList || error->code() == propertyListError::malformed;

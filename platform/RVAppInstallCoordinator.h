@@ -17,7 +17,7 @@ class RVAppInstallObserverDelegate;
 
 /// The coordinator of one app's install. The service owns the record; this is a shared handle onto it, and two
 /// handles of one record answer alike. After the coordinator has ended, its setters fail with an error and its
-/// queries answer what it last held. Operations from any thread; none calls back before it has returned.
+/// queries answer what it last held. Callable from any thread; none calls back before it has returned.
 class RVAppInstallCoordinator {
  public:
   virtual ~RVAppInstallCoordinator() = default;
@@ -38,7 +38,7 @@ class RVAppInstallCoordinator {
   virtual bool hasPlaceholderPromise() = 0;
   virtual bool hasUserDataPromise() = 0;
 
-  /// Null when there is none; then an error says so.
+  /// Null, with an error, when there is no such promise.
   virtual std::shared_ptr<RVPromisedTransferToPath> appAssetPromiseWithError(ErrorRef* error = nullptr) = 0;
   virtual bool setAppAssetPromise(const std::shared_ptr<RVPromisedTransferToPath>& promise,
                                   ErrorRef* error = nullptr) = 0;
@@ -67,7 +67,7 @@ class RVAppInstallObserverDelegate {
 
   virtual void promiseDidBeginFulfillmentWithIdentifier(std::uint64_t) {}
   virtual void coordinatorDidInstallPlaceholder(const std::shared_ptr<RVAppInstallCoordinator>&) {}
-  /// The install ended; whether well says the coordinator's `error`.
+  /// The install ended; the coordinator's `error` says whether it succeeded.
   virtual void coordinatorDidCompleteSuccessfully(const std::shared_ptr<RVAppInstallCoordinator>&) {}
   virtual void coordinatorShouldPrioritize(const std::shared_ptr<RVAppInstallCoordinator>&) {}
   virtual void coordinatorCanceledWithReason(const std::shared_ptr<RVAppInstallCoordinator>&,

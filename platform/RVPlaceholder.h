@@ -26,7 +26,7 @@ class RVPlaceholderAttributes {
 };
 
 /// An app shown before its package is there. Configured piece by piece, closed, then attached to a coordinator;
-/// shared by its maker and the coordinator. Operations from any thread.
+/// shared by its maker and the coordinator. Callable from any thread.
 class RVPlaceholder {
  public:
   virtual ~RVPlaceholder() = default;

@@ -10,7 +10,7 @@
 namespace platform {
 
 /// A piece of an install that its maker will deliver. Shared by its maker and whatever it is attached to.
-/// Operations from any thread.
+/// Callable from any thread.
 class RVPromise {
  public:
   virtual ~RVPromise() = default;
@@ -32,7 +32,7 @@ class RVPromisedTransferToPath : public RVPromise {
   virtual void setTransferPath(std::string_view path) = 0;
 };
 
-/// Data that reaches the service on some other way.
+/// Data that reaches the service by some other way.
 class RVPromisedOutOfBandTransfer : public RVPromise {};
 
 }  // namespace platform

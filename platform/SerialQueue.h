@@ -24,7 +24,7 @@ class CAPABILITY("queue") SerialQueue {
 
   const std::string& label() const { return _label; }
 
-  /// The scope that runs on the queue. Short: nothing in it may wait for another block of this queue.
+  /// The scope that runs on the queue. Keep it short: nothing in it may wait for another block of this queue.
   class SCOPED_CAPABILITY Block {
    public:
     explicit Block(SerialQueue& queue) ACQUIRE(queue) : _queue(queue) { _queue.enter(); }

@@ -11,7 +11,7 @@
 namespace platform {
 
 /// A set of strings that enumerates in the order of insertion. Membership takes expected constant time. An insertion
-/// for which memory runs out leaves the set as it was. Not synchronised.
+/// that runs out of memory leaves the set as it was. Not synchronised.
 class StringSet {
  public:
   StringSet() = default;

@@ -16,7 +16,7 @@
 
 namespace platform {
 
-/// Takes the fraction of the work done.
+/// Takes the fraction of the work that is done, from 0 to 1.
 using TSProgressCallback = std::function<void(double)>;
 
 /// What the sync daemon asks of a plug-in for one data class. The daemon calls from its own threads; progress

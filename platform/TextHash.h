@@ -8,7 +8,7 @@
 namespace platform {
 
 /// The secret of one table. It lies in the table: whoever holds the table can search it, whichever copy of this code
-/// he was linked with.
+/// they were linked with.
 struct TextHashKey {
   std::uint64_t low = 0;
   std::uint64_t high = 0;

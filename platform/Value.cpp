@@ -146,7 +146,7 @@ Value Value::copiedInto(Arena& arena) const {
   return Value(*this);
 }
 
-/// Gives back to the arena what a contained value, which nobody will look at again, points to.
+/// Gives back to the arena what a contained value, which nobody will use again, points to.
 void Value::recycleInto(Arena& arena) const noexcept {
   if (holdsBytes()) {
     arena.recycle(_payload.bytes, _length);
@@ -176,7 +176,7 @@ bool operator==(const Value& one, const Value& other) noexcept {
       return one._payload.bits == other._payload.bits && one._unsigned == other._unsigned;
     case Value::Kind::real:
     case Value::Kind::date:
-      // Two numbers that are none are the same content.
+      // Two NaNs count as the same content.
       return one._payload.real == other._payload.real ||
              (one._payload.real != one._payload.real && other._payload.real != other._payload.real);
     case Value::Kind::string:

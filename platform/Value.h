@@ -153,7 +153,7 @@ class Array {
   const Value* begin() const noexcept { return _values; }
   const Value* end() const noexcept { return _values + _size; }
 
-  /// The container at the place, to be changed in its place; null when there is none of that kind.
+  /// The container at the place, to be changed in place; null when there is none of that kind there.
   Array* array(std::size_t index) noexcept;
   Dictionary* dictionary(std::size_t index) noexcept;
 
@@ -195,7 +195,7 @@ class Dictionary {
   const Value& operator[](std::string_view key) const noexcept;
   bool contains(std::string_view key) const noexcept;
 
-  /// The container under the key, to be changed in its place; null when there is none of that kind.
+  /// The container under the key, to be changed in place; null when there is none of that kind there.
   Array* array(std::string_view key) noexcept;
   Dictionary* dictionary(std::string_view key) noexcept;
 

@@ -9,7 +9,7 @@
 
 namespace platform {
 
-/// Builds the values of one document that is being read. Not for anybody else.
+/// Builds the values of one document that is being read. For readers of property lists only.
 ///
 /// The document's bytes are kept with the values, so that strings, data and keys can point into them. Values made
 /// here are contained values: they own nothing, and putting one into its place is a copy of its bits. They go
@@ -28,7 +28,7 @@ class ValueBuilder {
   static Value contained(Array& array) noexcept { return Value(&array); }
   static Value contained(Dictionary& dictionary) noexcept { return Value(&dictionary); }
 
-  /// A container of exactly so many places. Each of them must be constructed before anybody looks.
+  /// A container of exactly so many places. Each of them must be constructed before the array is read.
   Array& makeArray(std::size_t count);
   Dictionary& makeDictionary(std::size_t count);
   static Value* places(Array& array) noexcept { return array._values; }

@@ -8,7 +8,7 @@
 
 namespace platform {
 
-/// Counts entries and leaves; a waiter is released when they balance. Every operation from any thread.
+/// Counts entries and leaves; a waiter is released when they balance. Callable from any thread.
 class WaitGroup {
  public:
   void enter();
@@ -23,7 +23,7 @@ class WaitGroup {
   std::int64_t _entered GUARDED_BY(_mutex) = 0;
 };
 
-/// A counting semaphore that starts at 0. Every operation from any thread.
+/// A counting semaphore that starts at 0. Callable from any thread.
 class Semaphore {
  public:
   void signal();

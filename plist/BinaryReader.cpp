@@ -27,7 +27,7 @@ using platform::ValueBuilder;
 constexpr std::size_t headerSize = 8;
 constexpr std::size_t trailerSize = 32;
 
-/// The reading of one document, from its trailer down the references to its objects.
+/// Reads one document, from its trailer down the references to its objects.
 ///
 /// Objects are read again at each place that refers to them, so that every place gets a value of its own; the
 /// limits on nodes and text keep that in bounds. A failed operation answers an absent value and leaves _error.
@@ -114,8 +114,9 @@ bool BinaryReader::readTrailer() {
   _referenceSize = byte(at + 7);
   _objectCount = readBigEndian(trailer + 8, 8);
   std::uint64_t table = readBigEndian(trailer + 24, 8);
-  if (_offsetSize < 1 || _offsetSize > 8) return fail(ErrorCode::malformed, at + 6, "no such size of offsets");
-  if (_referenceSize < 1 || _referenceSize > 8) return fail(ErrorCode::malformed, at + 7, "no such size of references");
+  if (_offsetSize < 1 || _offsetSize > 8) return fail(ErrorCode::malformed, at + 6, "offsets cannot have this size");
+  if (_referenceSize < 1 || _referenceSize > 8)
+    return fail(ErrorCode::malformed, at + 7, "references cannot have this size");
   if (table < headerSize || table > at) return fail(ErrorCode::malformed, at + 24, "the offset table lies outside");
   if (_objectCount > (at - table) / _offsetSize) {
     return fail(ErrorCode::malformed, at + 8, "more objects than the offset table has room for");
@@ -138,7 +139,7 @@ inline bool BinaryReader::find(std::uint64_t number, std::size_t from, std::size
   std::uint64_t offset = readBigEndian(_bytes.data() + _objectsEnd + number * _offsetSize, _offsetSize);
   if (offset < headerSize || offset >= _objectsEnd) {
     return fail(ErrorCode::malformed, _objectsEnd + number * _offsetSize,
-                "object " + std::to_string(number) + " lies outside of the objects");
+                "object " + std::to_string(number) + " lies outside the objects");
   }
   at = offset;
   return true;
@@ -209,13 +210,13 @@ Value BinaryReader::object(std::uint64_t number, std::size_t from) {
       if (auto text = utf16(at, low)) return ValueBuilder::string(*text);
       return {};
     case 0x8:
-      fail(ErrorCode::unsupported, at, "a UID, which is no value of a property list");
+      fail(ErrorCode::unsupported, at, "a UID, which a property list cannot hold");
       return {};
     case 0xa:
       return array(at, low, number);
     case 0xb:
     case 0xc:
-      fail(ErrorCode::unsupported, at, "a set, which is no value of a property list");
+      fail(ErrorCode::unsupported, at, "a set, which a property list cannot hold");
       return {};
     case 0xd:
       return dictionary(at, low, number);
@@ -228,7 +229,7 @@ Value BinaryReader::simple(std::size_t at, unsigned low) {
   if (low == 8) return Value(false);
   if (low == 9) return Value(true);
   if (low == 0) {
-    fail(ErrorCode::unsupported, at, "null, which is no value of a property list");
+    fail(ErrorCode::unsupported, at, "null, which a property list cannot hold");
   } else {
     fail(ErrorCode::malformed, at, "no object has the marker " + std::to_string(low));
   }
@@ -238,7 +239,7 @@ Value BinaryReader::simple(std::size_t at, unsigned low) {
 /// Up to 4 bytes hold an unsigned number, 8 and 16 bytes a signed one.
 Value BinaryReader::integer(std::size_t at, unsigned low) {
   if (low > 4) {
-    fail(ErrorCode::malformed, at, "no integer has this size");
+    fail(ErrorCode::malformed, at, "an integer cannot have this size");
     return {};
   }
   unsigned size = 1u << low;
@@ -255,7 +256,7 @@ Value BinaryReader::integer(std::size_t at, unsigned low) {
 
 Value BinaryReader::real(std::size_t at, unsigned low) {
   if (low != 2 && low != 3) {
-    fail(ErrorCode::malformed, at, "no real has this size");
+    fail(ErrorCode::malformed, at, "a real cannot have this size");
     return {};
   }
   unsigned size = 1u << low;
@@ -267,13 +268,13 @@ Value BinaryReader::real(std::size_t at, unsigned low) {
 
 Value BinaryReader::date(std::size_t at, unsigned low) {
   if (low != 3) {
-    fail(ErrorCode::malformed, at, "no date has this size");
+    fail(ErrorCode::malformed, at, "a date cannot have this size");
     return {};
   }
   if (!fits(at + 1, 8, "a date")) return {};
   platform::Date date{std::bit_cast<double>(readBigEndian(_bytes.data() + at + 1, 8))};
   if (platform::hasText(date)) return Value(date);
-  fail(ErrorCode::outOfRange, at, "a date outside of the years 1 to 9999");
+  fail(ErrorCode::outOfRange, at, "a date outside the years 1 to 9999");
   return {};
 }
 
@@ -373,7 +374,7 @@ std::optional<std::string_view> BinaryReader::key(std::uint64_t number, std::siz
   unsigned marker = byte(at);
   if (marker >> 4 == 5) return ascii(at, marker & 15);
   if (marker >> 4 == 6) return utf16(at, marker & 15);
-  fail(ErrorCode::malformed, at, "a dictionary key that is no string");
+  fail(ErrorCode::malformed, at, "a dictionary key that is not a string");
   return {};
 }
 

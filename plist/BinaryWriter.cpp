@@ -76,7 +76,7 @@ bool BinaryWriter::count(const Value& value, std::size_t depth) {
       return true;
     case Value::Kind::date:
       if (!platform::hasText(*value.date())) {
-        _error = failure(ErrorCode::outOfRange, "a date outside of the years 1 to 9999");
+        _error = failure(ErrorCode::outOfRange, "a date outside the years 1 to 9999");
         return false;
       }
       [[fallthrough]];

@@ -17,7 +17,7 @@ using platform::BytesView;
 using platform::ErrorRef;
 using platform::Value;
 
-/// The first character that is no white space is "<", in any encoding that XML comes in.
+/// The first character that is not white space is "<", in any encoding that XML comes in.
 bool looksLikeXML(BytesView input) {
   std::size_t at = 0;
   if (input.starts_with("\xef\xbb\xbf")) at = 3;
@@ -42,7 +42,7 @@ Value readAnyForm(Bytes input, ErrorRef& error) {
   return {};
 }
 
-/// Runs the operation with nothing thrown out of it.
+/// Runs the operation and lets nothing it throws out.
 template <class Operation>
 auto guarded(ErrorRef* error, Operation operation) -> decltype(operation(*error)) {
   ErrorRef failed;

@@ -35,7 +35,7 @@ inline constexpr const char* errorDomain = platform::propertyListError::domain;
 enum class ErrorCode : std::int64_t {
   notAPropertyList = platform::propertyListError::notAPropertyList,  // empty, or neither of the two forms
   malformed = platform::propertyListError::malformed,                // breaks the rules of its form
-  unsupported = 3,  // well-formed, but none of ours: UID, set, null, declarations, encoding, version
+  unsupported = 3,  // well-formed, but not read here: UID, set, null, declarations, encoding, version
   duplicateKey = 4,
   outOfRange = 5,  // a number or a date
   tooDeep = 6,

@@ -19,7 +19,7 @@ class StringTable {
     bool isNew;
   };
   Number number(std::string_view text);
-  /// Gives back the memory for finding strings. No string is numbered after that.
+  /// Gives back the memory for finding strings. No string can be numbered after that.
   void complete() { _slots = {}; }
 
   std::size_t size() const noexcept { return _strings.size(); }

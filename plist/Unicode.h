@@ -29,9 +29,9 @@ inline bool isASCII(std::string_view text) {
 /// One character of UTF-8 text.
 struct Character {
   char32_t code;
-  std::size_t size;  // in bytes; 0: what is there is no UTF-8
+  std::size_t size;  // in bytes; 0: what is there is not UTF-8
 };
-/// The first character of a text that is not empty. Overlong forms and surrogates are no characters.
+/// The first character of a text that is not empty. Overlong forms and surrogates do not count as characters.
 Character firstCharacter(std::string_view text);
 
 /// How many units the UTF-8 text has in UTF-16. Nothing if it is not valid.

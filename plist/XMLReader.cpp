@@ -76,7 +76,7 @@ std::string_view trimmed(std::string_view text) {
   return text;
 }
 
-/// A number in all of the text, with at most one sign.
+/// The number that the whole text is, with at most one sign.
 template <class Number, class... Format>
 std::errc parse(std::string_view text, Number& number, Format... format) {
   if (text.starts_with('+')) {
@@ -93,7 +93,7 @@ struct ParserDeleter {
 };
 using Parser = std::unique_ptr<std::remove_pointer_t<XML_Parser>, ParserDeleter>;
 
-/// The reading of one document.
+/// Reads one document.
 ///
 /// The parser hands out text in pieces of its own copy of the input. Where the pieces of a text follow one another
 /// there, as they nearly always do, the text is taken from the input itself. What has been read of the open containers
@@ -237,7 +237,7 @@ void XMLReader::fail(ErrorCode code, const std::string& description) {
 void XMLReader::start(const char* name) {
   Element element = elementNamed(name);
   if (element == Element::none) return fail(ErrorCode::malformed, "no element is named " + quoted(name));
-  if (_leaf != Element::none) return fail(ErrorCode::malformed, "an element inside of one that holds text only");
+  if (_leaf != Element::none) return fail(ErrorCode::malformed, "an element inside one that holds text only");
   if (_open.empty() != (element == Element::plist)) {
     return fail(ErrorCode::malformed, "<plist> must be the outermost element and no other");
   }
@@ -380,35 +380,35 @@ Value XMLReader::integer(std::string_view text) {
   if (result == std::errc::result_out_of_range) {
     fail(ErrorCode::outOfRange, "the integer " + quoted(text) + " is beyond 64 bits");
   } else {
-    fail(ErrorCode::malformed, quoted(text) + " is no integer");
+    fail(ErrorCode::malformed, quoted(text) + " is not an integer");
   }
   return {};
 }
 
 Value XMLReader::real(std::string_view text) {
   double number = 0;
-  // What is not a number may carry a payload for the parser below, but not here.
+  // A NaN may carry a payload for the parser below, but not here.
   bool payload = text.ends_with(')');
   std::errc result = payload ? std::errc::invalid_argument : plist::parse(text, number);
   if (result == std::errc()) return Value(number);
   if (result == std::errc::result_out_of_range) {
     fail(ErrorCode::outOfRange, "the real " + quoted(text) + " is beyond what a real can be");
   } else {
-    fail(ErrorCode::malformed, quoted(text) + " is no real");
+    fail(ErrorCode::malformed, quoted(text) + " is not a real");
   }
   return {};
 }
 
 Value XMLReader::date(std::string_view text) {
   if (auto date = platform::dateFromText(text)) return Value(*date);
-  fail(ErrorCode::malformed, quoted(text) + " is no date of the form YYYY-MM-DDThh:mm:ssZ");
+  fail(ErrorCode::malformed, quoted(text) + " is not a date of the form YYYY-MM-DDThh:mm:ssZ");
   return {};
 }
 
 Value XMLReader::data(std::string_view text) {
   std::optional<std::size_t> size = base64Bytes(text);
   if (!size) {
-    fail(ErrorCode::malformed, "<data> that is no base64");
+    fail(ErrorCode::malformed, "<data> that is not base64");
     return {};
   }
   char* bytes = _builder.allocateText(*size);

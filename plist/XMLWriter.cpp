@@ -201,7 +201,7 @@ bool XMLWriter::write(Sink& sink, const Value& value, std::size_t depth) {
       addInteger(sink, value);
       return true;
     case Value::Kind::real:
-      // The sign of what is not a number says nothing.
+      // The sign of a NaN says nothing.
       addNumber(sink, "<real>", std::isnan(*value.real()) ? std::abs(*value.real()) : *value.real(), "</real>\n");
       return true;
     case Value::Kind::string:
@@ -219,7 +219,7 @@ bool XMLWriter::write(Sink& sink, const Value& value, std::size_t depth) {
         sink.add("</date>\n");
         return true;
       }
-      return fail(failure(ErrorCode::outOfRange, "a date outside of the years 1 to 9999"));
+      return fail(failure(ErrorCode::outOfRange, "a date outside the years 1 to 9999"));
     case Value::Kind::array:
       return writeArray(sink, *value.array(), depth);
     case Value::Kind::dictionary:

@@ -21,7 +21,7 @@ class AppsClient::CoordinatedRestore {
   void sayBeginning() const;
   void sayEnd(bool prepared) const;
   bool prepare();
-  /// Metadata and coordinator; false when one of them is not to be had.
+  /// Metadata and coordinator; false when either cannot be had.
   bool acquire();
   bool storeDeliversPackage();
   bool addUserDataPromise();

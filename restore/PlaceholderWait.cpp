@@ -49,7 +49,7 @@ void AppsClient::_waitForPlaceholderInstalls() {
     const auto deadline = _platform.clock.now() + std::chrono::seconds(seconds);
     say(_platform, "Will wait for %lld seconds for %lld placeholders to install", seconds,
         _restoringPlaceholderCount.load());
-    // Outside the queue: the reports it waits for run there.
+    // Outside the queue, on which the reports run that it waits for.
     _restorePlaceHoldersWaitGroup.wait(_platform.clock, deadline);
   });
   SerialQueue::Block block(_restoreQueue);

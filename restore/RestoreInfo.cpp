@@ -60,7 +60,7 @@ void fileRestoreListAway(const Platform& platform) {
 }  // namespace
 
 bool AppsClient::reconcileRestoreOfType(std::int32_t type, ErrorRef* error) {
-  // Nobody calls a second time, so each piece is done whatever became of the one before.
+  // There is no second call, so each piece is done whatever became of the one before.
   say(_platform, "reconcileRestoreOfType %d", type);
   contained(_platform, "_notifyPanello", [this] { _notifyPanello(_platform, true); });
   contained(_platform, "createDirectory", [this] { _platform.fileSystem.createDirectory(pluginDirectory, true, {}); });

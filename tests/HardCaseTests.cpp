@@ -77,7 +77,7 @@ TEST(HardCases, ARestoreStateThatCannotBeReadNowIsKept) {
       "<plist><dict><key>app.b</key><true/><key>app.b</key><true/></dict></plist>",
       "<?xml version='1.0' encoding='x-no-such'?><plist><dict/></plist>",
       "bplist01 of a later day",
-      // A UID, which is no value of ours.
+      // a UID, which has no value here.
       Bytes("bplist00\xd1\x01\x02\x51"
             "a\x80\x01\x08\x0b\x0d\0\0\0\0\0\0\x01\x01\0\0\0\0\0\0\0\x03\0\0\0\0\0\0\0\0\0\0\0\0\0\0\0\x0f",
             8 + 3 + 2 + 2 + 3 + 32),

@@ -226,7 +226,7 @@ TEST(PropertyList, RefusesBinary) {
       {binary({"\xa1\0"s}), malformed, "contains itself"},
       {binary({"\xd1\1\2", "\x51k", "\xa1\0"s}), malformed, "contains itself"},
       {binary({"\xa1\5"}), malformed, "byte 9: a reference to object 5 of 1"},
-      {binary({"\xd1\1\1", "\x09"}), malformed, "no string"},
+      {binary({"\xd1\1\1", "\x09"}), malformed, "not a string"},
       {binary({"\xd2\1\1\2\2", "\x51k", "\x09"}), duplicateKey, "\"k\""},
       {binary({"\xd2\1\2\3\3", "\x51k", "\x61\0k"s, "\x09"}), duplicateKey, "\"k\""},
       {binary(nineKeys), duplicateKey, "\"a\""},

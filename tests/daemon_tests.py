@@ -164,7 +164,7 @@ class Stops(Folder):
         run.send_signal(signal.SIGINT)
         out, _ = run.communicate(timeout=60)
         self.assertEqual(run.returncode, CANCELLED)
-        self.assertIn("stopped while the host's files were taken", json.loads(out)["error"]["message"])
+        self.assertIn("stopped while the host's files were being copied", json.loads(out)["error"]["message"])
         self.assertFalse(os.path.exists("dev/fs/var/mobile/Media/PublicStaging/ApplicationSync"))
 
     def test_a_second_signal_ends_at_once(self):

@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""What can be seen of a device while another process is at work on it, and after that was killed.
+"""What can be seen of a device while another process is working on it, and after that process was killed.
 
 usage: looking_tests.py TSD [unittest arguments]
 """
@@ -74,7 +74,7 @@ class Looking(Folder):
             self.tsd("backup", "dev", code=BUSY)
             watch = subprocess.Popen([tsd_folder.TSD, "watch", "dev", "--until-idle"], stdout=subprocess.PIPE, text=True)
             self.addCleanup(watch.stdout.close)
-            self.assertIn(f"dev: process {sync.process.pid} is at work on it", watch.stdout.readline())
+            self.assertIn(f"dev: process {sync.process.pid} is working on it", watch.stdout.readline())
         finally:
             sync.kill()
         seen = watch.stdout.read()

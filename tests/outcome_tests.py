@@ -125,7 +125,7 @@ class Explanations(Folder):
     def test_after_a_restore_nobody_syncs(self):
         self.make(2)
         self.document("restore", "dev", "host", "--progress", "none")
-        self.assertIn("none is: restore 1 has left it so", self.tsd("status", "dev").stdout)
+        self.assertIn("none is: restore 1 left it so", self.tsd("status", "dev").stdout)
 
     def test_what_was_meant(self):
         self.make(2)
@@ -133,10 +133,10 @@ class Explanations(Folder):
                  ("sync dev host --inject transfr=fail", USAGE, "did you mean 'transfer'?"),
                  ("why dev com.example.nobody", FAILED, "has no kept run"),
                  ("why dev com.example.candelwell", FAILED, "did you mean 'com.example.candlewell'?"),
-                 ("why dev com.example", FAILED, "com.example: this may be com.example.candlewell, com.example.thistlefold"),
+                 ("why dev com.example", FAILED, "com.example: this may mean com.example.candlewell, com.example.thistlefold"),
                  ("why dev candlewell --run 7", FAILED, "dev: run 7 is not kept; those from 1 to 1 are"),
                  ("sync dev host --progress none --inject transfer:com.example.nobody=fail", DONE,
-                  "--inject transfer:com.example.nobody=fail: never came to its turn")]
+                  "--inject transfer:com.example.nobody=fail: its turn never came")]
         for number, (line, code, message) in enumerate(table):
             with self.subTest(line):
                 if number == 4:

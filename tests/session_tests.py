@@ -204,8 +204,8 @@ class Syncs(Folder):
         self.assertIn(f"{apps[1]}: host/Packages/{apps[1]}.pkg: No such file", run.stdout)
         pathlib.Path("host/ApplicationsSync.plist").write_bytes(plistlib.dumps(["a text", {"operation": "install"}]))
         run = self.tsd("sync", "dev", "host", "--progress", "none", code=SOME_FAILED)
-        self.assertIn("host/ApplicationsSync.plist: entry 1 is passed over: it is not a dictionary", run.stderr)
-        self.assertIn("host/ApplicationsSync.plist: entry 2 is passed over: it has no \"identifier\"", run.stderr)
+        self.assertIn("host/ApplicationsSync.plist: entry 1 is ignored: it is not a dictionary", run.stderr)
+        self.assertIn("host/ApplicationsSync.plist: entry 2 is ignored: it has no \"identifier\"", run.stderr)
 
     def test_restrictions(self):
         apps = self.make(2)
@@ -265,15 +265,15 @@ class Explanations(Folder):
         pathlib.Path("host/ApplicationsSync.plist").write_bytes(plistlib.dumps(todo))
         decisions, places = self.plan()
         self.assertEqual(decisions, {
-            apps[0]: ("skipped", "being restored: its package is the restore's to bring", ""),
-            apps[1]: ("skipped", "being restored: its package is the restore's to bring", ""),
+            apps[0]: ("skipped", "being restored: the restore brings its package", ""),
+            apps[1]: ("skipped", "being restored: the restore brings its package", ""),
             apps[2]: ("update", "the host wants it",
                       f"{version} over {version} (the host's list says 99), the same version again"),
             apps[3]: ("removed", "the host wants it removed", ""),
             apps[4]: ("skipped", "auto demoted and not requested", ""),
             apps[5]: ("skipped", "install under way", "store download, active, loading"),
             "x/../y": ("refused", "its identifier would lead out of its folder", ""),
-            "com.example.done": ("unchanged", "nothing is to be done for its entry of the todo list", "INSTALLED")})
+            "com.example.done": ("unchanged", "its entry of the todo list asks for nothing", "INSTALLED")})
         self.assertEqual(places, self.sync("dev", "host", code=SOME_FAILED)["requested"])
         self.tsd("set", "dev", "app-removal=forbidden")
         decisions, _ = self.plan("--inject", f"setInstallOptions:{apps[2]}=fail")
@@ -291,7 +291,7 @@ class Explanations(Folder):
         story = self.document("why", "dev", apps[0])
         self.assertEqual(self.kinds(apps[0]), [["preparing", "attached", "prepared", "transferring", "transferring"]])
         self.assertNotIn("ended", story["runs"][0])
-        self.assertIn("waits for its package, which the sync is to deliver", story["install"]["waits"])
+        self.assertIn("waits for its package, which the sync will deliver", story["install"]["waits"])
         self.sync("dev", "host", "--inject", f"transfer:{apps[0]}@2=fail", "--end-phase", "failed", code=SOME_FAILED)
         self.assertEqual(self.kinds(apps[0])[1][-2:], ["transferring", "transferFailed"])
         self.assertNotIn(b"\0", pathlib.Path("dev/runs/0001-sync/calls.jsonl").read_bytes())
@@ -308,7 +308,7 @@ class Explanations(Folder):
         self.assertEqual(sorted(os.listdir("dev/runs")), [f"{number:04}-backup" for number in range(2, 22)])
         shutil.rmtree("dev/runs")
         pathlib.Path("dev/runs").write_text("no folder")
-        self.assertRegex(self.tsd("backup", "dev").stderr, says("this run is not kept whole"))
+        self.assertRegex(self.tsd("backup", "dev").stderr, says("not all of this run is kept"))
 
 
 class Restores(Folder):

@@ -17,7 +17,7 @@ class InProgressAssetQuery final : public platform::OBApplicationWorkspaceObserv
  public:
   using Identifiers = std::vector<std::string>;
 
-  /// Blocks until the registry has reported, or the time-out. Both stay nothing when it did not report in time.
+  /// Blocks until the registry has reported, or the time-out. Neither is set when it did not report in time.
   static void currentInProgressAssetIDs(const platform::Platform& platform, std::optional<Identifiers>& inProgress,
                                         std::optional<Identifiers>& restoringAssetIDs);
 

@@ -71,7 +71,7 @@ std::vector<TSAssetRef> AppsClient::OutstandingTransfers::run() {
   const auto ordered = _orderTheItems(_platform, _idsWeWant);
   resetIconScratchDirectory(_platform);
 
-  // Room beforehand: an app that is prepared stands in the answer, whatever fails.
+  // Room is made beforehand: an app that is prepared is in the answer, whatever fails.
   std::vector<TSAssetRef> transfers;
   transfers.reserve(ordered.size());
   for (const auto& candidate : ordered) {

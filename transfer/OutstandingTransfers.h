@@ -8,7 +8,7 @@
 
 namespace appsync {
 
-/// One answer to which packages the host must still send: made for the call, gone with its answer.
+/// Works out which packages the host must still send: made for one call, gone with its answer.
 class AppsClient::OutstandingTransfers {
  public:
   explicit OutstandingTransfers(AppsClient& client);

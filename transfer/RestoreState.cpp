@@ -25,8 +25,8 @@ void AppsClient::cleanRestoreStateForIdentifier(std::optional<std::string_view> 
   Value root = _platform.propertyLists.propertyListWithData(std::move(*bytes), &error);
   Dictionary* records = root.dictionary();
   if (!records) {
-    // Something else than records is somebody else's: it holds nothing of this app, and stays. So does what could not
-    // be read this time, or not by this reader.
+    // What does not hold records is somebody else's: there is nothing of this app in it, and it stays. So does what
+    // could not be read this time, or not by this reader.
     if (isNoPropertyList(root, error)) _platform.fileSystem.removeItem(restoreStatePath);
     return;
   }

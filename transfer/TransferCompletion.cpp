@@ -88,7 +88,7 @@ void AppsClient::_transferFailed(const TSAssetRef& asset, const ErrorRef& error,
   if (asset->isRestore()) return;
   say(_platform, "Uninstalling placeholder %{public}@", identifier);
   if (userCancelled) return;
-  // A failure whose reason nobody gave is one all the same: without an error the promise would be fulfilled.
+  // A failure without a reason is a failure all the same: without an error the promise would be fulfilled.
   transferCompleteForApp(asset, error ? error : cancellationReason(CancellationCode::packageUnavailable), existingApp);
 }
 

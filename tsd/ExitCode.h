@@ -9,7 +9,7 @@ enum class ExitCode : int {
   usage = 2,       // the command line
   someFailed = 3,  // some apps are not as the host wants them
   cancelled = 4,   // by a signal
-  deadline = 5,    // passed before what was waited for had come
+  deadline = 5,    // a deadline passed before everything awaited had happened
   busy = 6,        // another process holds the device
 };
 

@@ -9,16 +9,16 @@ namespace tsd {
 
 /// An option or an argument of a subcommand, as its help shows it.
 struct OptionEntry {
-  std::vector<std::string> names;  // "-o", "--output"; of an argument its name alone: "DEVICE"
-  std::string value;               // what stands for the value: "FILE"; of an argument its name; empty for a flag
+  std::vector<std::string> names;  // "-o", "--output"; of an argument only its name: "DEVICE"
+  std::string value;               // placeholder for the value: "FILE"; of an argument its name; empty for a flag
   std::string description;         // one line
-  std::vector<std::string> words;  // the values it takes, where they can be listed
+  std::vector<std::string> words;  // the values it takes, if they can be listed
   bool isArgument = false;
   bool isRequired = false;
   bool isRepeatable = false;
   bool isCommon = false;  // one that the subcommands share
 
-  /// Whether the value names something in the file system; which, its name tells.
+  /// Whether the value names something in the file system; the placeholder tells which sort.
   bool takesFile() const { return value == "FILE" || value == "SOURCE"; }
   /// Whether it names an app of the device before it, or is a rule of injection.
   bool takesApp() const { return value == "APP"; }
@@ -37,7 +37,7 @@ struct ExitCodeEntry {
   std::string meaning;
 };
 
-/// Everything that the help texts say, for what is made of it besides: manual pages and completions.
+/// Everything that the help texts say: manual pages and completions are made from it too.
 struct OptionTable {
   std::string program;
   std::string version;

@@ -14,7 +14,7 @@ using platform::ErrorRef;
 using platform::Value;
 
 namespace {
-/// What the bystander does on this thread is nobody's injection point.
+/// What the bystander does on this thread passes no injection point.
 constinit thread_local bool bystanderActs = false;
 }  // namespace
 
@@ -66,7 +66,7 @@ struct Boundary::State {
   std::string nameOf(const char* kind, const void* address, std::optional<std::weak_ptr<const void>> ownership) {
     platform::Mutex::Lock lock(objectsMutex);
     auto [entry, added] = objects.try_emplace({address, kind});
-    // An address alone may be an object's that is just going; only what owns an object can tell that it is a new one.
+    // An address alone may be that of an object just being destroyed; only its owner can tell that an object is new.
     if (added || (ownership && entry->second.gone())) entry->second.number = ++lastNumbers[kind];
     if (ownership) entry->second.ownership = std::move(ownership);
     std::string name = std::string(kind) + '#' + std::to_string(entry->second.number);
@@ -86,7 +86,7 @@ struct Boundary::State {
     }
   }
 
-  /// True when the rule is one that is carried out before the body, and has been.
+  /// True when the rule is carried out before the body, and has been.
   bool actBefore(const InjectionRule& rule) {
     switch (rule.action) {
       case InjectionRule::Action::kill:
@@ -217,7 +217,7 @@ void Boundary::finish(Visit& visit, Value result, const ErrorRef* error) {
   bool inward = visit.direction == Direction::in;
   if (_journaled && !(inward && visit.order != Order::run)) {
     CallRecord record = makeRecord(visit);
-    // Those of a call into the plug-in stand in its first record.
+    // The arguments of a call into the plug-in are in its first record.
     record.arguments = inward ? Value::makeDictionary() : std::move(visit.arguments);
     record.argumentNames = std::move(visit.argumentNames);
     record.result = std::move(result);

@@ -59,7 +59,7 @@ class CallArgument {
   template <HasObjectKind T>
   CallArgument(const char* name, const std::shared_ptr<T>& value)
       : name(name), kind(Kind::shown), pointer(&value), show(showAs<std::shared_ptr<T>>) {}
-  /// Texts, or such objects.
+  /// A list of texts, or of such objects.
   template <class T>
   CallArgument(const char* name, const std::vector<T>& value)
       : name(name), kind(Kind::shown), pointer(&value), show(showAs<std::vector<T>>) {}
@@ -98,10 +98,10 @@ struct Crossing {
   const char* service;
   const char* operation;
   std::string_view app{};
-  /// A message or a transaction record. It makes nothing happen, so it lets no held event go: what a caller does
-  /// about the call before must not depend on whether somebody listens.
+  /// A message or a transaction record. It makes nothing happen, so it releases no held event: what follows from
+  /// the call before must not depend on whether somebody listens.
   bool isMessage = false;
-  /// A text result is bytes; the journal shows their count.
+  /// A text result stands for bytes; the journal shows their count.
   bool answersBytes = false;
 };
 
@@ -110,29 +110,29 @@ struct CallRecord {
   std::uint64_t number = 0;           // increases by one
   std::chrono::microseconds began{};  // when the call began; of the second record of a call into the plug-in too
   std::chrono::microseconds
-      time{};  // when the record was made; both since the boundary was, and `time` never goes back
+      time{};  // when the record was made; both count from the making of the boundary, and `time` never goes back
   std::string thread;
   std::string service;
   std::string operation;
   std::string app;
-  platform::Value arguments;               // a dictionary; without those that are absent
+  platform::Value arguments;               // a dictionary, without the absent ones
   std::vector<const char*> argumentNames;  // of all of them, in order
   platform::Value result;                  // absent for none
   platform::ErrorRef error;                // absent for none
   bool end = false;                        // the return of a call into the plug-in
 };
 
-/// How much of arguments and results a listener of the journal needs. `brief`: long lists stand as their length and
+/// How much of arguments and results a listener of the journal needs. `brief`: long lists are shown as their length and
 /// long texts are cut (see `sketchOf`), so that a record costs the same however much the call was about.
 enum class JournalDetail : std::uint8_t { brief, whole };
 
-/// Gets every record, in the order of its numbers; called under the journal's own lock, must not call back.
+/// Gets every record, in the order of the numbers; called under the journal's own lock, must not call back.
 struct JournalListener {
   std::function<void(const CallRecord&)> hear;
   JournalDetail detail = JournalDetail::whole;  // at least
 };
 
-/// The one wrapper that every call runs through that crosses between the plug-in and the device, in either direction:
+/// The one wrapper around every call that crosses between the plug-in and the device, in either direction:
 /// services' operations and queries, daemon calls, callbacks, log and transaction records, file operations; not the
 /// facts of a proxy. It tells the call journal's listeners, if any, applies injection rules, and releases held-back
 /// events. With nobody listening and no rules it costs a few nanoseconds. From any thread.
@@ -148,15 +148,15 @@ struct JournalListener {
 /// - the others: the bystander acts, then the body runs.
 ///
 /// An operation that reports its failure through a completion handler passes an error of its own here and lets the body
-/// answer true: on false the body did not run, and the completion is to get that error.
+/// answer true: on false the body did not run, and the completion gets that error.
 class Boundary {
  public:
   /// Carries out what somebody else does at this moment (cancel, prioritize, uninstall, store). Rules do not apply to
   /// what it does itself.
   using Bystander = std::function<void(InjectionRule::Action action, const std::string& target)>;
 
-  /// Why the device's owner wants a call of the plug-in declined, which then fails as by the rule `fail`, with that
-  /// error; absent when it does not. Not asked about messages. From any thread.
+  /// Why the device's owner wants a call of the plug-in declined: it then fails as by the rule `fail`, with that error.
+  /// Absent when it goes ahead. Not asked about messages. From any thread.
   using Decliner = std::function<platform::ErrorRef(std::string_view service, std::string_view operation)>;
 
   /// `clock`, which outlives the boundary, times the records; without one they carry no times.
@@ -166,17 +166,17 @@ class Boundary {
   /// All set before the first call.
   void addJournal(JournalListener listener);
   void setRules(std::vector<InjectionRule> rules);
-  /// The rules that had no effect as their match has not come, but for those about steps.
+  /// The rules that had no effect because their match never came, except those about steps.
   std::vector<InjectionRule> idleRules() const;
   void setBystander(Bystander bystander);
   void setDecliner(Decliner decliner);
   bool hasJournal() const noexcept { return _journaled; }
-  /// Whether lists and texts stand in the records whole.
+  /// Whether the records show lists and texts whole.
   bool showsWhole() const noexcept { return _showsWhole; }
 
   /// A call from the plug-in to a service. `body` does the work and answers; `error` is the operation's error
-  /// out-parameter (or null), read after the body for the journal. What a failed call answers is by default false,
-  /// absent, null or 0; else `failure`, which is that answer or makes it. An answer by reference cannot fail.
+  /// out-parameter (or null), read after the body for the journal. A failed call answers false, absent, null
+  /// or 0 by default, otherwise `failure`, which is that answer or makes it. An answer by reference cannot fail.
   template <class Body>
   auto call(const Crossing& crossing, platform::ErrorRef* error, CallArguments arguments, Body&& body)
       -> std::invoke_result_t<Body> {
@@ -191,8 +191,8 @@ class Boundary {
     return watched({Direction::out, crossing}, error, arguments, body, failure);
   }
 
-  /// A call into the plug-in: a daemon call or a callback. Two records, at its begin and at its end; `error` as above.
-  /// A rule `none`, `fail` or `value` keeps it from being delivered, without a record.
+  /// A call into the plug-in: a daemon call or a callback. Two records, one at its beginning and one at its end;
+  /// `error` as above. A rule `none`, `fail` or `value` keeps it from being delivered, without a record.
   template <class Body>
   auto enter(const Crossing& crossing, CallArguments arguments, Body&& body) -> std::invoke_result_t<Body> {
     return enter(crossing, nullptr, arguments, body);
@@ -207,8 +207,8 @@ class Boundary {
     return watched({Direction::in, crossing}, error, arguments, body, NoAnswer{});
   }
 
-  /// A chunk of a package on its way: the point "transfer". What `kill` and the bystander do is done here; any other
-  /// action that a rule orders is answered, for the caller to carry out.
+  /// A chunk of a package on its way: the point "transfer". `kill` and the bystander's actions are carried out here;
+  /// any other action that a rule orders is answered, for the caller to carry out.
   std::optional<InjectionRule> atTransfer(std::string_view app);
 
   /// The error of a call that is declined, and whether an error is one.
@@ -230,7 +230,7 @@ class Boundary {
   struct NoAnswer {};
   enum class Direction : std::uint8_t { out, in };
   enum class Order : std::uint8_t { run, fail, none, value };
-  /// One call that somebody watches, from before its body until after it.
+  /// One call that is watched, from before its body until after it.
   struct Visit {
     Direction direction;
     const Crossing& crossing;
@@ -247,7 +247,7 @@ class Boundary {
   /// Finds out what the rules order, lets the bystander act, and keeps the arguments as they are before the body.
   void begin(Visit& visit, CallArguments arguments);
   void settleError(const Visit& visit, platform::ErrorRef* error) const;
-  /// Writes the record and does what is left to be done after it.
+  /// Writes the record and does what is left to do after it.
   void finish(Visit& visit, platform::Value result, const platform::ErrorRef* error);
   static CallRecord makeRecord(const Visit& visit);
   static platform::ErrorRef injectedError(const Crossing& crossing);

@@ -20,7 +20,7 @@ bool DeviceServiceBoundary::respondsToPrioritizeAsset() const {
 void DeviceServiceBoundary::prioritizeAsset(const platform::TSAssetRef& asset,
                                             std::function<void(platform::ErrorRef)> completion) {
   auto app = identifier(asset);
-  // The completion comes on a thread of the daemon's, and crosses in its turn.
+  // The completion comes on a thread of the daemon, and crosses the boundary in its turn.
   auto crossing = [this, app, completion = std::move(completion)](platform::ErrorRef error) {
     if (!completion) return;
     _boundary.enter({"AppsClient", "prioritizeCompletion", app}, {{"error", error}}, [&] { completion(error); });

@@ -10,8 +10,8 @@
 
 namespace device {
 
-/// The daemon's device service as the plug-in reaches it: what the device's owner gave, behind the boundary. Without
-/// one, a service that has neither operation; and it lacks those that the device's settings say it lacks.
+/// The daemon's device service as the plug-in reaches it: the one of the device's owner, behind the boundary. Without
+/// one it has neither operation; and it lacks those that the device's settings take away.
 class DeviceServiceBoundary final : public platform::TSDeviceService {
  public:
   using Setting = std::function<std::string(std::string_view key)>;

@@ -9,7 +9,7 @@
 namespace device {
 
 namespace {
-/// Of the step that this thread takes.
+/// About the step that this thread takes.
 constinit thread_local std::uint64_t number = 0;
 }  // namespace
 

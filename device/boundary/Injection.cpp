@@ -166,7 +166,7 @@ static_assert([] {
   return true;
 }());
 
-/// The classes of promises share their operations; each may be named.
+/// The classes of promises share their operations; a rule may name any of them.
 std::string_view declaringClass(std::string_view service) {
   bool isPromise = service == "RVPromisedTransferToPath" || service == "RVPromisedOutOfBandTransfer";
   return isPromise ? "RVPromise" : service;
@@ -198,18 +198,18 @@ bool parseNumber(std::string_view text, Number& number) {
 
 std::string quoted(std::string_view text) { return '"' + std::string(text) + '"'; }
 
-/// A step is no app's. It is taken under guards that whoever acts for somebody else would wait for.
+/// A step belongs to no app. It is taken under guards for which a bystander would have to wait.
 std::string checkStep(const InjectionRule& rule) {
   if (!isAboutSteps(rule)) return {};
-  if (!rule.app.empty()) return "a step is no app's";
-  if (!rule.target.empty()) return "nobody acts at a step";
+  if (!rule.app.empty()) return "a step belongs to no app";
+  if (!rule.target.empty()) return "nobody else can act at a step";
   bool isErrorNumber = rule.number > 0 && rule.number < 4096;
   if (rule.action == InjectionRule::Action::value && !isErrorNumber)
     return "the value of a step is the number of an error";
   return {};
 }
 
-/// Empty when all is well, else what is wrong.
+/// Empty when all is well, otherwise what is wrong.
 std::string parsePlace(std::string_view place, InjectionRule& rule) {
   if (auto at = place.rfind('@'); at != place.npos) {
     auto match = place.substr(at + 1);
@@ -221,11 +221,11 @@ std::string parsePlace(std::string_view place, InjectionRule& rule) {
   }
   if (auto colon = place.find(':'); colon != place.npos) {
     rule.app = place.substr(colon + 1);
-    if (rule.app.empty()) return "no app after the colon";
+    if (rule.app.empty()) return "there is no app after the colon";
     place = place.substr(0, colon);
   }
   rule.point = place;
-  if (place.empty()) return "no point";
+  if (place.empty()) return "there is no point before the action";
   return isInjectionPoint(place) ? std::string() : "there is no point " + quoted(place);
 }
 
@@ -287,7 +287,7 @@ bool InjectionRule::matches(std::string_view service, std::string_view operation
   std::string_view rest = point;
   if (rest.size() < operation.size() || rest.substr(rest.size() - operation.size()) != operation) return false;
   rest.remove_suffix(operation.size());
-  // A message's level is no operation's name: the accessor `error` is not every error message.
+  // The level of a message is not an operation: the accessor `error` does not stand for every error message.
   if (rest.empty()) return service != "log";
   if (rest.back() != '.') return false;
   rest.remove_suffix(1);

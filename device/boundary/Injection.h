@@ -24,7 +24,7 @@ struct InjectionRule {
     none,        // absent without error; a callback: not delivered
     value,       // answers `number`
     kill,        // the process dies as by SIGKILL before the effect
-    killAfter,   // … after the effect
+    killAfter,   // the same after the effect
     cancel,      // somebody cancels `target`'s coordinator at this moment
     prioritize,  // somebody asks for `target` first
     uninstall,   // the person removes `target`
@@ -40,13 +40,13 @@ struct InjectionRule {
   bool onwards = false;     // every match from the N-th on
   std::string text{};       // as it was given
 
-  /// Whether the rule is about calls of this operation for this app (empty: for none).
+  /// Whether the rule is about calls of this operation for this app (empty: the call is about no app).
   bool matches(std::string_view service, std::string_view operation, std::string_view app) const;
 
   /// Whether the rule takes effect at its match of that number, counted from 1.
   bool isDue(std::uint64_t number) const { return match == 0 || number == match || (onwards && number > match); }
 
-  /// Nothing, with an error that names the place, when the text is no rule or names an unknown point or action.
+  /// Nothing, with an error that names the place, when the text is not a rule or names an unknown point or action.
   static std::optional<InjectionRule> parse(std::string_view text, platform::ErrorRef* error = nullptr);
 };
 

@@ -14,13 +14,13 @@ namespace device {
 void appendJournalLine(std::string& line, const CallRecord& record);
 std::string journalLine(const CallRecord& record);
 
-/// A line of the journal read again; nothing when it is none. The record has no argument names and no time of its
-/// begin.
+/// The record that a line of the journal holds; nothing when the text is not such a line. The record has no argument
+/// names, and no time at which the call began.
 std::optional<CallRecord> parseJournalLine(std::string_view line);
 
 /// JSON text of a property-list value: data as its count of bytes, dates as ISO 8601; `indent` below 0 for one line.
 std::string jsonText(const platform::Value& value, int indent = -1);
-/// A property-list value of JSON text, null as absent; absent for what is no JSON, too.
+/// A property-list value of JSON text, null as absent; absent also for text that is not JSON.
 platform::Value valueOfJson(std::string_view text);
 
 }  // namespace device

@@ -17,7 +17,7 @@
 namespace device {
 
 /// An error as the journal shows it: a dictionary of "domain", "code", "description" and "underlying", the last two
-/// where there are any; absent for none.
+/// if there are any; absent for no error.
 platform::Value journalValueOfError(const platform::ErrorRef& error);
 
 /// A value with long lists as their length ("[5000 elements]") and long texts cut, data as its count of bytes; small
@@ -37,8 +37,8 @@ platform::Value shownValue(Names& names, const platform::Value& value) {
 }
 
 /// How the journal shows results and arguments, by their type. `names` gives objects their names
-/// (`Boundary::nameOfObject`) and tells whether lists and texts are shown whole. A type that is none of these is shown
-/// as absent.
+/// (`Boundary::nameOfObject`) and tells whether lists and texts are shown whole. Any other type is shown as
+/// absent.
 template <class Names, class T>
 platform::Value journalValue([[maybe_unused]] Names& names, [[maybe_unused]] const T& value,
                              [[maybe_unused]] bool textIsBytes = false) {

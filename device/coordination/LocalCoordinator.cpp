@@ -106,7 +106,7 @@ bool LocalCoordinator::setUserDataPromise(const std::shared_ptr<platform::RVProm
     if (!ours) return fail(error, notOurs(app, "user-data promise"));
     auto attach = [&](CoordinatorRecord& record) {
       if (record.userData)
-        return fail(error, coordinationError(CoordinationError::alreadySet, app + " has a user-data promise already"));
+        return fail(error, coordinationError(CoordinationError::alreadySet, app + " already has a user-data promise"));
       record.userData = ours->record;
       return true;
     };

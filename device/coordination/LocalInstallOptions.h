@@ -10,7 +10,7 @@
 
 namespace device {
 
-/// Install options in the making; a coordinator takes what they are when they are handed to it.
+/// Install options in the making; a coordinator copies them when they are handed to it.
 class LocalInstallOptions final : public platform::CVInstallOptions {
  public:
   explicit LocalInstallOptions(Boundary& boundary) : _boundary(boundary) {}

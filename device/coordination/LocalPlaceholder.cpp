@@ -31,10 +31,10 @@ bool LocalPlaceholder::take(Coordinator& coordinator, PlaceholderRecord& record,
     return fail(error, coordinationError(CoordinationError::ended, "the placeholder of " + _app + " is cancelled"));
   if (!_coordinator.expired())
     return fail(error, coordinationError(CoordinationError::alreadySet,
-                                         "the placeholder of " + _app + " is attached to a coordinator already"));
+                                         "the placeholder of " + _app + " is already attached to a coordinator"));
   record = _record;
   icon = _icon;
-  // It is known from the beginning who is to end should the placeholder be cancelled while its files are written.
+  // Set from the beginning: a placeholder cancelled while its files are written has to end the right coordinator.
   _coordinator = coordinator.weak_from_this();
   return true;
 }
@@ -58,7 +58,7 @@ bool LocalPlaceholder::change(ErrorRef* error, Edit&& edit) {
     return fail(error, coordinationError(CoordinationError::ended, "the placeholder of " + _app + " is cancelled"));
   if (_record.configured)
     return fail(error,
-                coordinationError(CoordinationError::ended, "the placeholder of " + _app + " is configured already"));
+                coordinationError(CoordinationError::ended, "the placeholder of " + _app + " is already configured"));
   edit(_record, _icon);
   return true;
 }
@@ -118,7 +118,7 @@ bool LocalPlaceholder::cancelForReason(const ErrorRef& reason, platform::RVClien
       _cancelled = true;
       coordinator = _coordinator.lock();
     }
-    // What the home screen shows is the install's; it goes with it.
+    // What the home screen shows belongs to the install and goes with it.
     return !coordinator || _engine.cancel(*coordinator, reason, client, error);
   });
 }

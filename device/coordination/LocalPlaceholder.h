@@ -14,12 +14,12 @@ namespace device {
 
 class LocalTransferPromise;
 
-/// A placeholder in the making. A coordinator takes what it is when it is attached.
+/// A placeholder in the making. A coordinator copies it when it is attached.
 class LocalPlaceholder final : public platform::RVPlaceholder {
  public:
   LocalPlaceholder(InstallEngine& engine, Boundary& boundary, PlaceholderRecord record);
 
-  /// What it is now becomes the coordinator's placeholder. Once, but for attempts that fail.
+  /// Makes the placeholder as it is now the coordinator's. Succeeds once; failed attempts may be repeated.
   bool attachTo(Coordinator& coordinator, platform::ErrorRef* error);
 
   bool setIconPromise(const std::shared_ptr<platform::RVPromisedTransferToPath>& promise,
@@ -36,7 +36,7 @@ class LocalPlaceholder final : public platform::RVPlaceholder {
  private:
   bool take(Coordinator& coordinator, PlaceholderRecord& record, std::shared_ptr<LocalTransferPromise>& icon,
             platform::ErrorRef* error) EXCLUDES(_mutex);
-  /// Runs `edit` on the record, unless nothing may be changed any more.
+  /// Runs `edit` on the record, unless it may no longer be changed.
   template <class Edit>
   bool change(platform::ErrorRef* error, Edit&& edit) EXCLUDES(_mutex);
 

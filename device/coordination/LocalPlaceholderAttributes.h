@@ -10,7 +10,7 @@
 
 namespace device {
 
-/// Placeholder attributes in the making; a placeholder takes what they are when they are handed to it.
+/// Placeholder attributes in the making; a placeholder copies them when they are handed to it.
 class LocalPlaceholderAttributes final : public platform::RVPlaceholderAttributes {
  public:
   struct Facts {
@@ -19,7 +19,7 @@ class LocalPlaceholderAttributes final : public platform::RVPlaceholderAttribute
     bool launchProhibited = false;
   };
 
-  /// What the manifest says goes, until it is set otherwise.
+  /// The manifest's values hold until others are set.
   LocalPlaceholderAttributes(Boundary& boundary, const platform::Value& manifest) : _boundary(boundary) {
     if (!manifest.dictionary()) return;
     _facts.manifest = manifest;

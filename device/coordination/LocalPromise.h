@@ -11,10 +11,10 @@
 
 namespace device {
 
-/// The app whose piece a promise of this name is: the name without its last "-" and what follows.
+/// The app that a promise of this name belongs to: the name without its last "-" and what follows.
 std::string_view appOfPromise(std::string_view name);
 
-/// A handle onto a promise. `Interface` is the sort of promise it is.
+/// A handle onto a promise. `Interface` says which sort of promise.
 template <class Interface>
 class LocalPromise : public Interface {
  public:

@@ -27,7 +27,7 @@ const char* currentThreadName() { return threadName; }
 ThreadName::ThreadName(const std::string& name) : _name(name), _previous(threadName) { threadName = _name.c_str(); }
 ThreadName::~ThreadName() { threadName = _previous; }
 
-/// Held events may be let go by a thread that knows nothing of the queue's life.
+/// A thread that releases held events may know nothing of the queue's life.
 struct EventQueue::Door {
   explicit Door(EventQueue* queue) : queue(queue) {}
 
@@ -40,7 +40,7 @@ struct EventQueue::Door {
   }
 };
 
-/// What one thread holds back, in the order in which it was posted. A thread that ends lets it go.
+/// What one thread holds back, in the order in which it was posted. The end of the thread releases it.
 struct EventQueue::HeldEvents {
   struct Held {
     std::shared_ptr<Door> door;

@@ -35,7 +35,7 @@ class EventQueue {
     InsideCall(const InsideCall&) = delete;
     InsideCall& operator=(const InsideCall&) = delete;
   };
-  /// While it lives the calling thread acts for somebody else, whatever call it is inside of: it posts directly.
+  /// While it lives the calling thread acts for somebody else, whatever call it is inside: it posts directly.
   class OutsideCall {
    public:
     OutsideCall() noexcept : _depth(_thread.callDepth) { _thread.callDepth = 0; }
@@ -52,10 +52,10 @@ class EventQueue {
   EventQueue(const EventQueue&) = delete;
   EventQueue& operator=(const EventQueue&) = delete;
 
-  /// From any thread; never runs the event inside.
+  /// From any thread; never runs the event itself.
   void post(Lane lane, Event event);
 
-  /// Lets go what the calling thread held back.
+  /// Releases what the calling thread held back.
   static void release() {
     if (_thread.holds) releaseHeld();
   }
@@ -67,7 +67,7 @@ class EventQueue {
   /// Returns when every event posted so far, and whatever they posted, has run (and nothing is held back by this
   /// thread). Never called from an event.
   virtual void drain() = 0;
-  /// No event runs afterwards; what is pending is dropped. Idempotent. Waits for running events, but not when called
+  /// No event runs afterwards; what is pending is dropped. Idempotent. Waits for running events, unless it is called
   /// from one.
   virtual void stop() = 0;
 
@@ -76,7 +76,7 @@ class EventQueue {
  protected:
   /// False, with the event untouched, once the queue has stopped.
   virtual bool enqueue(Lane lane, Event& event) = 0;
-  /// Last thing a queue does before its own parts go: threads that still hold events drop them from here on.
+  /// The last thing a queue does before its parts are destroyed: threads that still hold events drop them from here on.
   void close();
 
  private:
@@ -97,7 +97,7 @@ class EventQueue {
 /// One thread per lane and the real clock.
 std::unique_ptr<EventQueue> makeThreadedEventQueue();
 
-/// Driven by hand, with a virtual clock: nothing runs until it is told to, or until somebody waits on the clock.
+/// Driven by hand, with a virtual clock: nothing runs until it is told to or somebody waits on the clock.
 /// A wait delivers pending events until its condition holds; with none left the clock jumps to the deadline.
 /// `deliver…` runs the event on the calling thread, which is the lane's thread meanwhile.
 class ManualEventQueue : public EventQueue {
@@ -105,19 +105,19 @@ class ManualEventQueue : public EventQueue {
   /// Chooses which of `count` lanes that have something pending goes next; answers an index below `count`.
   using Chooser = std::function<std::size_t(std::size_t count)>;
 
-  /// The default order is first come first served over all lanes.
+  /// By default the event posted first is delivered first, over all lanes.
   virtual void setChooser(Chooser chooser) = 0;
   virtual std::size_t pending() const = 0;
   /// False when nothing is pending.
   virtual bool deliverNext() = 0;
   /// False when the lane has nothing pending.
   virtual bool deliverNext(Lane lane) = 0;
-  /// Also what the events post; the count of events run.
+  /// With everything that the events post; answers how many events ran.
   virtual std::size_t deliverAll() = 0;
 };
 std::unique_ptr<ManualEventQueue> makeManualEventQueue();
 
-/// The journal's name of the calling thread: "daemon" unless it is a lane's or was named.
+/// The calling thread's name in the journal: "daemon" unless it is a lane's or was named.
 const char* currentThreadName();
 /// Names the calling thread for the journal for the life of the object ("transfer-1").
 class ThreadName {

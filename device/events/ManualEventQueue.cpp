@@ -71,7 +71,8 @@ class HandDrivenQueue final : public ManualEventQueue {
   }
 
   void stop() override {
-    std::array<std::deque<Posted>, laneCount> dropped;  // goes when no lock is held: events own what they will call
+    std::array<std::deque<Posted>, laneCount>
+        dropped;  // destroyed when no lock is held: events own what they will call
     Lock lock(_mutex);
     _stopped = true;
     for (std::size_t i = 0; i < laneCount; ++i) dropped[i].swap(_lanes[i].pending);
@@ -132,7 +133,7 @@ class HandDrivenQueue final : public ManualEventQueue {
     HandDrivenQueue& _queue;
   };
 
-  /// A thread that waits inside an event is none that will make anything happen by itself.
+  /// A thread that waits inside an event cannot be counted on to make anything happen.
   class Waiting {
    public:
     explicit Waiting(HandDrivenQueue& queue) : _queue(queue), _counted(countedOn == &queue) {

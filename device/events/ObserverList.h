@@ -13,12 +13,12 @@
 
 namespace device {
 
-/// Who wants to hear of something, for services that promise: an observer is held weakly and known by its address, and
+/// The observers of a service that promises this: an observer is held weakly and known by its address, and
 /// once its removal has returned, no callback to it runs or starts. A removal by the very thread that is delivering to
 /// it does not wait for itself.
 ///
 /// `Info` is what a service keeps beside each registration. An observer may be registered more than once; callbacks
-/// run without any lock of the list. Operations from any thread.
+/// run without any lock of the list. Callable from any thread.
 template <class Observer, class Info = std::monostate>
 class ObserverList {
  public:
@@ -26,7 +26,7 @@ class ObserverList {
   ObserverList(const ObserverList&) = delete;
   ObserverList& operator=(const ObserverList&) = delete;
 
-  /// An observer that has gone already is not kept.
+  /// An observer that no longer exists is not kept.
   void add(const std::weak_ptr<Observer>& observer, Info info = {}) {
     auto alive = observer.lock();
     if (!alive) return;
@@ -77,7 +77,7 @@ class ObserverList {
     return deliverIf([](const Info&) { return true; }, std::forward<Callback>(callback));
   }
 
-  /// The same for one observer, if it is registered still.
+  /// The same for one observer, if it is still registered.
   template <class Callback>
   std::size_t deliverTo(const Observer* observer, Callback&& callback) {
     std::shared_ptr<Entry> found;
@@ -139,7 +139,7 @@ class ObserverList {
       entry.running.erase(std::find(entry.running.begin(), entry.running.end(), self));
       _ended.notifyAll();
     }
-    return 1;  // the observer may go here, with no lock held
+    return 1;  // the observer may be destroyed here, with no lock held
   }
 
   platform::Mutex _mutex;

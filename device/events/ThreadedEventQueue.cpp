@@ -14,7 +14,7 @@ namespace {
 
 using Lock = platform::Mutex::Lock;
 
-/// The machine's own monotonic clock. A thread that waits lets go what it held back: it may be waiting for just that.
+/// The machine's own monotonic clock. A thread that waits releases what it held back: it may be waiting for just that.
 class SystemClock final : public platform::Clock {
  public:
   Instant now() override { return std::chrono::steady_clock::now(); }
@@ -45,7 +45,7 @@ class ThreadedEventQueue final : public EventQueue {
   }
 
   void stop() override {
-    std::array<std::deque<Event>, laneCount> dropped;  // goes when no lock is held: events own what they will call
+    std::array<std::deque<Event>, laneCount> dropped;  // destroyed when no lock is held: events own what they will call
     {
       Lock lock(_mutex);
       _stopped = true;
@@ -110,7 +110,7 @@ class ThreadedEventQueue final : public EventQueue {
   std::array<LaneState, laneCount> _lanes GUARDED_BY(_mutex);
   std::size_t _unfinished GUARDED_BY(_mutex) = 0;  // pending or running, over all lanes
   bool _stopped GUARDED_BY(_mutex) = false;
-  // Made last, as they touch all of these; their own beginning and end is the constructor's and `stop`'s.
+  // Made last, as they touch all of these; the constructor starts them and `stop` joins them.
   std::array<std::thread, laneCount> _threads GUARDED_BY(_joinMutex);
 };
 

@@ -30,12 +30,12 @@ namespace {
 
 constexpr std::size_t chunkSize = 128 * 1024;
 
-/// Numbers of owners by their names. Asking the system reads its files every time, so answers are kept: an owner's
+/// The numbers of owners by name. Asking the system reads its files every time, so answers are kept: an owner's
 /// number stays the same while a process runs.
 class OwnerNumbers {
  public:
-  /// The number that the system's `find` knows a name by; -1 for one that is absent or unknown here, which leaves the
-  /// owner as it is.
+  /// The number under which the system's `find` knows a name; -1 for a name that is absent or unknown here, which
+  /// leaves the owner as it is.
   template <class Find>
   std::uint32_t of(const Value& name, Find&& find) {
     auto text = name.string();
@@ -78,7 +78,7 @@ void applyAttributes(const DiskPlace& place, const Value& attributes) {
   uid_t owner = userNamed((*entries)[platform::FXFileOwnerAccountName]);
   gid_t group = groupNamed((*entries)[platform::FXFileGroupOwnerAccountName]);
   if (owner == static_cast<uid_t>(-1) && group == static_cast<gid_t>(-1)) return;
-  // What cannot be applied is left: the file counts, not its owner.
+  // What cannot be applied is left out: the file matters, not its owner.
   [[maybe_unused]] int ignored = ::fchownat(place.directory(), place.name(), owner, group, AT_SYMLINK_NOFOLLOW);
 }
 
@@ -101,7 +101,7 @@ int readWhole(int file, Bytes& contents) {
   struct stat status;
   if (::fstat(file, &status) != 0) return errno;
   if (static_cast<std::uint64_t>(status.st_size) > largestWholeRead) return EFBIG;
-  // One byte more than expected, so that a file that is as long as it says is read in one go.
+  // One byte more than expected, so that a file of the size it claims is read in one go.
   if (int failure = readChunk(file, static_cast<std::size_t>(status.st_size) + 1, contents)) return failure;
   Bytes more;
   while (contents.size() > static_cast<std::size_t>(status.st_size)) {
@@ -158,7 +158,7 @@ int moveBetween(const DiskPlace& from, const DiskPlace& to) {
   if (int failure = from.moveTo(to)) return failure;
   if (int failure = to.syncDirectory()) return failure;
   if (int failure = from.syncDirectory()) return failure;
-  // Where things are moved to may be a directory that was made for them.
+  // The destination may lie in a directory that was made for it.
   return to.syncDirectoryAbove();
 }
 
@@ -178,7 +178,7 @@ int copyContents(int from, const FileInWriting& to) {
 constexpr std::size_t flushesAtOnce = 8;
 
 /// Calls `flush` with each index below `count`, on up to `atOnce` threads. The first error number, after which no more
-/// are begun.
+/// calls begin.
 int flushAll(std::size_t count, std::size_t atOnce, const std::function<int(std::size_t index)>& flush) {
   std::atomic<std::size_t> next{0};
   std::atomic<int> failure{0};
@@ -199,7 +199,7 @@ int flushAll(std::size_t count, std::size_t atOnce, const std::function<int(std:
     try {
       while (others.size() + 1 < std::min(count, atOnce)) others.emplace_back(work);
     } catch (const std::system_error&) {
-      // As many as there are will do.
+      // Goes on with as many threads as there are.
     }
     work();
   }
@@ -392,7 +392,7 @@ bool DiskFileTree::syncItem(std::string_view path, ErrorRef* error) {
   }
   auto slash = path.rfind('/');
   items.push_back({std::string(slash == 0 ? "/" : path.substr(0, slash)), true});
-  // Whoever watches the steps wants the same order every time.
+  // A watch of the steps needs the same order every time.
   int failure = flushAll(items.size(), _watch ? 1 : flushesAtOnce, [&](std::size_t i) {
     return items[i].isDirectory ? flushDirectory(items[i].path) : flushFile(items[i].path);
   });

@@ -30,14 +30,14 @@ int openDirectoryAt(int parent, const char* name, int flags, FileDescriptor& dir
   if (directory.isOpen()) return 0;
   int failure = errno;
   struct stat status;
-  // The system calls a link "not a directory" here.
+  // The system reports a link as "not a directory" here.
   if (failure == ENOTDIR && ::fstatat(parent, name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISLNK(status.st_mode))
     return ELOOP;
   return failure;
 }
 
-/// The directory that a path below `root` leads to, in one call. Nothing where the system has no such call, and when it
-/// fails: the walk, name by name, tells why.
+/// The directory that a path below `root` leads to, in one call. Nothing where the system has no such call, or when it
+/// fails: the walk, name by name, then tells why.
 FileDescriptor openBelow(const FileDescriptor& root, const std::string& path) {
   struct open_how how {};
   how.flags = O_PATH | O_DIRECTORY | O_CLOEXEC;
@@ -45,7 +45,7 @@ FileDescriptor openBelow(const FileDescriptor& root, const std::string& path) {
   return FileDescriptor(static_cast<int>(::syscall(SYS_openat2, root.get(), path.c_str(), &how, sizeof how)));
 }
 
-/// A name that nothing has yet in any directory, as far as this process knows.
+/// A name not used yet in any directory, as far as this process knows.
 std::string freshTemporaryName() {
   static std::atomic<std::uint64_t> last{0};
   char name[64];
@@ -208,7 +208,7 @@ int DiskPlace::openFile(FileDescriptor& file) const {
   struct stat found;
   if (int failure = status(found)) return failure;
   if (S_ISDIR(found.st_mode)) return EISDIR;
-  // Somebody may have put something else there meanwhile, so it must neither block nor be taken for a file.
+  // Somebody may have put something else there meanwhile: opening it must neither block nor take it for a file.
   file = FileDescriptor(::openat(directory(), name(), O_RDONLY | O_NONBLOCK | O_NOFOLLOW | O_CLOEXEC));
   if (!file.isOpen()) return errno;
   if (::fstat(file.get(), &found) != 0) return errno;
@@ -251,7 +251,7 @@ int DiskPlace::moveTo(const DiskPlace& target) const {
   return takeStep(_watch, {Step::Kind::move, _path, target._path}, [&](Step&) {
     if (::renameat2(directory(), name(), target.directory(), target.name(), RENAME_NOREPLACE) == 0) return 0;
     if (errno != EINVAL && errno != ENOSYS) return errno;
-    // On a file system that cannot; not atomic towards other processes.
+    // For a file system that cannot do that; not atomic towards other processes.
     struct stat status;
     if (::fstatat(target.directory(), target.name(), &status, AT_SYMLINK_NOFOLLOW) == 0) return EEXIST;
     return ::renameat(directory(), name(), target.directory(), target.name()) == 0 ? 0 : errno;
@@ -292,7 +292,7 @@ int DiskPlace::replaceFile(const std::function<int(const FileInWriting& file)>& 
 }
 
 int DiskPlace::remove() const {
-  constexpr int attempts = 16;  // against somebody who goes on putting things in
+  constexpr int attempts = 16;  // against somebody who keeps putting things in
   if (_isRoot) return EBUSY;
   auto removeItself = [&](int flags) {
     return takeStep(_watch, {Step::Kind::remove, _path},

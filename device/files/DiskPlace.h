@@ -35,33 +35,33 @@ class DiskPlace {
 
   /// What is there: a regular file or a directory.
   int status(struct stat& status) const;
-  /// 0 when a regular file may be put there: nothing or another one is there now.
+  /// 0 when a regular file may be put there: there is nothing now, or another regular file.
   int mayHoldFile() const;
   int openFile(FileDescriptor& file) const;
   int openDirectory(FileDescriptor& directory) const;
   /// Makes the entry's presence or absence durable.
   int syncDirectory() const;
 
-  /// Makes the directory itself durable that the entry is in. Nothing for one in the root.
+  /// Makes the directory that the entry is in durable itself. Does nothing in the root.
   int syncDirectoryAbove() const;
 
   int makeDirectory() const;
-  /// A new file, open for writing; something there is EEXIST.
+  /// Makes a new file, open for writing; EEXIST if something is there.
   int createFile(bool executable, FileDescriptor& file) const;
-  /// To a place where nothing is.
+  /// The target must be free.
   int moveTo(const DiskPlace& target) const;
   /// Sets its times to now.
   int touch() const;
 
   /// Puts a new file there, in place of an older one: filled under a temporary name in the same directory, then
-  /// renamed. What is to be flushed before that, `fill` flushes. On failure nothing has changed and the temporary file
-  /// is gone.
+  /// renamed. `fill` flushes what must be durable before that. On failure nothing has changed and the temporary
+  /// file is gone.
   int replaceFile(const std::function<int(const FileInWriting& file)>& fill) const;
-  /// With everything in it. A link, or whatever else it is, goes itself.
+  /// With everything in it. Of a link, or anything else, the entry itself is removed.
   int remove() const;
 
  private:
-  /// Of the directory that the place is in.
+  /// The path of the directory that the place is in.
   std::string_view directoryPath() const;
 
   FileDescriptor _directory;
@@ -73,7 +73,7 @@ class DiskPlace {
 
 /// The names in an open directory, in no order.
 int namesInDirectory(int directory, std::vector<std::string>& names);
-/// All of it.
+/// Writes all of the bytes.
 int writeWhole(const FileInWriting& file, std::string_view bytes);
 int syncFile(const FileInWriting& file);
 /// Makes an open directory's entries durable.

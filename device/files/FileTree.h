@@ -21,11 +21,11 @@ class FileWriter {
  public:
   virtual ~FileWriter() = default;
   virtual bool write(platform::BytesView bytes, platform::ErrorRef* error = nullptr) = 0;
-  /// Flushes to disk when `durable`. Without `close` what was written stays, of unknown durability.
+  /// Flushes to disk when `durable`. Without `close` what was written stays, but nobody knows whether it is durable.
   virtual bool close(bool durable, platform::ErrorRef* error = nullptr) = 0;
 };
 
-/// A file that is being read, from its begin unless told otherwise.
+/// A file that is being read, from its beginning unless told otherwise.
 class FileReader {
  public:
   virtual ~FileReader() = default;
@@ -40,7 +40,7 @@ class FileReader {
 /// Paths are the device's absolute ones ("/var/mobile/…"). A resolver walks them component by component below the
 /// root, follows no link and refuses "..", empty names and anything that is neither a regular file nor a directory,
 /// unopened, with an error that names the path. Errors have the domain "FileSystem" and the system's error number as
-/// code. Operations from any thread.
+/// code. Callable from any thread.
 class FileTree : public platform::FileSystem {
  public:
   struct Entry {
@@ -55,9 +55,9 @@ class FileTree : public platform::FileSystem {
     platform::setError(error, nullptr);
     return createFile(path, contents, attributes);
   }
-  /// The directory's items by name, sorted; nothing on failure.
+  /// The directory's items, sorted by name; nothing on failure.
   virtual std::optional<std::vector<Entry>> list(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
-  /// A new file (something there is a failure); mode is the permission bits, of which only owner execute is kept apart.
+  /// A new file (something there is a failure); mode is the permission bits, of which only owner execute is kept.
   virtual std::unique_ptr<FileWriter> createNew(std::string_view path, bool executable,
                                                 platform::ErrorRef* error = nullptr) = 0;
   virtual std::unique_ptr<FileReader> openForReading(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
@@ -67,7 +67,7 @@ class FileTree : public platform::FileSystem {
   virtual bool syncItem(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
 };
 
-/// The prefix of the names that `writeAtomically` and the removal of a directory use on the way; leftovers are removed
+/// The prefix of the temporary names that `writeAtomically` and the removal of a directory use; leftovers are removed
 /// when a device is opened.
 constexpr std::string_view temporaryFilePrefix = ".applicationsync-";
 

@@ -19,7 +19,7 @@ struct MemoryFileTree::Node {
   bool isDirectory = false;
   bool executable = false;
   Bytes contents;
-  // In no order, so that a name is found as fast among many.
+  // Unordered, so that finding a name takes the same time among many.
   platform::TextMap<std::shared_ptr<Node>> items;
 };
 

@@ -8,7 +8,8 @@
 
 namespace device {
 
-/// A file tree that goes with the process. Attributes are accepted and have no effect; everything is durable at once.
+/// A file tree that lasts as long as the process. Attributes are accepted and have no effect; everything is durable at
+/// once.
 class MemoryFileTree final : public FileTree {
  public:
   MemoryFileTree();
@@ -33,7 +34,7 @@ class MemoryFileTree final : public FileTree {
   bool syncItem(std::string_view path, platform::ErrorRef* error) override;
 
  private:
-  /// One for the whole tree; files that are open outlive it.
+  /// One for the whole tree; shared with open files, which may outlive the tree.
   using Guard = std::shared_ptr<platform::Mutex>;
   struct Node;
   struct Place;

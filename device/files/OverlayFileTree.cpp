@@ -60,7 +60,7 @@ bool OverlayFileTree::raiseWhole(const std::string& path, ErrorRef* error) const
 std::optional<std::vector<FileTree::Entry>> OverlayFileTree::merged(const std::string& path, ErrorRef* error) const {
   std::string front = path == "/" ? path : path + '/';
   std::vector<Entry> entries;
-  // A directory in memory has hidden the one below only when that was removed or moved away.
+  // A directory in memory hides the one below only if that was removed or moved away.
   if (auto below = _below->list(path)) {
     for (auto& entry : *below) {
       if (showsBelow(front + entry.name)) entries.push_back(std::move(entry));

@@ -10,7 +10,8 @@
 namespace device {
 
 /// A file tree that looks like another one and leaves it as it is: what is changed is kept in memory, what is not is
-/// read from the tree below when it is asked for. When somebody changes that meanwhile, each file is as it is then.
+/// read from the tree below when it is asked for. When somebody changes that tree meanwhile, each file is as it is when
+/// it is read.
 class OverlayFileTree final : public FileTree {
  public:
   explicit OverlayFileTree(std::unique_ptr<FileTree> below) : _below(std::move(below)), _above(makeMemoryFileTree()) {}
@@ -37,13 +38,13 @@ class OverlayFileTree final : public FileTree {
  private:
   /// Whether the tree below shows through there.
   bool showsBelow(std::string_view path, bool* isDirectory = nullptr) const REQUIRES(_guard);
-  /// The tree that has what is to be seen there, or can tell why nothing is.
+  /// The tree that has what is visible there, or can tell why nothing is.
   FileTree& treeOf(std::string_view path) const REQUIRES(_guard);
-  /// Copies the item there, and what it lies in, into memory, as far as they are there; without what a directory holds.
+  /// Copies the item and the directories it lies in into memory, as far as they exist, but not a directory's contents.
   bool raise(std::string_view path, platform::ErrorRef* error) const REQUIRES(_guard);
-  /// The same for what the item is to lie in.
+  /// The same for the directory that the item is to lie in.
   bool raiseParent(std::string_view path, platform::ErrorRef* error) const REQUIRES(_guard);
-  /// For a file that is to be written there: its directory, and a directory that is in its way.
+  /// For a file that is to be written there: raises its directory, and a directory that is in its way.
   bool makeWay(std::string_view path, platform::ErrorRef* error) const REQUIRES(_guard);
   bool raiseWhole(const std::string& path, platform::ErrorRef* error) const REQUIRES(_guard);
   std::optional<std::vector<Entry>> merged(const std::string& path, platform::ErrorRef* error) const REQUIRES(_guard);

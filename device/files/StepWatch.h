@@ -13,7 +13,7 @@ struct Step {
   enum class Kind : std::uint8_t {
     createDirectory,
     createFile,
-    write,          // what the body leaves in `bytes` has been written, behind what was written before
+    write,          // what the body leaves in `bytes` has been appended to what was written before
     syncFile,       // the file's content
     syncDirectory,  // the directory's entries
     move,
@@ -24,7 +24,7 @@ struct Step {
   };
 
   Kind kind;
-  std::string_view path;  // the device's; of a move, from where; empty for the store
+  std::string_view path;  // the device's; of a move, the old one; empty for the store
   std::string_view target{};
   platform::BytesView bytes{};
 };
@@ -34,10 +34,10 @@ struct Step {
 class StepWatch {
  public:
   virtual ~StepWatch() = default;
-  /// 0 when the step may happen, else the system's number of the error with which it fails. May shorten what a write
-  /// takes at once, which the writer has to notice.
+  /// 0 when the step may happen, otherwise the system's number of the error with which it fails. May shorten what one
+  /// write takes, which the writer has to notice.
   virtual int before(Step& step) = 0;
-  /// It has taken effect. What this answers, if not 0, is reported as its failure all the same.
+  /// The step has taken effect. An answer other than 0 is reported as its failure all the same.
   virtual int after(const Step& step) = 0;
 };
 

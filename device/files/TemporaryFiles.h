@@ -6,8 +6,8 @@
 
 namespace device {
 
-/// Removes what an atomic write or the removal of a directory that never came to its end left behind, in every
-/// directory of the tree. Answers how many files and directories went; one that cannot be removed stays until the next
+/// Removes what interrupted atomic writes and interrupted removals of directories left behind, in every directory of
+/// the tree. Answers how many files and directories were removed; one that cannot be removed stays until the next
 /// time.
 std::size_t removeTemporaryFiles(FileTree& files);
 

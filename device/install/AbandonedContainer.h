@@ -7,12 +7,12 @@
 
 namespace device {
 
-/// The container that no record names when a change has come to its end, one way or the other: removed with the scope.
-/// Made before the records' guard is taken, so that it goes after the guard is let go: removing takes its time, and
-/// must not come before the commit that makes the container superfluous.
+/// The container that no record names once a change has ended, one way or the other: removed at the end of the scope.
+/// Made before the records' guard is taken, so that it goes after the guard is released: removing takes time, and must
+/// not come before the commit that makes the container superfluous.
 class AbandonedContainer {
  public:
-  /// `path` is what is abandoned should nothing come of the change; empty for nothing.
+  /// `path` is abandoned if nothing comes of the change; empty for nothing.
   explicit AbandonedContainer(Containers& containers, std::string path = {})
       : _containers(containers), _path(std::move(path)) {}
   ~AbandonedContainer() {
@@ -21,7 +21,7 @@ class AbandonedContainer {
   AbandonedContainer(const AbandonedContainer&) = delete;
   AbandonedContainer& operator=(const AbandonedContainer&) = delete;
 
-  /// The change is committed: what it abandons is this (empty: nothing), and no longer what would have been.
+  /// The change is committed: it abandons this container (empty: none), and no longer the one given at first.
   void become(std::string path) { _path = std::move(path); }
 
  private:

@@ -14,7 +14,7 @@ namespace {
 constexpr std::uint64_t maximumIconBytes = std::uint64_t{16} << 20;
 constexpr std::string_view iconName = "Icon.png";
 
-/// Drawn anew for each container, so that a name is never used again. The source is slow: every bit of it is used.
+/// Drawn anew for each container, so that no name is ever used twice. The source is slow: every bit of it is used.
 std::string drawName() {
   static thread_local std::random_device source;
   constexpr char digits[] = "0123456789ABCDEF";
@@ -28,14 +28,14 @@ std::string drawName() {
   return name;
 }
 
-/// Store metadata comes from the host; what XML cannot carry is kept in the other form.
+/// Store metadata comes from the host; what XML cannot carry is kept in binary.
 std::optional<platform::Bytes> bytesOfMetadata(const platform::Value& metadata, platform::ErrorRef* error) {
   auto bytes = plist::writeXML(metadata, error);
   return bytes ? bytes : plist::writeBinary(metadata, error);
 }
 
-/// What stands for the metadata in the checksum: they may be changed while the app is a placeholder, and as whole as
-/// they were when they can be read.
+/// What stands for the metadata in the checksum: they may be changed while the app is a placeholder, and are whole
+/// whenever they can be read.
 std::optional<platform::Bytes> traceOfMetadata(bool isThere) {
   return isThere ? std::optional<platform::Bytes>("metadata") : std::nullopt;
 }

@@ -53,7 +53,7 @@ CoordinatorRef InstallEngine::coordinatorForApp(RVCoordinatorKind kind, std::str
     return nullptr;
   };
   if (!isAppIdentifier(app))
-    return refuse(CoordinationError::invalid, "no app can be called \"" + std::string(app) + '"');
+    return refuse(CoordinationError::invalid, '"' + std::string(app) + "\" cannot be an app's identifier");
   Lock lock(_records);
   if (auto found = _open.find(app)) {
     if (kind == RVCoordinatorKind::RVAppInstallCoordinator || kind == found->kind) return found;
@@ -109,16 +109,16 @@ bool InstallEngine::attachAppAsset(Coordinator& coordinator, const PromiseRef& p
   auto attach = [&](CoordinatorRecord& record) REQUIRES(recordsGuard) {
     if (record.appAsset)
       return fail(error, coordinationError(CoordinationError::alreadySet,
-                                           coordinator.app + " has an app asset promise already"));
+                                           coordinator.app + " already has an app asset promise"));
     if (promise->cancelled)
       return fail(error, coordinationError(CoordinationError::ended, promise->name + " is cancelled"));
     if (!promise->coordinator.expired())
       return fail(error, coordinationError(CoordinationError::alreadySet,
-                                           promise->name + " is attached to a coordinator already"));
+                                           promise->name + " is already attached to a coordinator"));
     record.appAsset = promise;
     return true;
   };
-  // Under one hold of the guard: a promise that is cancelled or delivered meanwhile has to find its coordinator.
+  // In one go under the guard: a promise that is cancelled or delivered meanwhile has to find its coordinator.
   Lock lock(_records);
   if (!edit(coordinator, attach, error)) return false;
   coordinator.state.appAsset = std::move(handle);
@@ -199,7 +199,7 @@ void InstallEngine::beginInstall(const CoordinatorRef& coordinator) {
     installing.progress->fraction = 1;
     changes.put(std::move(installing));
   }
-  // Should the store refuse, the install's own commit tells.
+  // If the store refuses, the install's own commit tells.
   _records.write(std::move(changes));
   coordinator->state.fractionUnsaved = false;
   _parts.events.post(Lane::coordination, [this, coordinator] {

@@ -18,11 +18,11 @@
 
 namespace device {
 
-/// What becomes of apps and coordinators: every change of theirs, by whichever service it is asked for, below the
+/// Decides what becomes of apps and coordinators: every change of them, whichever service asks for it, below the
 /// boundary. A change is one commit of the store; files come before it and go after it, so that a process that dies in
-/// between leaves nothing but files that no record names. Operations from any thread.
+/// between leaves nothing but files that no record names. Callable from any thread.
 ///
-/// What takes its time is an object of its own that lives as long as it goes on: `PlaceholderInstall`,
+/// What takes time is an object of its own that lives as long as it goes on: `PlaceholderInstall`,
 /// `PackageInstall`, `StoreInstalls`, `InstallRecovery`.
 class InstallEngine {
  public:
@@ -34,7 +34,7 @@ class InstallEngine {
 
   AppRecords& records() { return _records; }
 
-  /// Takes up what an earlier process left: see InstallRecovery. Once, before anything else.
+  /// Continues what an earlier process left: see InstallRecovery. Once, before anything else.
   void begin(AppRecords::Loaded loaded, bool recovers) EXCLUDES(recordsGuard);
   /// Writes what only memory has.
   void flush() EXCLUDES(recordsGuard);
@@ -49,7 +49,7 @@ class InstallEngine {
   /// Refused with an error when the coordinator has ended, and when `edit` answers false (with an error of its own).
   bool change(Coordinator& coordinator, const std::function<bool(CoordinatorRecord&)>& edit, platform::ErrorRef* error)
       EXCLUDES(recordsGuard);
-  /// `handle` is what answers for the promise from now on.
+  /// From now on `handle` stands for the promise.
   bool attachAppAsset(Coordinator& coordinator, const PromiseRef& promise,
                       std::shared_ptr<platform::RVPromisedTransferToPath> handle, platform::ErrorRef* error)
       EXCLUDES(recordsGuard);
@@ -65,7 +65,7 @@ class InstallEngine {
   void setFraction(PromiseRecord& promise, double fraction) EXCLUDES(recordsGuard);
   void setPath(PromiseRecord& promise, std::string_view path) EXCLUDES(recordsGuard);
   bool isComplete(const PromiseRecord& promise) EXCLUDES(recordsGuard);
-  /// Nothing before the promised piece is there.
+  /// Nothing until the promised piece is there.
   std::optional<std::string> deliveredPath(const PromiseRecord& promise) EXCLUDES(recordsGuard);
   /// The promised piece is there; an app asset's install begins, on the coordination lane.
   void deliver(PromiseRecord& promise) EXCLUDES(recordsGuard);

@@ -11,7 +11,7 @@ using platform::ErrorRef;
 
 namespace {
 
-/// What stays of the app that was there before, and of what was asked for it.
+/// What is kept of the app that was there before, and of what was asked for it.
 void keepOfExisting(AppRecord& installed, const AppRecord& existing, const CoordinatorRef& coordinator)
     REQUIRES(recordsGuard) {
   installed.applicationType = existing.applicationType;
@@ -58,7 +58,7 @@ bool recordInstalled(const InstallParts& parts, const CoordinatorRef& coordinato
 bool recordEnded(const InstallParts& parts, const CoordinatorRef& coordinator, const std::string& app,
                  const InstallEnding& ending, AbandonedContainer& abandoned, ErrorRef* error) {
   const auto* record = parts.records.state().app(app);
-  // A coordinator that never got a placeholder has changed nothing about its app.
+  // A coordinator that never got a placeholder has changed nothing of its app.
   if (coordinator && !coordinator->state.record.placeholder) record = nullptr;
   platform::OBApplicationProxyRef shown = record && record->progress ? record->proxy : nullptr;
   std::string superfluous;

@@ -12,7 +12,7 @@
 
 namespace device {
 
-/// What every install works with. Outlives them all.
+/// What every install works with. It outlives them all.
 struct InstallParts {
   AppRecords& records;
   FileTree& files;
@@ -20,7 +20,7 @@ struct InstallParts {
   OpenCoordinators& open;
   InstallReports& reports;
   EventQueue& events;
-  /// Told why an app's placeholder could not be written, as the plug-in passes over that in silence. May be null.
+  /// Told why an app's placeholder could not be written, since the plug-in ignores that silently. May be null.
   const std::function<void(const std::string& app, const platform::ErrorRef& reason)>& placeholderFailed;
 };
 

@@ -4,8 +4,9 @@
 
 namespace device {
 
-/// What an earlier process left, when a device is opened: open coordinators are there again and, if it `recovers`,
-/// interrupted installs are finished or rolled back and leftovers removed. Tells nobody. Before anything else is done.
+/// Takes up what an earlier process left when a device is opened: its open coordinators are there again and, with
+/// `recovers`, interrupted installs are finished or rolled back and leftovers removed. Reports nothing. Before all
+/// else.
 class InstallRecovery {
  public:
   explicit InstallRecovery(const InstallParts& parts) : _parts(parts) {}

@@ -13,7 +13,7 @@
 
 namespace device {
 
-/// The coordinators that are open, at most one for an app. What the store has of them is its callers' business.
+/// The coordinators that are open, at most one for an app. Storing them is the callers' business.
 class OpenCoordinators {
  public:
   /// Makes the handle of a coordinator.
@@ -26,13 +26,13 @@ class OpenCoordinators {
   std::vector<CoordinatorStatus> statuses() const REQUIRES(recordsGuard);
 
   CoordinatorRef open(CoordinatorRecord record) REQUIRES(recordsGuard);
-  /// It has ended.
+  /// The coordinator has ended.
   void close(Coordinator& coordinator) REQUIRES(recordsGuard);
 
-  /// Puts what the store has only an older progress of; false when there is nothing of the sort.
+  /// Puts the coordinators whose progress in the store is out of date; false when there are none.
   bool putUnsaved(const DeviceState& state, ChangeSet& changes) REQUIRES(recordsGuard);
 
-  /// A number that no promise has, of this process or of an earlier one's coordinators.
+  /// A number that no promise has, neither of this process nor of coordinators that an earlier one left.
   std::uint64_t newPromiseNumber() REQUIRES(recordsGuard) { return _nextPromise++; }
 
  private:

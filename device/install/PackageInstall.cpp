@@ -13,7 +13,7 @@ using Lock = AppRecords::Lock;
 
 namespace {
 
-/// The bundle's name for people: the manifest's, else its folder's.
+/// The bundle's name for people: the manifest's, otherwise its folder's.
 std::string displayName(const UnpackedPackage& package) {
   auto name = (*package.manifest.dictionary())["KBBundleDisplayName"].string();
   return name ? std::string(*name) : package.bundle.substr(0, package.bundle.size() - 4);
@@ -51,7 +51,7 @@ std::optional<AppRecord> PackageInstall::unpackInto(const std::string& container
   };
   if (!_request.app.empty() && package->identifier != _request.app)
     return refuse("the app \"" + package->identifier + "\", not \"" + _request.app + '"');
-  if (!isAppIdentifier(package->identifier)) return refuse("an app that nothing can be called by");
+  if (!isAppIdentifier(package->identifier)) return refuse("an app whose identifier cannot be used");
   auto app = recordOf(*package, container);
   const auto& metadata =
       _request.options && !_request.options->metadata.isAbsent() ? _request.options->metadata : _request.metadata;

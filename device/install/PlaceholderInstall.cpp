@@ -81,7 +81,7 @@ bool PlaceholderInstall::claim(ErrorRef* error) {
   if (state.ended) return fail(error, endedError(_coordinator->app));
   if (state.takesPlaceholder || state.record.placeholder)
     return fail(error, coordinationError(CoordinationError::alreadySet,
-                                         _coordinator->app + " has a placeholder promise already"));
+                                         _coordinator->app + " already has a placeholder promise"));
   state.takesPlaceholder = true;
   const auto* app = _parts.records.state().app(_coordinator->app);
   _isUpdate = app && !app->isPlaceholder;
@@ -105,7 +105,7 @@ bool PlaceholderInstall::put(std::optional<AppRecord> written, AbandonedContaine
     app.systemBundle = existing->systemBundle;
     app.homeOrder = existing->homeOrder;
   }
-  // A demoted app waits for the person to ask for it, so nothing is under way.
+  // A demoted app waits for the person to ask for it, so no install is running.
   bool isDemoted = _coordinator->kind == platform::RVCoordinatorKind::RVRestoringDemotedAppInstallCoordinator;
   bool hadProgress = existing && existing->progress;
   app.progress.reset();
@@ -120,7 +120,7 @@ bool PlaceholderInstall::put(std::optional<AppRecord> written, AbandonedContaine
     changes.removeCoordinator(id);
   else
     changes.put(record);
-  // What a loss of power takes of a placeholder the next sync brings again, unless older files go because of it.
+  // What a loss of power takes of a placeholder the next sync restores, unless older files are removed because of it.
   bool kept = superfluous.empty() ? _parts.records.write(std::move(changes), error)
                                   : _parts.records.commit(std::move(changes), error);
   if (!kept) return false;

@@ -8,7 +8,7 @@
 namespace device {
 
 /// The record of an app whose placeholder's files are written into a fresh container, which is the caller's to keep or
-/// to remove. Nothing, with an error, when they cannot be written.
+/// to remove. Nothing, with an error, when the files cannot be written.
 std::optional<AppRecord> writePlaceholder(const InstallParts& parts, const PlaceholderRecord& placeholder,
                                           platform::ErrorRef* error) EXCLUDES(recordsGuard);
 
@@ -23,7 +23,7 @@ class PlaceholderInstall {
   bool run(platform::ErrorRef* error) EXCLUDES(recordsGuard);
 
  private:
-  /// Whether the coordinator takes this placeholder; no other one then, until `put`.
+  /// Whether the coordinator takes this placeholder; it then takes no other until `put`.
   bool claim(platform::ErrorRef* error) REQUIRES(recordsGuard);
   /// `written` is the record of the files; nothing for an app that stays installed.
   bool put(std::optional<AppRecord> written, AbandonedContainer& abandoned, platform::ErrorRef* error)

@@ -19,7 +19,7 @@ using Lock = AppRecords::Lock;
 
 bool StoreInstalls::isBusy(const std::string& app, const StoreInstall& install, ErrorRef* error) const {
   if (!install.createsCoordinator || !_parts.open.find(app)) return false;
-  setError(error, localDeviceError(LocalDeviceError::busyApp, app + " has a coordinator already"));
+  setError(error, localDeviceError(LocalDeviceError::busyApp, app + " already has a coordinator"));
   return true;
 }
 
@@ -27,7 +27,7 @@ bool StoreInstalls::begin(std::string_view id, const StoreInstall& install, Erro
   setError(error, nullptr);
   std::string app(id);
   if (!isAppIdentifier(app))
-    return fail(error, localDeviceError(LocalDeviceError::failed, "no app can be called \"" + app + '"'));
+    return fail(error, localDeviceError(LocalDeviceError::failed, '"' + app + "\" cannot be an app's identifier"));
   bool isNew = false;
   {
     Lock lock(_parts.records);
@@ -106,7 +106,7 @@ bool StoreInstalls::finish(std::string_view id, std::string_view packagePath, Er
     if (!coordinator) request.continues = container;
     return PackageInstall(_parts, coordinator, std::move(request)).run(error);
   }
-  // A placeholder's files need not last; those of an app do.
+  // A placeholder's files need not be durable; those of an app must.
   if (isPlaceholder && !_parts.containers.sync(container, error)) return false;
   return finishAsItIs(coordinator, request.app, container, request.options, error);
 }

@@ -6,7 +6,7 @@
 
 namespace device {
 
-/// Installs of the store's own, which it begins with a registry entry and, mostly, a coordinator, and finishes with a
+/// The store's own installs, which it begins with a registry entry and, mostly, a coordinator, and finishes with a
 /// package or without one. See `LocalDevice` for what each does.
 class StoreInstalls {
  public:
@@ -18,7 +18,7 @@ class StoreInstalls {
  private:
   bool isBusy(const std::string& app, const StoreInstall& install, platform::ErrorRef* error) const
       REQUIRES(recordsGuard);
-  /// Records the app, whose placeholder's record is `written` where it was not there before.
+  /// Records the app; `written` is the record of its placeholder's files if it was not there before.
   bool record(const std::string& app, const StoreInstall& install, PlaceholderRecord placeholder,
               const AppRecord* written, platform::ErrorRef* error) REQUIRES(recordsGuard);
   /// What the placeholder's container holds becomes the app.

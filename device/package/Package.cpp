@@ -81,7 +81,7 @@ class Unpacking {
   bool unpack(struct archive_entry* entry) {
     const char* text = archive_entry_pathname_utf8(entry);
     if (!text) text = archive_entry_pathname(entry);
-    if (!text) return refuse(_last, "the one after it has a name that cannot be read");
+    if (!text) return refuse(_last, "the entry after it has a name that cannot be read");
     std::string name = text;
     _last = name;
     if (archive_entry_is_encrypted(entry)) return refuse(name, "encrypted");
@@ -144,7 +144,7 @@ class Unpacking {
     return _files.createDirectory(_directory + '/' + name, false, {}, &_reason);
   }
 
-  /// Folders count even if the archive does not list them: one long name brings many of them.
+  /// Folders count even if the archive does not list them: one long name can bring many of them.
   bool hasRoom() {
     return _seen.size() <= _limits.entries ||
            device::fail(&_reason, packageError("more than " + std::to_string(_limits.entries) + " files and folders"));
@@ -155,7 +155,7 @@ class Unpacking {
     if (!isNew) {
       if (found->second.name != name)
         return refuse(name, "differs from " + shown(found->second.name) + " in case only");
-      return refuse(name, "there twice");
+      return refuse(name, "listed twice");
     }
     if (!hasRoom()) return false;
     if (name == _result.bundle) return refuse(name, "a file where the folder should be");
@@ -218,7 +218,7 @@ std::optional<UnpackedPackage> unpackPackage(FileTree& files, std::string_view p
                                              const std::string& directory, const PackageLimits& limits,
                                              platform::ErrorRef* error) {
   try {
-    // libarchive cannot tell of a name that the thread's locale has no characters for.
+    // libarchive cannot give a name that the thread's locale has no characters for.
     const UTF8Locale utf8;
     return Unpacking(files, packagePath, directory, limits).run(error);
   } catch (const std::exception& exception) {

@@ -12,7 +12,7 @@
 
 namespace device {
 
-/// What a package may be at most. Everything is counted while it is written, whatever the archive says about itself.
+/// How large a package may be. Everything is counted while it is written, whatever the archive says about itself.
 struct PackageLimits {
   std::size_t entries = 100'000;  // of the archive; also files and folders, listed or not
   std::uint64_t totalBytes = std::uint64_t{8} << 30;
@@ -29,13 +29,12 @@ struct UnpackedPackage {
 };
 
 /// Unpacks a package, a zip archive with one "<Name>.app" folder at its top, into a directory that exists and is
-/// empty. It is not flushed. Nothing, with an error of the domain "Package"
-/// that names the package and the entry, when it is anything else than plain files and folders below that one folder,
-/// when two names differ in case only, or when a limit is passed; what has been written so far stays then, for the
-/// caller to remove.
+/// empty. Nothing is flushed. Answers nothing, with an error of the domain "Package" that names the package and the
+/// entry, when it holds anything but plain files and folders below that one folder, when two names differ in case
+/// only, or when a limit is exceeded; what has been written by then is left for the caller to remove.
 ///
-/// Of an entry's attributes only owner execute is kept. Case is that of ASCII letters; all other characters of a name
-/// are taken as they are. Before a name gets here, libarchive makes slashes of its backslashes where it has no slash.
+/// Of an entry's attributes only owner execute is kept. Only ASCII letters have case; all other characters of a name
+/// are taken as they are. libarchive turns the backslashes of a name without a slash into slashes first.
 std::optional<UnpackedPackage> unpackPackage(FileTree& files, std::string_view packagePath,
                                              const std::string& directory, const PackageLimits& limits = {},
                                              platform::ErrorRef* error = nullptr);

@@ -66,7 +66,7 @@ std::optional<PackageManifest> manifestIn(FileTree& files, std::string_view path
   auto identifier = facts ? (*facts)["KBBundleIdentifier"].string() : std::nullopt;
   if (!identifier || identifier->empty()) {
     reason = facts ? "its manifest has no \"KBBundleIdentifier\""
-                   : "its manifest is no dictionary" + (error ? ": " + error->description() : "");
+                   : "its manifest is not a dictionary" + (error ? ": " + error->description() : "");
     return std::nullopt;
   }
   return PackageManifest{std::string(*identifier), std::string((*facts)["KBBundleVersion"].string().value_or(""))};

@@ -15,9 +15,8 @@ struct PackageManifest {
   std::string version;  // empty when it has none
 };
 
-/// Reads a package as far as its manifest, without unpacking it: whether all the rest of it is whole, nobody knows
-/// then. Nothing, with an error of the domain "Package" that names the package, when it is no package as far as it was
-/// read.
+/// Reads a package as far as its manifest, without unpacking it; the rest of it may still be damaged. Nothing, with an
+/// error of the domain "Package" that names the package, when what was read is not that of a package.
 std::optional<PackageManifest> readPackageManifest(FileTree& files, std::string_view packagePath,
                                                    platform::ErrorRef* error = nullptr);
 

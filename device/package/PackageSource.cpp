@@ -43,7 +43,7 @@ la_ssize_t PackageSource::read(struct archive* archive, void* data, const void**
   auto& self = *static_cast<PackageSource*>(data);
   std::optional<platform::Bytes> chunk;
   try {
-    // No more than there is: what is asked for is set aside, and cleared, each time.
+    // No more than there is: the memory for it is allocated and cleared each time.
     chunk = self._reader->read(std::min<std::uint64_t>(chunkBytes, self._size - self._position), &self._error);
   } catch (const std::bad_alloc&) {
     // Nothing may be thrown through libarchive.

@@ -35,7 +35,7 @@ class PackageSource {
   FileTree& _files;
   struct archive* _archive = nullptr;
   std::unique_ptr<FileReader> _reader;
-  platform::Bytes _chunk;  // what libarchive looks at until it reads on
+  platform::Bytes _chunk;  // what libarchive looks at until its next read
   std::uint64_t _size = 0;
   std::uint64_t _position = 0;
   platform::ErrorRef _error;

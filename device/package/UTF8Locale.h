@@ -4,8 +4,8 @@
 
 namespace device {
 
-/// While it lives the calling thread takes text of several bytes for UTF-8, whatever locale the process has. Changes
-/// nothing where there is no such locale.
+/// While it lives the calling thread reads multi-byte text as UTF-8, whatever locale the process has. Changes nothing
+/// on a system without such a locale.
 class UTF8Locale {
  public:
   UTF8Locale() : _own(::newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr)), _before(_own ? ::uselocale(_own) : nullptr) {}

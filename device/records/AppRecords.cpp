@@ -179,9 +179,9 @@ std::optional<AppRecords::Loaded> AppRecords::load(platform::ErrorRef* error) {
   Lock lock(*this);
   for (const auto& record : _store.load()) {
     if (take(record, loaded)) continue;
-    platform::setError(
-        error, localDeviceError(LocalDeviceError::notADevice,
-                                "device.db: the record " + record.kind + " \"" + record.key + "\" makes no sense"));
+    platform::setError(error,
+                       localDeviceError(LocalDeviceError::notADevice, "device.db: the record " + record.kind + " \"" +
+                                                                          record.key + "\" cannot be understood"));
     return std::nullopt;
   }
   return loaded;

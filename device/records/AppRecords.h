@@ -35,7 +35,7 @@ struct AppRecord {
   std::string id;
   std::string name;
   std::optional<std::string> version;
-  std::string container;  // the directory around the bundle, without a slash at its end
+  std::string container;  // the directory around the bundle, without a trailing slash
   std::string bundle;     // name of the ".app" directory in it
   std::string applicationType = "User";
   bool isPlaceholder = false;
@@ -44,7 +44,7 @@ struct AppRecord {
   std::uint64_t installType = 0;
   std::uint64_t staticUsage = 0;  // bytes
   std::uint64_t filesSum = 0;     // of a placeholder's files (see Containers.h); 0: not known
-  std::uint64_t homeOrder = 0;    // apps that the layout does not name stand in this order; 0: not shown yet
+  std::uint64_t homeOrder = 0;    // the order of apps that the layout does not name; 0: not shown yet
   std::optional<InstallProgressRecord> progress{};
   /// What the registry hands out; made anew whenever the record changes.
   platform::OBApplicationProxyRef proxy{};
@@ -56,16 +56,16 @@ struct AppRecord {
 struct OutcomeRecord {
   InstallOutcome outcome = InstallOutcome::none;
   std::string reason;
-  std::uint64_t homeOrder = 0;  // of an app that went without anybody's doing, should it come back; 0: none
+  std::uint64_t homeOrder = 0;  // of an app that was lost without anybody's doing, in case it comes back; 0: none
 };
 
-/// The pages of the home screen as the host set them. An identifier stands in it once.
+/// The pages of the home screen as the host set them. No identifier occurs twice.
 struct HomeLayout {
   std::vector<std::vector<std::string>> pages;
   bool isPaged = false;  // false: one list, in pages[0]
 };
 
-/// Everything the services remember but the coordinators.
+/// Everything the services remember, except the coordinators.
 struct DeviceState {
   std::map<std::string, AppRecord, std::less<>> apps;  // in order of identifier, which is every enumeration's order
   std::map<std::string, OutcomeRecord, std::less<>> outcomes;
@@ -78,8 +78,8 @@ struct DeviceState {
   std::set<std::string> changedApps;  // put or removed since they were last taken
 
   const AppRecord* app(std::string_view id) const;
-  /// The flattened order: the layout's identifiers, whether or not their apps are there yet, then the apps it does not
-  /// name as they came.
+  /// The flattened order: the layout's identifiers, whether or not their apps are there yet, then the other apps in the
+  /// order in which they came.
   std::vector<std::string> homeOrder() const;
   /// Null when neither an app nor an outcome is known.
   std::optional<AppStatus> status(std::string_view id) const;
@@ -89,9 +89,9 @@ struct DeviceState {
 /// or removes one app.
 class ChangeSet {
  public:
-  /// A new app is shown on the home screen behind the others, one that was lost in its old place.
+  /// A new app is shown on the home screen behind the others; one that was lost returns to its old place.
   void put(AppRecord app);
-  /// It leaves the home screen, too; what is lost keeps its place in the layout for when it comes back.
+  /// The app leaves the home screen too; a lost one keeps its place in the layout in case it comes back.
   void removeApp(std::string_view id, bool isLost = false);
   void put(const CoordinatorRecord& coordinator) REQUIRES(recordsGuard);
   void removeCoordinator(std::string_view app);
@@ -102,13 +102,13 @@ class ChangeSet {
   void setLayout(HomeLayout layout);
   void setSetting(std::string_view key, std::string_view value);
   void setNotificationState(std::string_view name, std::uint64_t state);
-  /// A file that is to be removed once this is committed; removed when the device is opened if it comes to nothing.
+  /// A file that is to be removed once this is committed; if that does not happen, the next opening removes it.
   void addLeftover(std::string_view path);
   void removeLeftover(std::string_view path);
 
  private:
   friend class AppRecords;
-  /// What the store is to take, worked out once, before it is asked; then what becomes of the state, which cannot fail.
+  /// What the store gets, worked out once before it is asked; then the change of the state, which cannot fail.
   struct Step {
     std::function<void(const DeviceState& state, std::vector<StoreRecord>& records)> encode;
     std::function<void(DeviceState& state)> apply;
@@ -119,10 +119,10 @@ class ChangeSet {
 };
 
 /// What the services remember: plain structs in memory under one device-wide guard, written through to the store.
-/// The guard is never held while anybody is called back or a package is unpacked.
+/// The guard is never held during a callback or while a package is unpacked.
 class AppRecords {
  public:
-  /// Told why the store refused a change, as callers may pass over that in silence; under the guard. May be null.
+  /// Told why the store refused a change, since callers may ignore that silently; under the guard. May be null.
   using Refused = std::function<void(const platform::ErrorRef& reason)>;
 
   explicit AppRecords(Store& store, Refused refused = nullptr) : _store(store), _refused(std::move(refused)) {}
@@ -146,18 +146,18 @@ class AppRecords {
     std::vector<CoordinatorRecord> coordinators;
     std::vector<std::string> leftovers;
   };
-  /// Reads the store; once, before anything else. Nothing, with an error that names the record, when one makes no
-  /// sense.
+  /// Reads the store; once, before anything else. Nothing, with an error that names the record, when one cannot be
+  /// understood.
   std::optional<Loaded> load(platform::ErrorRef* error = nullptr) EXCLUDES(recordsGuard);
 
   /// All of it or, with an error, nothing of it; durable on true.
   bool commit(ChangeSet&& changes, platform::ErrorRef* error = nullptr) REQUIRES(recordsGuard);
-  /// The same for what a loss of power may take back, though not the death of the process: nothing that was on disk is
-  /// removed because of it.
+  /// The same for what a loss of power may take back, though not the death of the process: nothing that is on disk may
+  /// be removed because of it.
   bool write(ChangeSet&& changes, platform::ErrorRef* error = nullptr) REQUIRES(recordsGuard);
   /// In memory at once, in the store with the next commit: what may be lost with the process.
   void commitLater(ChangeSet&& changes) REQUIRES(recordsGuard);
-  /// Writes what `commitLater` kept back. False with an error when the store refuses; it is kept back then as before.
+  /// Writes what `commitLater` kept back. False with an error when the store refuses; it is then still kept back.
   bool flush(platform::ErrorRef* error = nullptr) EXCLUDES(recordsGuard);
   /// How far a transfer has come. In memory only; goes to the store with the app's next change.
   void setFraction(std::string_view app, double fraction) REQUIRES(recordsGuard);

@@ -17,7 +17,7 @@ class Coordinator;
 
 /// A promised piece of an install. Shared by the promise's handles and the coordinator's record.
 struct PromiseRecord {
-  // Constant once it is made.
+  // Constant once the promise is made.
   std::uint64_t identifier = 0;
   std::string name;
   platform::RVClientIdentifier client = 0;
@@ -28,7 +28,7 @@ struct PromiseRecord {
   bool begun GUARDED_BY(recordsGuard) = false;     // has made progress, and observers know
   bool complete GUARDED_BY(recordsGuard) = false;  // what was promised is there
   bool cancelled GUARDED_BY(recordsGuard) = false;
-  /// Whose app asset it is; nobody's for any other promise.
+  /// The coordinator whose app asset it is; null for any other promise.
   std::weak_ptr<Coordinator> coordinator GUARDED_BY(recordsGuard);
 };
 using PromiseRef = std::shared_ptr<PromiseRecord>;

@@ -111,7 +111,7 @@ std::optional<PlaceholderRecord> placeholderOfValue(const std::string& app, cons
   return placeholder;
 }
 
-/// Nothing unless every element is an identifier.
+/// Nothing if any element is not an identifier.
 std::optional<std::vector<std::string>> identifiers(const platform::Array& array, platform::TextSet& seen) {
   std::vector<std::string> result;
   result.reserve(array.size());

@@ -8,8 +8,8 @@
 
 namespace device {
 
-/// The records as they lie in the store: one dictionary each. Entries that are missing read as the default; nothing
-/// when the value is no record of that sort at all.
+/// The records as they lie in the store: one dictionary each. Missing entries read as the default; nothing when the
+/// value is not a record of that sort at all.
 platform::Value valueOfApp(const AppRecord& app);
 std::optional<AppRecord> appOfValue(const std::string& id, const platform::Value& value);
 platform::Value valueOfCoordinator(const CoordinatorRecord& coordinator) REQUIRES(recordsGuard);
@@ -18,7 +18,7 @@ std::optional<CoordinatorRecord> coordinatorOfValue(const std::string& app, cons
 platform::Value valueOfOutcome(const OutcomeRecord& outcome);
 std::optional<OutcomeRecord> outcomeOfValue(const platform::Value& value);
 /// A layout is an array of identifiers or of arrays of identifiers, here and in what the host sends. An identifier that
-/// comes again is left out.
+/// occurs again is left out.
 platform::Value valueOfLayout(const HomeLayout& layout);
 std::optional<HomeLayout> layoutOfValue(const platform::Value& value);
 

@@ -10,7 +10,7 @@
 
 namespace device {
 
-/// What a coordinator is at the moment.
+/// The present state of a coordinator.
 struct CoordinatorState {
   CoordinatorRecord record;
   bool ended = false;
@@ -18,13 +18,12 @@ struct CoordinatorState {
   bool fractionUnsaved = false;   // the store has an older progress
   platform::ErrorRef failure;     // why the install failed
   std::weak_ptr<platform::RVAppInstallObserverDelegate> observer;
-  /// The handle that answers for the record's promise; null for one that an earlier process left and nobody has asked
-  /// for yet.
+  /// The handle of the record's promise; null for a promise that an earlier process left and nobody has asked for yet.
   std::shared_ptr<platform::RVPromisedTransferToPath> appAsset;
 };
 
 /// One app's coordinator without the operations of its handle (`LocalCoordinator`): what installs and reports are
-/// about. It is open until it has ended, and as long kept by `OpenCoordinators`.
+/// about. `OpenCoordinators` keeps it until it has ended.
 class Coordinator : public platform::RVAppInstallCoordinator, public std::enable_shared_from_this<Coordinator> {
  public:
   const std::string app;

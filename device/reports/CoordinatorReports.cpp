@@ -4,13 +4,14 @@
 
 namespace device {
 
-/// Ends the registration when it goes.
+/// Ends the registration when it is destroyed.
 class CoordinatorReports::InstallObserver final : public platform::RVAppInstallObserver {
  public:
   InstallObserver(Boundary& boundary, Observers& observers, const Delegate* delegate, std::uint64_t number)
       : _boundary(boundary), _observers(observers), _delegate(delegate), _number(number) {}
   ~InstallObserver() override {
-    // A rule can keep the service from hearing of the release in time, but the delegate may go once this has returned.
+    // A rule can keep the service from hearing of the release in time, but the delegate may be gone once this has
+    // returned.
     auto release = [this] {
       _observers.removeIf(_delegate, [this](const Registration& each) { return each.number == _number; });
     };

@@ -17,8 +17,8 @@
 namespace device {
 
 /// What the install-coordination service tells about coordinators, on the coordination lane: to the coordinator's
-/// observer while that is alive, otherwise to the install observers of its creator's client. Operations from any
-/// thread, also under the records' guard: they only post.
+/// observer while that is alive, otherwise to the install observers of its creator's client. Callable from any
+/// thread, also under the records' guard: the operations only post.
 class CoordinatorReports {
  public:
   using Delegate = platform::RVAppInstallObserverDelegate;

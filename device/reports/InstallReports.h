@@ -9,8 +9,8 @@
 
 namespace device {
 
-/// What is told of a change, to whom and in which order: coordinators' observers, the registry's, the device's owner.
-/// Nothing before `start`: what is settled when a device is opened is nobody's news. They only post.
+/// Who is told of a change, and in which order: coordinators' observers, the registry's, the device's owner. Nobody
+/// before `start`: what is settled while a device is opened is not reported. The operations only post.
 class InstallReports {
  public:
   InstallReports(AppRecords& records, RegistryReports& registry, CoordinatorReports& coordination)
@@ -19,10 +19,10 @@ class InstallReports {
   void start() REQUIRES(recordsGuard) { _tells = true; }
   bool hasStarted() const REQUIRES(recordsGuard) { return _tells; }
 
-  /// How the app stands now, for the owner alone.
+  /// Tells the owner alone how the app stands now.
   void appChanged(const std::string& app) REQUIRES(recordsGuard);
   void transferBegan(const CoordinatorRef& coordinator, std::uint64_t promise) REQUIRES(recordsGuard);
-  /// An install began or came into another phase.
+  /// An install began or entered another phase.
   void installsChanged(const std::string& app) REQUIRES(recordsGuard);
   void placeholderInstalled(const CoordinatorRef& coordinator, bool installsChanged) REQUIRES(recordsGuard);
   void installed(const CoordinatorRef& coordinator, const std::string& app) REQUIRES(recordsGuard);

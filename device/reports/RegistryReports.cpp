@@ -8,7 +8,7 @@ namespace {
 
 using Proxies = std::vector<platform::OBApplicationProxyRef>;
 
-/// Puts the app's proxy where it belongs by its identifier, or takes the one that is there away when there is none.
+/// Puts the app's proxy at its place by identifier, or removes the one that is there when the app has none.
 void place(Proxies& proxies, const std::string& id, const platform::OBApplicationProxyRef& proxy) {
   auto at = std::lower_bound(proxies.begin(), proxies.end(), id, [](const auto& each, const std::string& identifier) {
     return *each->applicationIdentifier < identifier;
@@ -79,7 +79,7 @@ void RegistryReports::installCancelled(platform::OBApplicationProxyRef app) {
 }
 
 void RegistryReports::appChanged(AppStatus status) {
-  // The owner is no caller that has to get ready first, and is told in the order of the changes, whoever made them.
+  // The owner, unlike a caller, need not get ready first; it is told in the order of the changes, whoever made them.
   EventQueue::OutsideCall outside;
   _events.post(Lane::registry, [this, status = std::move(status)] { _changed(status); });
 }

@@ -15,8 +15,8 @@
 
 namespace device {
 
-/// What the registry tells its observers, and the device its owner, on the registry lane. Operations from any thread,
-/// also under the records' guard: they only post.
+/// What the registry tells its observers, and the device its owner, on the registry lane. Callable from any thread,
+/// also under the records' guard: the operations only post.
 class RegistryReports {
  public:
   using Observer = platform::OBApplicationWorkspaceObserverProtocol;
@@ -28,8 +28,8 @@ class RegistryReports {
   void addObserver(const std::weak_ptr<Observer>& observer);
   void removeObserver(const Observer* observer) { _observers.remove(observer); }
 
-  /// An install began, ended, was paused or came into another phase: observers get what runs and what is paused as it
-  /// is when they are told. Reports that are still to come tell later changes, too.
+  /// An install began, ended, was paused or entered another phase: observers get what runs and what is paused at the
+  /// moment they are told. A report that is still pending includes later changes.
   void installsChanged();
   void installCancelled(platform::OBApplicationProxyRef app);
   /// Whether the owner wants to hear of apps.

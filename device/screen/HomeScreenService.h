@@ -12,7 +12,7 @@ class HomeScreenService final : public platform::HomeScreen {
   HomeScreenService(AppRecords& records, Boundary& boundary) : _records(records), _boundary(boundary) {}
 
   Port PNSPanelloBlockableServerPort() override;
-  /// The buffer is of `malloc` and holds a binary property list.
+  /// The buffer comes from `malloc` and holds a binary property list.
   int PNGetFlattenedIconState(Port port, int form, void** buffer, std::size_t* length) override;
   int PNSetIconState(Port port, platform::BytesView layout) override;
 

@@ -23,8 +23,8 @@ std::uint32_t bigEndian(const char* bytes) {
   return number;
 }
 
-/// Whether the header is a PNG's and its size one that may be decoded: the pixels cost memory before anything shows
-/// that they are not there.
+/// Whether this is the header of a PNG of a size that may be decoded: the pixels cost memory before it shows whether
+/// they are there at all.
 bool isDrawable(platform::BytesView png) {
   constexpr char signature[] = "\x89PNG\r\n\x1a\n";
   if (png.size() < 33 || png.substr(0, 8) != platform::BytesView(signature, 8) || png.substr(12, 4) != "IHDR")

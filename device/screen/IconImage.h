@@ -15,8 +15,8 @@ class IconImage final : public platform::GYImage {
  public:
   explicit IconImage(cairo_surface_t* surface) : _surface(surface, &cairo_surface_destroy) {}
 
-  /// The image of a PNG scaled to a square of `size` pixels with rounded corners. Null when the bytes are no PNG that
-  /// can be drawn, or promise more than 4096 pixels in either direction.
+  /// The image of a PNG scaled to a square of `size` pixels with rounded corners. Null when the bytes are not a PNG
+  /// that can be drawn, or claim more than 4096 pixels in either direction.
   static std::shared_ptr<const IconImage> fromPNG(platform::BytesView png, int size);
 
   /// Appends the image as a PNG.

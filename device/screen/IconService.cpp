@@ -28,7 +28,7 @@ struct LocalBundle final : platform::KBBundle {
   const std::string directory;
 };
 
-/// A file of at most so many bytes; nothing when it is not there, or larger.
+/// The file's bytes; nothing when it is not there or is larger than the limit.
 std::optional<platform::Bytes> readUpTo(FileTree& files, const std::string& path, std::uint64_t most) {
   auto attributes = files.attributesOfItem(path);
   if (!attributes || attributes->isDirectory || attributes->size > most) return std::nullopt;

@@ -21,7 +21,7 @@ void FileSystemService::tell(const char* operation, std::string_view path, const
   if (!_failed || Boundary::isDeclined(error)) return;
   if (mayBeMissing && error && error->domain() == "FileSystem" && error->code() == ENOENT) return;
   std::string_view reason = error ? std::string_view(error->description()) : "no reason given";
-  // The path is told already.
+  // The path is passed already.
   if (reason.size() > path.size() + 2 && reason.substr(0, path.size()) == path && reason.substr(path.size(), 2) == ": ")
     reason.remove_prefix(path.size() + 2);
   _failed(operation, path, reason);
@@ -30,7 +30,7 @@ void FileSystemService::tell(const char* operation, std::string_view path, const
 template <class Body>
 auto FileSystemService::run(const char* operation, std::string_view path, ErrorRef* error, CallArguments arguments,
                             Body&& body) {
-  // The reason is wanted here also when the caller does not want it.
+  // The reason is needed here even if the caller does not want it.
   ErrorRef reason;
   Crossing crossing{"FileSystem", operation};
   crossing.answersBytes = true;

@@ -13,9 +13,9 @@ namespace device {
 /// The device's files as the plug-in reaches them: a file tree behind the boundary, as the service "FileSystem".
 class FileSystemService final : public platform::FileSystem {
  public:
-  /// Told of every operation that failed, as callers may pass over failures in silence: the operation, the path and the
-  /// reason in one line. Not told of what is no more than the answer to a question: something that is not there to be
-  /// looked at, read or removed. From any thread. May be null.
+  /// Told of every operation that failed, since callers may ignore failures silently: the operation, the path and the
+  /// reason in one line. Not told of a failure that merely answers a question: that there is nothing to be looked at,
+  /// read or removed. From any thread. May be null.
   using Failed = std::function<void(std::string_view operation, std::string_view path, std::string_view reason)>;
 
   FileSystemService(Boundary& boundary, FileTree& files, Failed failed)

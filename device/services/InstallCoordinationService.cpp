@@ -48,7 +48,7 @@ void InstallCoordinationService::uninstallAppWithBundleID(std::string_view bundl
                  });
   if (!completion) return;
   if (failure) outcome = failure;
-  // The completion waits for the caller's next call, as all does that this one caused.
+  // The completion waits for the caller's next call, like everything that this call causes.
   EventQueue::InsideCall inside;
   _events.post(Lane::coordination, [this, app = std::string(bundleID), completion = std::move(completion), outcome] {
     _boundary.enter({"AppsClient", "uninstallCompletion", app}, {{"error", outcome}}, [&] { completion(outcome); });

@@ -8,7 +8,7 @@
 
 namespace device {
 
-/// An account record that its owner can read, too.
+/// An account record that can also be read.
 class LocalAccountInfo final : public platform::TSMutableAccountInfo {
  public:
   explicit LocalAccountInfo(Boundary& boundary) : _boundary(boundary) {}

@@ -31,7 +31,7 @@ std::string LocalProcess::textOfErrorNumber(int errorNumber) {
 
 void LocalProcess::deallocateMemory(void* buffer, std::size_t length) {
   _boundary.call({"Process", "deallocateMemory"}, nullptr, {{"length", length}}, [] {});
-  std::free(buffer);  // also where a fault is injected: nobody has it any more
+  std::free(buffer);  // even where a fault is injected: nobody else has it any more
 }
 
 Value LocalProcess::infoDictionaryOfBundleAtPath(std::string_view path) {

@@ -9,7 +9,7 @@ namespace device {
 using platform::KBNotificationCallback;
 using platform::KBNotificationSuspensionBehavior;
 
-/// Callbacks are plain functions; the one that everybody knows by name has it in the journal.
+/// Callbacks are plain functions; the journal names the one that has a known name.
 static const char* operationOfCallback(std::string_view name) {
   return name == platform::startupNotificationName ? "_handleTSDStartupCompletedNotification"
                                                    : "KBNotificationCallback";

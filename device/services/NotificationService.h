@@ -34,8 +34,8 @@ class NotificationService final : public platform::NotificationCenter {
   std::uint32_t notify_set_state(int token, std::uint64_t state) override;
   std::uint32_t notify_post(std::string_view name) override;
 
-  /// Notifications are delivered in the order of their posts; nobody suspends an observer here, and no notification is
-  /// about an object.
+  /// Notifications are delivered in the order in which they were posted; observers are never suspended here, and no
+  /// notification is about an object.
   void KBNotificationCenterAddObserver(std::weak_ptr<void> observer, platform::KBNotificationCallback callback,
                                        std::string_view name, const void* object,
                                        platform::KBNotificationSuspensionBehavior suspension) override;

@@ -20,7 +20,7 @@ class SystemLogService final : public platform::SystemLog {
   SystemLogService(Boundary& boundary, Listener listener) : _boundary(boundary), _listener(std::move(listener)) {}
 
   std::shared_ptr<platform::LogHandle> createHandle(std::string_view subsystem, std::string_view category) override;
-  /// A handle that nobody asked for across the boundary.
+  /// A handle for the device's own use, made without crossing the boundary.
   std::shared_ptr<platform::LogHandle> makeHandle(std::string category);
 
   /// "default" or "error".

@@ -9,7 +9,7 @@
 
 namespace device {
 
-/// The transaction log: each record is one line in the log it was initialised with; before that, the journal's only.
+/// The transaction log: each record is one line in the log it was initialised with; before that, in the journal only.
 class TransactionLogService final : public platform::InstallTransactionLog {
  public:
   explicit TransactionLogService(Boundary& boundary) : _boundary(boundary) {}

@@ -23,7 +23,7 @@ namespace {
 
 constexpr std::size_t logHeaderSize = 32;
 constexpr std::size_t frameHeaderSize = 24;
-/// Written versions of the formats to read and to write: 1 for a file without a log.
+/// The format versions for reading and for writing: 1 for a file without a log.
 constexpr std::size_t formatVersions = 18;
 constexpr int attempts = 100;
 
@@ -36,7 +36,7 @@ std::uint32_t number(BytesView bytes, std::size_t at, bool bigEnds = true) {
   return result;
 }
 
-/// The running sum over a log, of which each frame carries its own.
+/// The running checksum over a log; each frame carries it up to that frame.
 class LogSum {
  public:
   explicit LogSum(bool bigEnds) : _bigEnds(bigEnds) {}
@@ -77,8 +77,8 @@ int readWhole(const std::string& path, Bytes& bytes) {
   return 0;
 }
 
-/// What stays the same as long as everything that is written to the database goes to the end of its log. A log that is
-/// begun anew has another header.
+/// What stays the same as long as everything written to the database is appended to its log. A log that was begun anew
+/// has another header.
 struct Period {
   ino_t file = 0;
   timespec written{};  // the file, when there is no log
@@ -102,8 +102,8 @@ int periodOf(const std::string& path, Period& period) {
   return 0;
 }
 
-/// Puts the pages of the log's whole commits in their places. What does not check is where a writer is, or where one
-/// died.
+/// Puts the pages of the log's complete commits in their places. Where the checksum is wrong a writer is at work, or
+/// has died.
 void applyLog(BytesView log, Bytes& image) {
   if (log.size() < logHeaderSize) return;
   std::uint32_t magic = number(log, 0);
@@ -112,7 +112,7 @@ void applyLog(BytesView log, Bytes& image) {
   std::size_t pageSize = number(log, 8);
   bool isPower = pageSize >= 512 && pageSize <= 65536 && (pageSize & (pageSize - 1)) == 0;
   if ((magic & ~1U) != 0x377f0682 || !isPower || !sum.is(log, 24)) return;
-  std::map<std::uint32_t, std::size_t> pages;  // of the commit that is being read: where in the log
+  std::map<std::uint32_t, std::size_t> pages;  // of the commit being read: where in the log each page is
   for (std::size_t at = logHeaderSize; at + frameHeaderSize + pageSize <= log.size();
        at += frameHeaderSize + pageSize) {
     if (log.substr(at + 8, 8) != log.substr(16, 8)) return;
@@ -138,8 +138,8 @@ std::optional<Bytes> readDatabaseImage(const std::string& path, ErrorRef* error)
     platform::setError(error, platform::makeError("Store", 1, path + ": " + why));
     return std::nullopt;
   };
-  // The log after the file: a page that is written back to the file meanwhile stands in the log too, until the log is
-  // begun anew. Then the two do not belong together.
+  // The log after the file: a page that is written back to the file meanwhile is in the log too, until the log is begun
+  // anew, and then the two do not belong together.
   for (int attempt = 0; attempt < attempts; ++attempt) {
     Period before, after;
     Bytes image, log;

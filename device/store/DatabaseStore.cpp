@@ -21,7 +21,7 @@ using platform::ErrorRef;
 
 namespace {
 
-/// In the header of every store's file, so that no other database is taken for one.
+/// In the header of every store's file, so that no other database is mistaken for one.
 constexpr int applicationID = 0x41507353;
 constexpr int formatVersion = 1;
 
@@ -85,7 +85,7 @@ class DatabaseStore final : public Store {
     _database.reset(opened);
     if (status != SQLITE_OK) return fail(error);
     sqlite3_extended_result_codes(_database.get(), 1);
-    // One process at a time has a device, so nothing need be shared with another.
+    // Only one process at a time has a device, so nothing needs to be shared.
     if (!execute("PRAGMA locking_mode=EXCLUSIVE", error) || !checkFormat(error)) return false;
     if (!execute("PRAGMA journal_mode=WAL", error) || !execute("PRAGMA synchronous=FULL", error)) return false;
     return prepareAndRead(error);
@@ -102,7 +102,7 @@ class DatabaseStore final : public Store {
     if (!bytes) return fail(error, "out of memory");
     std::copy(image.begin(), image.end(), bytes);
     auto size = static_cast<sqlite3_int64>(image.size());
-    // The database takes the bytes over, whatever becomes of it.
+    // The database takes the bytes over even if this fails.
     if (sqlite3_deserialize(opened, "main", bytes, size, size + 1,
                             SQLITE_DESERIALIZE_FREEONCLOSE | SQLITE_DESERIALIZE_RESIZEABLE) != SQLITE_OK)
       return fail(error);
@@ -199,7 +199,8 @@ class DatabaseStore final : public Store {
     if (id == 0 && version == 0 && tables == 0) return makeFormat(error);
     if (id != applicationID) return fail(error, "a database of something else, not a device's store");
     if (version != formatVersion)
-      return fail(error, "a device's store of format " + std::to_string(version) + ", which is not known here");
+      return fail(error,
+                  "a device's store of format " + std::to_string(version) + ", which this program does not know");
     return true;
   }
   bool makeFormat(ErrorRef* error) REQUIRES(_mutex) {

@@ -9,7 +9,7 @@
 
 namespace device {
 
-/// Records by kind and key, in the order of first insertion; one that was removed and comes back is the last. Not
+/// Records by kind and key, in the order of first insertion; one that was removed and comes back is last. Not
 /// synchronised.
 class RecordList {
  public:

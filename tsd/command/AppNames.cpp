@@ -54,7 +54,7 @@ std::string AppNames::identifierOf(const std::string& word) const {
       if (!wanted.empty() && fits(folded(id), folded(name))) found.push_back(id);
     }
     if (found.size() == 1) return found.front();
-    if (!found.empty()) throw CommandError(word + ": this may be " + listed(found));
+    if (!found.empty()) throw CommandError(word + ": this may mean " + listed(found));
   }
   std::vector<std::string> choices;
   for (const auto& [id, name] : _names) {
@@ -63,8 +63,8 @@ std::string AppNames::identifierOf(const std::string& word) const {
   }
   throw CommandError(word + ": the device does not know this app, and " +
                      (_runs == 0   ? "has no kept run"
-                      : _runs == 1 ? "the only kept run says nothing of it"
-                                   : "none of the " + std::to_string(_runs) + " kept runs says anything of it") +
+                      : _runs == 1 ? "the only kept run does not mention it"
+                                   : "none of the " + std::to_string(_runs) + " kept runs mentions it") +
                      didYouMean(word, choices));
 }
 

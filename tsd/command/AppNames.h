@@ -9,14 +9,14 @@
 
 namespace tsd {
 
-/// The apps that a device or its kept runs know, for whoever calls one by less than its identifier.
+/// The apps that a device or its kept runs know, to find one by less than its whole identifier.
 class AppNames {
  public:
   AppNames(const device::DeviceStatus& status, const std::vector<RunSummary>& runs);
 
-  /// The only app that has this name, or whose identifier ends with a dot and this, or has it in it, or that has it in
-  /// its name, whatever the case. Throws a `CommandError` that names those that it may be when there is none, or more
-  /// than one.
+  /// The only app that has this name, whose identifier ends with a dot and this word or contains it, or whose name
+  /// contains it, whatever the case. Throws a `CommandError` when there is no such app, or more than one, which it then
+  /// names.
   std::string identifierOf(const std::string& word) const;
 
  private:

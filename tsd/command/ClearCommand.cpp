@@ -38,7 +38,7 @@ ExitCode runClear(const CommandContext& context, const DeviceOnlyOptions& option
     return ExitCode::done;
   }
   for (const auto& id : removed) writeOutput("Removed the placeholder of " + printable(id) + "\n");
-  writeOutput("The sync data are cleared.\n");
+  writeOutput("All sync data is cleared.\n");
   return ExitCode::done;
 }
 

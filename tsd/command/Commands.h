@@ -54,9 +54,9 @@ ExitCode runPlan(const CommandContext& context, const PlanOptions& options);
 
 struct WhyOptions {
   std::string device;
-  std::string app;        // its identifier, name, or a part that is its alone
-  std::uint64_t run = 0;  // the number of the run to tell of; 0: the last that says something of the app
-  bool all = false;       // all that do
+  std::string app;        // its identifier, name, or an unambiguous part of either
+  std::uint64_t run = 0;  // the number of the run to tell of; 0: the last that mentions the app
+  bool all = false;       // all runs that mention it
 };
 ExitCode runWhy(const CommandContext& context, const WhyOptions& options);
 
@@ -97,7 +97,7 @@ ExitCode runQuery(const CommandContext& context, const QueryOptions& options);
 
 struct SetOptions {
   std::string device;
-  std::vector<std::string> settings;  // KEY=VALUE; none: they are only shown
+  std::vector<std::string> settings;  // KEY=VALUE; none: the settings are only shown
 };
 ExitCode runSet(const CommandContext& context, const SetOptions& options);
 
@@ -111,7 +111,7 @@ struct StoreOptions {
   std::string device;
   std::string app;
   bool finish = false;
-  std::string package;  // of --finish; empty: the store has one of its own
+  std::string package;  // of --finish; empty: the store uses its own
   device::StoreInstall install;
 };
 ExitCode runStore(const CommandContext& context, const StoreOptions& options);

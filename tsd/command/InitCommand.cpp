@@ -8,7 +8,7 @@ namespace tsd {
 ExitCode runInit(const CommandContext& context, const DeviceOnlyOptions& options) {
   platform::ErrorRef error;
   if (!device::createDevice(options.device, &error)) throw CommandError(textOf(error));
-  const DeviceLock made(options.device);  // leaves its file, so that whoever only looks at the device can lock it
+  const DeviceLock made(options.device);  // leaves its file behind, so that looking at the device need not make it
   if (context.options.json) {
     auto document = startDocument(context.options.command);
     document.dictionary()->set("result", "done");

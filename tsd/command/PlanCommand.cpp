@@ -26,9 +26,9 @@ namespace {
 struct Decision {
   std::string app;
   std::string name;
-  std::string version;    // that the host has
-  std::string what;       // "new", "update", or the outcome's words
-  Outcome outcome;        // that can be foretold
+  std::string version;    // the host's
+  std::string what;       // "new", "update", or the outcome in words
+  Outcome outcome;        // as far as it can be foretold
   std::size_t place = 0;  // in the order in which packages are asked for, from 1; 0: its package is not
   std::string rule{};
   std::string fact{};  // that the rule saw; may be empty
@@ -36,8 +36,8 @@ struct Decision {
   std::string why() const { return fact.empty() ? rule : rule + ": " + fact; }
 };
 
-/// A sync on a copy of the device as far as to the packages that it asks for, and what the plug-in said of each app
-/// meanwhile.
+/// A sync on a copy of the device, up to the packages that it asks for, and what the plug-in said of each app on the
+/// way.
 class Rehearsal {
  public:
   Rehearsal(const CommandContext& context, const PlanOptions& options)
@@ -66,7 +66,7 @@ class Rehearsal {
   std::vector<std::string> _asked;
   SyncOpening _opening;
   std::vector<Decision> _decisions;
-  DeviceSession _session;  // the last, as the verdicts hear of it until it has gone
+  DeviceSession _session;  // last: the verdicts hear from it until it is destroyed
 };
 
 void Rehearsal::run(std::vector<TodoEntry> todo) {
@@ -162,7 +162,7 @@ Decision Rehearsal::other(const std::string& id, const TodoEntry* entry) const {
     decision.outcome =
         entry->operation == platform::todo::installed && isInstalled ? Outcome::installed : Outcome::unchanged;
     decision.rule = decision.outcome == Outcome::installed ? "it is installed, as its entry of the todo list says"
-                                                           : "nothing is to be done for its entry of the todo list";
+                                                           : "its entry of the todo list asks for nothing";
     if (decision.outcome == Outcome::unchanged)
       decision.fact = entry->operation.empty() ? "no operation" : entry->operation;
   } else if (settled) {
@@ -173,7 +173,7 @@ Decision Rehearsal::other(const std::string& id, const TodoEntry* entry) const {
     decision.outcome = Outcome::refused;
     decision.rule = "this cannot be an app's identifier";
   } else {
-    decision.rule = entry ? "the plug-in did not ask for its package" : "the plug-in says nothing of it";
+    decision.rule = entry ? "the plug-in did not ask for its package" : "the plug-in does not mention it";
   }
   decision.what = wordsOf(decision.outcome);
   return decision;

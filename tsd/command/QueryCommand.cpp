@@ -54,7 +54,7 @@ ExitCode runQuery(const CommandContext& context, const QueryOptions& options) {
   auto document = startDocument(context.options.command);
   document.dictionary()->set("result", "done");
   document.dictionary()->set("question", options.question);
-  // No answer is told apart from an empty one by its absence.
+  // No answer at all differs from an empty one by its absence.
   document.dictionary()->set("answer", answer);
   writeDocument(document);
   return ExitCode::done;

@@ -22,7 +22,7 @@ RunSummary chosenRun(const std::string& device, const std::vector<RunSummary>& r
   auto found = std::find_if(runs.rbegin(), runs.rend(), fits);
   if (found != runs.rend()) return *found;
   if (!number) return runs.back();
-  throw CommandError(device + ": there is no run " + std::to_string(number) + ", those that are kept are " +
+  throw CommandError(device + ": there is no run " + std::to_string(number) + "; the kept runs are " +
                      std::to_string(runs.front().number) + " to " + std::to_string(runs.back().number));
 }
 

@@ -93,7 +93,7 @@ class Restore {
   Value document(ExitCode code) const;
   std::string text(ExitCode code) const;
   std::vector<std::string> missing() const;
-  std::string problem() const;  // the gravest one; empty: none
+  std::string problem() const;  // the most serious one; empty: none
   bool restoresApps() const { return _options.type == 2 || _options.type == 3; }
 
   const CommandContext& _context;
@@ -146,7 +146,7 @@ ExitCode Restore::run() {
 }
 
 void Restore::pushLists(FileConduit& conduit) {
-  // The one that has not been read yet goes first, as the device stays as it is when it cannot be.
+  // The list not read yet goes first: if it cannot be read, the device stays as it is.
   std::string demoted = _folder + "/" + std::string(demotedListName);
   if (isThere(demoted)) conduit.pushFile(demoted, platform::demotedAppsPath);
   if (_list.exists) conduit.pushFile(_folder + "/" + std::string(restoreListName), platform::restoreListPath);
@@ -198,14 +198,14 @@ void Restore::tell() const {
   auto declined = _verdicts.restoreDeclined();
   if (declined) _context.console.message(declined->line());
   if (!declined && _besides)
-    _context.console.message("the backup service wants placeholders, and reported besides: " + textOf(_besides));
+    _context.console.message("the backup service wants placeholders, and also reported: " + textOf(_besides));
   if (_unstored) _context.console.message("not everything could be stored: " + textOf(_unstored));
 }
 
 std::string Restore::problem() const {
   if (_unstored) return "not everything could be stored: " + textOf(_unstored);
   if (auto declined = _verdicts.restoreDeclined()) return declined->line();
-  return _besides ? "the backup service wants placeholders, and reported besides: " + textOf(_besides) : "";
+  return _besides ? "the backup service wants placeholders, and also reported: " + textOf(_besides) : "";
 }
 
 std::vector<std::string> Restore::missing() const {

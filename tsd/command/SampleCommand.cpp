@@ -50,7 +50,7 @@ ExitCode runSample(const CommandContext& context, const SampleOptions& options) 
     throw CommandError(options.host + ": " + (problem ? problem.message() : "there is something already"));
   }
   if (options.demo && options.apps < 5) {
-    throw CommandError(ExitCode::usage, "--demo: needs at least 5 apps, --apps says " + std::to_string(options.apps));
+    throw CommandError(ExitCode::usage, "--demo: needs at least 5 apps, but --apps is " + std::to_string(options.apps));
   }
   SampleHost host(options);
   host.write();

@@ -40,7 +40,7 @@ void apply(device::LocalDevice& device, const std::vector<Setting>& settings) {
   }
 }
 
-/// Throws when a setting is not known, so that the device gets all of them or none.
+/// Throws when a setting is not known, so that the device gets all the settings or none.
 void rehearse(const std::vector<Setting>& settings) {
   auto device = device::makeMemoryDevice(device::makeManualEventQueue(), {});
   tsd::apply(*device, settings);

@@ -54,14 +54,14 @@ std::string stateText(const device::AppStatus& app) {
   return std::string(device::nameOfState(app.state)) + (isMoving ? ", " + std::to_string(percent) + " %" : "");
 }
 
-/// Why the home screen shows a sync: it does so from a restore's begin until a sync has ended.
+/// Why the home screen shows a sync: it does so from the beginning of a restore until a sync has ended.
 std::string syncingText(const std::vector<RunSummary>& runs) {
   constexpr const char* shown = "\nThe home screen shows that a sync is running";
   auto last = std::find_if(runs.rbegin(), runs.rend(),
                            [](const auto& run) { return run.command == "sync" || run.command == "restore"; });
-  if (last == runs.rend()) return std::string(shown) + "; none is.\n";
-  return std::string(shown) + "; none is: " + (last->ended ? "" : "a killed ") + last->command + " " +
-         std::to_string(last->number) + " has left it so, until the next sync has ended.\n";
+  if (last == runs.rend()) return std::string(shown) + ", but none is.\n";
+  return std::string(shown) + ", but none is: " + (last->ended ? "" : "a killed ") + last->command + " " +
+         std::to_string(last->number) + " left it so, until the next sync ends.\n";
 }
 
 std::string text(const DeviceView& view, const std::vector<RunSummary>& runs) {

@@ -71,7 +71,7 @@ ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
   stop.letFinish();
   context.kept->conclude(reports.back().apps, reports.back().message);
   show(context, reports);
-  // A device that has not gone quiet by its deadline cannot be closed in order; the next one to open it tidies up.
+  // A device that is not quiet by the deadline cannot be closed properly; the next process to open it tidies up.
   if (code == ExitCode::deadline) {
     context.kept->end(code);
     std::_Exit(static_cast<int>(code));

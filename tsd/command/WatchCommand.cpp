@@ -29,9 +29,9 @@ using Phase = ProgressLine::Phase;
 namespace {
 
 constexpr std::chrono::milliseconds leastPause{250};
-/// Pauses are so many times as long as a look at the device takes, so that a watch costs its sync little.
+/// Pauses last this many times as long as a look at the device takes, so that a watch slows a sync little.
 constexpr int pauseShare = 5;
-constexpr int percentStep = 10;  // of a package, for which there is a line where lines are not redrawn
+constexpr int percentStep = 10;  // of a package, between two of its lines where lines are not redrawn
 
 ProgressLine lineOf(const HomeIcon& icon) {
   ProgressLine line;
@@ -63,7 +63,7 @@ std::string whatOf(const ProgressLine& line) {
   }
 }
 
-/// What belongs to a device's store, as far as it tells whether anything was written.
+/// The facts of a device's store's files that tell whether anything was written.
 using StoreMark = std::array<long long, 6>;
 StoreMark markOf(const std::string& device) {
   StoreMark mark{};
@@ -113,7 +113,7 @@ class Watch {
         _redraws(!context.options.json && ::isatty(STDOUT_FILENO) && Console::isTerminal()) {}
 
   void look();
-  /// Takes what is redrawn in place from the console, and tells the sum.
+  /// Takes the lines that are redrawn in place away from the console, and tells the sum.
   void finish();
   bool isIdle() const { return !_holder; }
 
@@ -170,7 +170,7 @@ void Watch::look() {
 
 std::string Watch::headline() const {
   return _options.device + ": " +
-         (_holder ? "process " + _holder->process + " is at work on it: " + _holder->command : "nobody is changing it");
+         (_holder ? "process " + _holder->process + " is working on it: " + _holder->command : "nobody is changing it");
 }
 
 std::string Watch::sum() const {
@@ -186,7 +186,7 @@ std::string Watch::sum() const {
   return text;
 }
 
-/// A line for each app of which something is new; at the first look, for those that are on their way.
+/// A line for each app that has changed; at the first look, for those that are on their way.
 void Watch::print() {
   std::string text;
   if (!_looked) text = wrappedLine("", headline() + "; " + sum() + ".");

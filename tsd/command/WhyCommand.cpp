@@ -17,7 +17,7 @@ using platform::Value;
 
 namespace {
 
-/// What is known of the app now.
+/// What is known about the app now.
 struct Present {
   std::optional<device::AppStatus> app;
   std::optional<device::CoordinatorStatus> install;
@@ -40,12 +40,12 @@ Present presentOf(const DeviceView& view, const std::string& id) {
 /// What an open install waits for.
 std::string waitOf(const device::CoordinatorStatus& install) {
   std::string whose =
-      "an install of " + nameOfClient(install.client) + "'s (" + device::shortNameOfKind(install.kind) + ") is open";
+      "an install by " + nameOfClient(install.client) + " (" + device::shortNameOfKind(install.kind) + ") is open";
   if (!install.promisesPackage) return whose + ", and nobody has promised its package";
   std::string wait = whose + ", and waits for its package, which " +
-                     nameOfClient(install.packageClient ? install.packageClient : install.client) + " is to deliver";
+                     nameOfClient(install.packageClient ? install.packageClient : install.client) + " will deliver";
   if (install.fraction >= 1) {
-    wait += ": all of it has come, and the device was not told where it lies";
+    wait += ": all of it has come, but the device was not told where it is";
   } else if (install.fraction > 0) {
     wait += ": " + std::to_string(std::lround(install.fraction * 100)) + " % have come";
   }
@@ -165,12 +165,12 @@ std::string nowText(const Present& present) {
 std::string othersText(const std::vector<AppChapter>& chapters, std::size_t silent) {
   std::string text;
   if (chapters.size() > 1) {
-    text += "\nOther runs that say something of it (--all shows them, --run N one of them):\n";
+    text += "\nOther runs that mention it (--all shows them, --run N one of them):\n";
     for (std::size_t i = 0; i + 1 < chapters.size(); ++i) text += noteLine("  ", answerOf(chapters[i]));
   }
   if (silent) {
-    text += "\n" + std::to_string(silent) +
-            (silent == 1 ? " other run that is kept says" : " other runs that are kept say") + " nothing of it.\n";
+    text += "\n" + std::to_string(silent) + (silent == 1 ? " other kept run does" : " other kept runs do") +
+            " not mention it.\n";
   }
   return text;
 }

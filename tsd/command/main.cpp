@@ -28,7 +28,7 @@ struct Invocation {
   CommonOptions common;
   std::vector<std::string> rules;
   std::function<ExitCode(const CommandContext&)> run;
-  /// The values of the options that take a few only; the parser does not tell them.
+  /// The values of options that take only a few; the parser does not give them.
   std::map<const CLI::Option*, std::vector<std::string>> words;
 };
 
@@ -40,7 +40,7 @@ const std::map<std::string, ProgressMode> progressModes{{"auto", ProgressMode::a
 constexpr const char* commonGroup = "Common";
 constexpr const char* version = TSD_VERSION;
 
-/// Lets the option take these values only.
+/// Lets the option take only these values.
 CLI::Option* takeOneOf(Invocation& invocation, CLI::Option* option, const std::vector<std::string>& words) {
   invocation.words[option] = words;
   return option->check(CLI::IsMember(words).description(""));
@@ -83,7 +83,7 @@ CLI::App* addCommand(CLI::App& program, Invocation& invocation, const char* name
   return command;
 }
 
-/// A whole number in decimal digits. Refused with a usage error: anything else, and what is out of bounds.
+/// A whole number in decimal digits. Anything else, or a number out of bounds, is refused with a usage error.
 template <class Number>
 void addNumber(CLI::App* command, const char* name, Number& target, const char* description,
                Number least = std::numeric_limits<Number>::min(), Number most = std::numeric_limits<Number>::max()) {
@@ -99,7 +99,7 @@ void addNumber(CLI::App* command, const char* name, Number& target, const char* 
   command->add_option_function<std::string>(name, take, wrapped(description))->option_text("N");
 }
 
-/// A folder's name is never empty: what lies in it would be looked for in the system's root.
+/// A folder's name must not be empty: its content would be looked for in the system's root.
 std::string checkFolder(const std::string& folder) { return folder.empty() ? "a folder is expected" : ""; }
 
 std::string checkFile(const std::string& file) { return file.empty() ? "a file is expected" : ""; }
@@ -195,22 +195,23 @@ void addSync(CLI::App& program, Invocation& invocation) {
           [options](const std::vector<std::string>& texts) {
             for (const auto& text : texts) addAssetReport(options->reports, text);
           },
-          wrapped("What is reported of an app's asset: APP:KEY=VALUE,... with the keys isDownload, isRestore (true or "
+          wrapped("What the daemon reports of an app's asset: APP:KEY=VALUE,... with the keys isDownload, isRestore "
+                  "(true or "
                   "false), completedAssetParts (a number), path (relative, absolute, none, recorded or a text), or "
-                  "stall alone: progress and never an end (repeatable)"))
+                  "just stall: progress without an end (repeatable)"))
       ->option_text("TEXT")
       ->expected(1)
       ->take_all();
   auto* endPhase = command->add_option_function<std::string>(
       "--end-phase", [options](const std::string& text) { options->endPhase = text == "success"; },
-      wrapped("What the transfer phase is said to have ended with, whatever happened"));
+      wrapped("How the transfer phase is reported to have ended, whatever happened"));
   takeOneOf(invocation, endPhase, {"success", "failed"})->option_text("success|failed");
   command->add_flag("--daemon-reports", options->daemonReports,
                     wrapped("Report the installs' outcomes to the plug-in as well"));
   addNumber<std::size_t>(command, "--repeat", options->repeat, "Syncs in a row, with one plug-in object (1)", 1,
                          1000000);
   addTrace(command, invocation);
-  addNumber<std::size_t>(command, "--transfers", options->transfers, "Packages in flight (2)", 1, 256);
+  addNumber<std::size_t>(command, "--transfers", options->transfers, "Packages sent at the same time (2)", 1, 256);
 }
 
 void addPlan(CLI::App& program, Invocation& invocation) {
@@ -258,7 +259,7 @@ void addReport(CLI::App& program, Invocation& invocation) {
   auto options = std::make_shared<ReportOptions>();
   options->version = version;
   auto* command =
-      addCommand(program, invocation, "report", "Write a page about a run that any browser shows", runReport, options);
+      addCommand(program, invocation, "report", "Write a page about a run, for any browser", runReport, options);
   addDevice(command, options->device);
   addNumber<std::uint64_t>(command, "--run", options->run, "Number of the run (that of the last sync or restore)", 1);
   command->add_option("-o,--output", options->file, "The page, an HTML file; - for standard output")
@@ -318,21 +319,22 @@ void addWhy(CLI::App& program, Invocation& invocation) {
       addCommand(program, invocation, "why", "Tell what happened to an app in the last runs", runWhy, options);
   addDevice(command, options->device);
   command
-      ->add_option("APP", options->app, wrapped("The app's bundle identifier, its name, or a part that is its alone"))
+      ->add_option("APP", options->app,
+                   wrapped("The app's bundle identifier, its name, or a part of either that no other app has"))
       ->required()
       ->option_text(" ");
   addNumber<std::uint64_t>(command, "--run", options->run, "Tell of the run of this number ('tsd runs' lists them)", 1);
-  command->add_flag("--all", options->all, "Tell of all runs that are kept");
+  command->add_flag("--all", options->all, "Tell of all kept runs that mention the app");
 }
 
 void addStore(CLI::App& program, Invocation& invocation) {
   auto options = std::make_shared<StoreOptions>();
   auto* command =
-      addCommand(program, invocation, "store", "Start or finish an install of the store's own", runStore, options);
+      addCommand(program, invocation, "store", "Start or finish an install by the store", runStore, options);
   addDevice(command, options->device);
   addApp(command, options->app);
   auto* finish =
-      command->add_flag("--finish", options->finish, wrapped("Finish the install; begin it first where there is none"));
+      command->add_flag("--finish", options->finish, wrapped("Finish the install; begin it first if there is none"));
   command->add_option("--package", options->package, "The package to finish with, a file of the host")
       ->option_text("FILE")
       ->needs(finish);
@@ -349,7 +351,7 @@ void addStore(CLI::App& program, Invocation& invocation) {
       "--no-coordinator", [&install] { install.createsCoordinator = false; }, "Without a coordinator");
 }
 
-/// On one line again.
+/// The wrapped text on one line again.
 std::string unwrapped(std::string text) {
   std::replace(text.begin(), text.end(), '\n', ' ');
   return text;
@@ -430,7 +432,7 @@ void addHelp(CLI::App& program, Invocation& invocation) {
   command->callback([&program, &invocation, name] {
     invocation.common.command = "help";
     invocation.run = [&program, name](const CommandContext&) {
-      // The program's own would be that of the subcommand which was asked for: this one.
+      // The program's own help would be that of the requested subcommand, which is this one.
       writeOutput(name->empty()
                       ? program.get_formatter()->make_help(&program, program.get_name(), CLI::AppFormatMode::Normal)
                       : program.get_subcommand(*name)->help(program.get_name()));
@@ -454,7 +456,7 @@ void addCommands(CLI::App& program, Invocation& invocation) {
   addSync(program, invocation);
   addPlan(program, invocation);
   addRestore(program, invocation);
-  addDeviceCommand(program, invocation, "status", "Show the apps of a device and the installs under way", runStatus);
+  addDeviceCommand(program, invocation, "status", "Show the apps of a device and the running installs", runStatus);
   addDeviceCommand(program, invocation, "runs", "List the runs that a device keeps", runRuns);
   addWhy(program, invocation);
   addHome(program, invocation);
@@ -473,7 +475,7 @@ void addCommands(CLI::App& program, Invocation& invocation) {
   addHelp(program, invocation);
 }
 
-/// Of a rule that is none: the point that was most likely meant, unless it is a point.
+/// For a text that is not a rule: the point that was most likely meant, unless the text names a point.
 std::string pointMeantBy(const std::string& rule) {
   std::string point = rule.substr(0, rule.find_first_of(":@="));
   if (device::isInjectionPoint(point)) return {};

@@ -23,7 +23,7 @@ struct CloseDirectory {
 };
 using Directory = std::unique_ptr<DIR, CloseDirectory>;
 
-/// The host is to know at once that a device takes no more; a name that no device takes concerns its file only.
+/// The host has to know at once that the device takes no more; a name that no device takes concerns its file only.
 bool isAboutName(const platform::ErrorRef& error) {
   return error && (error->code() == EINVAL || error->code() == ENAMETOOLONG || error->code() == EILSEQ);
 }
@@ -41,7 +41,7 @@ std::vector<std::string> namesIn(DIR* directory, const std::string& path) {
   return names;
 }
 
-/// Whether the host has a todo list. Throws when it is none that can be read.
+/// Whether the host has a todo list. Throws when there is something that cannot be read as one.
 bool hasTodoList(int directory, const std::string& hostFolder) {
   std::string path = hostFolder + "/" + std::string(platform::todoListName);
   struct stat facts {};
@@ -49,7 +49,7 @@ bool hasTodoList(int directory, const std::string& hostFolder) {
     if (errno == ENOENT) return false;
     throw CommandError(path + ": " + std::strerror(errno));
   }
-  if (!S_ISREG(facts.st_mode)) throw CommandError(path + ": " + sortOfFile(facts.st_mode) + ", no file");
+  if (!S_ISREG(facts.st_mode)) throw CommandError(path + ": " + sortOfFile(facts.st_mode) + ", not a file");
   platform::ErrorRef error;
   if (!HostFile::openAt(directory, std::string(platform::todoListName), &error))
     throw CommandError(path + ": " + textOf(error));
@@ -62,7 +62,7 @@ bool FileConduit::pushStaging(const std::string& hostFolder) {
   Directory directory(::opendir(hostFolder.c_str()));
   if (!directory) throw CommandError(hostFolder + ": " + std::strerror(errno));
   bool hasList = hasTodoList(::dirfd(directory.get()), hostFolder);
-  // What an interrupted session left there is not this session's.
+  // What an interrupted session left there does not belong to this one.
   if (_files.fileExists(platform::stagingDirectory)) {
     platform::ErrorRef error;
     if (!_files.removeItem(platform::stagingDirectory, &error))
@@ -99,7 +99,8 @@ void FileConduit::pushDirectory(const Level& level) {
 }
 
 void FileConduit::checkStopped() const {
-  if (_isStopped && _isStopped()) throw CommandError(ExitCode::cancelled, "stopped while the host's files were taken");
+  if (_isStopped && _isStopped())
+    throw CommandError(ExitCode::cancelled, "stopped while the host's files were being copied");
 }
 
 void FileConduit::pushItem(const Level& level, const std::string& name) {
@@ -119,11 +120,11 @@ void FileConduit::pushItem(const Level& level, const std::string& name) {
     Directory owner(::fdopendir(directory));
     return pushDirectory({directory, hostPath, devicePath, level.depth + 1});
   }
-  if (!S_ISREG(facts.st_mode)) return refuse(hostPath, std::string(sortOfFile(facts.st_mode)) + ", no regular file");
+  if (!S_ISREG(facts.st_mode)) return refuse(hostPath, std::string(sortOfFile(facts.st_mode)) + ", not a regular file");
   platform::ErrorRef error;
   auto file = HostFile::openAt(level.directory, name, &error);
   if (!file) return refuse(hostPath, textOf(error));
-  // The rest comes again with the next sync, should power be lost. A torn list would be taken for the host's.
+  // If power is lost, the next sync brings the rest again; but a torn list would be taken for the host's.
   bool isTodoList = level.depth == 0 && name == platform::todoListName;
   if (auto refusal = copy(*file, hostPath, devicePath, isTodoList)) refuse(hostPath, textOf(refusal));
 }

@@ -14,25 +14,25 @@
 
 namespace tsd {
 
-/// The way of the host's files onto the device. Takes regular files only, and no more of them than the device has room
-/// for in its books; whatever it refuses it names on the console.
+/// Brings the host's files onto the device: regular files only, and no more than a limit on their number and bytes.
+/// Whatever it refuses it names on the console.
 class FileConduit {
  public:
   static constexpr std::size_t maximumFiles = 200'000;
   static constexpr std::size_t maximumDepth = 16;
   static constexpr std::uint64_t maximumBytes = std::uint64_t{16} << 30;
 
-  /// `isStopped`, if there is one, tells whether it is to end: looked at before each piece of a file.
+  /// `isStopped`, if there is one, tells whether to end: asked before each piece of a file.
   FileConduit(device::FileTree& files, Console& console, std::function<bool()> isStopped = nullptr)
       : _files(files), _console(console), _isStopped(std::move(isStopped)) {}
 
   /// Replaces the staging directory by the host's folder, without its packages and its restore lists. A folder without
   /// a todo list leaves no staging directory and answers false. Throws a `CommandError` when the folder or the todo
-  /// list cannot be read, or it does not fit, or the device takes no more, or it is stopped; then nothing of it is in
-  /// the staging directory.
+  /// list cannot be read, when there is too much, when the device takes no more, or when it is stopped; then nothing of
+  /// it is left in the staging directory.
   bool pushStaging(const std::string& hostFolder);
 
-  /// One file to a path of the device, in the place of an older one, durably; directories on the way are made. Throws a
+  /// Copies one file to a path of the device durably, over an older one; missing directories are made. Throws a
   /// `CommandError` that names the file.
   void pushFile(const std::string& hostFile, std::string_view devicePath);
 
@@ -47,7 +47,8 @@ class FileConduit {
   void pushDirectory(const Level& level);
   void pushItem(const Level& level, const std::string& name);
   void checkStopped() const;
-  /// Absent when all went well, else why no file of the device can have that name. Throws when anything else fails.
+  /// Absent when all went well, otherwise why no file of the device can have that name. Throws when anything else
+  /// fails.
   platform::ErrorRef copy(HostFile& file, const std::string& hostPath, std::string_view devicePath, bool durable);
   void refuse(const std::string& hostPath, const std::string& why);
 

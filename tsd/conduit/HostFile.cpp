@@ -44,7 +44,7 @@ std::optional<HostFile> HostFile::open(const std::string& folder, const std::str
 
 std::optional<HostFile> HostFile::openAt(int directory, const std::string& name, platform::ErrorRef* error) {
   platform::setError(error, nullptr);
-  // Not waiting for a pipe's other end; the kind is looked at before anything is read.
+  // Without waiting for a pipe's other end; the kind is checked before anything is read.
   int descriptor = ::openat(directory, name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
   if (descriptor < 0) {
     int reason = errno;
@@ -68,7 +68,7 @@ HostFile::~HostFile() {
 
 std::optional<platform::Bytes> HostFile::read(std::size_t count, platform::ErrorRef* error) {
   platform::setError(error, nullptr);
-  // No more than there can be, as all of it is cleared first.
+  // No larger than the file can be, as all of it is cleared first.
   platform::Bytes bytes(static_cast<std::size_t>(std::min<std::uint64_t>(count, _size + 1)), '\0');
   ssize_t got;
   do {

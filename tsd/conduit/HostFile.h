@@ -25,11 +25,11 @@ class HostFile {
   HostFile& operator=(HostFile&&) = delete;
   ~HostFile();
 
-  /// Bytes, when it was opened.
+  /// In bytes, as it was when the file was opened.
   std::uint64_t size() const { return _size; }
   /// Up to `count` bytes; empty at the end; nothing on failure.
   std::optional<platform::Bytes> read(std::size_t count, platform::ErrorRef* error = nullptr);
-  /// What is left, up to `limit` bytes; more is a failure.
+  /// The rest of the file; more than `limit` bytes are a failure.
   std::optional<platform::Bytes> readRest(std::size_t limit, platform::ErrorRef* error = nullptr);
 
  private:

@@ -16,7 +16,7 @@
 namespace tsd {
 namespace {
 
-/// Where the bytes go to, with links followed. Nothing but a regular file may be there.
+/// Where the bytes go, with links followed. Only a regular file may be there.
 std::string targetOf(const std::string& path) {
   struct stat facts {};
   if (::stat(path.c_str(), &facts) != 0) {

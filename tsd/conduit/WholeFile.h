@@ -6,8 +6,8 @@
 
 namespace tsd {
 
-/// Writes a file of the host as a whole: an older one stays as it was until the new one is on disk. A link is followed.
-/// Throws a `CommandError` that names the file, also when something other than a regular file has that name.
+/// Replaces a file of the host as a whole: an older one stays as it was until the new one is on disk. A link is
+/// followed. Throws a `CommandError` that names the file, also when that name belongs to anything but a regular file.
 void writeWholeFile(const std::string& path, platform::BytesView content);
 
 }  // namespace tsd

@@ -14,22 +14,22 @@ namespace tsd {
 
 class Progress;
 
-/// What the device tells about its apps while something runs. Made before the device, as the device reports to it.
+/// What the device reports of its apps while something runs. Made before the device, which reports to it.
 /// From any thread.
 class AppWatch {
  public:
   explicit AppWatch(Progress& progress) : _progress(progress) {}
 
-  /// What the device is to call on each change.
+  /// What the device calls on each change.
   std::function<void(const device::AppStatus&)> listener();
   /// Forgets which placeholders were seen, for the next run.
   void restart();
 
-  /// When an app's placeholder was first seen since `restart`; nothing when it was not.
+  /// When the app's placeholder was first seen since `restart`; nothing if it was not.
   std::optional<std::chrono::steady_clock::time_point> placeholderSeen(const std::string& id) const;
-  /// When the last of them was.
+  /// When the last placeholder was seen.
   std::optional<std::chrono::steady_clock::time_point> lastPlaceholderSeen() const;
-  /// Grows with every change.
+  /// A count of the changes so far.
   std::uint64_t changes() const;
 
  private:

@@ -8,13 +8,13 @@
 
 namespace tsd {
 
-/// What the daemon reports of one app's asset, where that differs from an ordinary download.
+/// What the daemon reports of one app's asset, if that differs from an ordinary download.
 struct AssetReport {
   enum class Path : std::uint8_t {
     absolute,
     relative,  // to the public staging directory
     none,
-    recorded,  // none, and the restore state knows it
+    recorded,  // no path, but the restore state has it
     text,      // whatever `pathText` says
   };
 
@@ -23,7 +23,7 @@ struct AssetReport {
   std::optional<std::int64_t> completedAssetParts;
   Path path = Path::absolute;
   std::string pathText;
-  bool stall = false;  // progress, and never an end
+  bool stall = false;  // progress without an end
 };
 
 /// By bundle identifier.

@@ -9,7 +9,7 @@
 namespace tsd {
 
 /// What a command runs with. Every command throws a `CommandError` when it cannot go on, writes data to standard
-/// output (one JSON document when asked for) and all else to the console.
+/// output (one JSON document when asked for) and everything else to the console.
 struct CommandContext {
   const CommonOptions& options;
   Console& console;

@@ -81,7 +81,7 @@ std::optional<DeviceLock::Holder> DeviceLock::holderOf(const std::string& folder
   device::FileDescriptor file(
       ::open((folder + "/" + std::string(device::lockName)).c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
   if (!file.isOpen()) return std::nullopt;
-  // A process that was killed leaves its note: that of one that runs still says what the process says.
+  // A killed process leaves its note behind; the note of a running process says what the system says of the process.
   std::string note = contentOf(file.get());
   std::size_t space = note.find(" (");
   if (space == std::string::npos) return std::nullopt;

@@ -27,7 +27,7 @@ DeviceSession::~DeviceSession() {
   unloadPlugin();
   _device->events().stop();
   for (const auto& rule : _device->boundary().idleRules())
-    _context.console.message("--inject " + rule.text + ": never came to its turn");
+    _context.console.message("--inject " + rule.text + ": its turn never came");
   if (_log && _log->failed()) _context.console.message(_context.options.log + ": not every line could be written");
   if (_calls && _calls->failed())
     _context.console.message(_context.options.calls + ": not every line could be written");

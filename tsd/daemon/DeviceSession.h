@@ -21,15 +21,15 @@
 
 namespace tsd {
 
-/// What a command does with a device: uses it; uses it in a run that the device keeps; or uses a copy of it in memory,
-/// whose events run on the caller's thread when it waits, and whose waits take no time. The copy is of what the store
-/// holds now, whoever is using the device, who is not disturbed; of one that nobody uses it is what the next to open it
-/// will find.
+/// How a command uses a device: `plain`; `kept`, in a run that the device keeps; or `copy`, a copy in memory, whose
+/// events run on the caller's thread when it waits, and whose waits take no time. The copy has what the store holds
+/// now, without disturbing whoever is using the device; if nobody is, it is what the next process to open it will
+/// find.
 enum class DeviceUse : std::uint8_t { plain, kept, copy };
 
 /// A device folder in use by this process: locked unless it is a copy, opened, with the log and the journal that the
-/// common options ask for, and on demand with a plug-in object on it. On the way out the plug-in goes first, then
-/// everything that was posted runs, then the device closes.
+/// common options ask for, and on demand with a plug-in object on it. At the end the plug-in is destroyed first, then
+/// everything that was posted runs, then the device is closed.
 class DeviceSession {
  public:
   struct Setup {
@@ -38,7 +38,7 @@ class DeviceSession {
     platform::TSDeviceService* deviceService = nullptr;
     std::function<void(const device::AppStatus&)> changed{};
     DeviceUse use = DeviceUse::plain;
-    const EarlyEnd* earlyEnd = nullptr;  // what the device declines for; outlives the session
+    const EarlyEnd* earlyEnd = nullptr;  // tells what the device declines; outlives the session
   };
 
   /// Throws a `CommandError` when any of it fails.
@@ -52,12 +52,12 @@ class DeviceSession {
 
   /// Loads the plug-in and makes its object. At most once.
   platform::TSClient& loadPlugin();
-  /// The same; the plug-in's waits end when a stop is wanted, and `tick` tells of them (see `CountdownClock`).
+  /// The same; the plug-in's waits end when a stop is requested, and `tick` is told of them (see `CountdownClock`).
   platform::TSClient& loadPlugin(const StopSignal& stop, CountdownClock::Tick tick = nullptr);
-  /// Lets the plug-in's object go, and everything run that was posted for it.
+  /// Destroys the plug-in's object, and lets everything run that was posted for it.
   void unloadPlugin();
-  /// Everything that was posted runs, and what the device has in memory only is stored. Throws a `CommandError` when
-  /// the store refuses, or a file operation has failed, which the plug-in may have passed over in silence.
+  /// Lets everything that was posted run, and stores what the device has in memory only. Throws a `CommandError` when
+  /// the store refuses, or when a file operation has failed, which the plug-in may have ignored silently.
   void settle();
 
  private:
@@ -73,7 +73,8 @@ class DeviceSession {
   std::optional<LineFile> _calls;
   std::optional<TraceFile> _trace;
   platform::Mutex _mutex;
-  std::string _complaint GUARDED_BY(_mutex);  // the first one. Outlives the device, which may have one as it goes
+  std::string _complaint
+      GUARDED_BY(_mutex);  // the first one. Outlives the device, which may still complain while it is destroyed
   std::unique_ptr<device::LocalDevice> _device;
   std::optional<CountdownClock> _clock;
   std::optional<platform::Platform> _platform;  // the device's with that clock

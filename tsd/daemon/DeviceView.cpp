@@ -25,7 +25,7 @@ DeviceView::DeviceView(const CommandContext& context, const std::string& folder,
 }
 
 std::string DeviceView::holderText() const {
-  return _holder ? wrappedLine("", "Process " + _holder->process + " is at work on it: " + _holder->command + ".") : "";
+  return _holder ? wrappedLine("", "Process " + _holder->process + " is working on it: " + _holder->command + ".") : "";
 }
 
 void DeviceView::addHolder(platform::Value& document) const {

@@ -10,21 +10,21 @@
 
 namespace tsd {
 
-/// A device as it is now, whoever is using it: nobody is waited for or disturbed, nothing is written.
+/// A device as it is now, whoever is using it: nobody is waited for or disturbed, and nothing is written.
 class DeviceView {
  public:
   /// Throws a `CommandError` when the device cannot be read.
   DeviceView(const CommandContext& context, const std::string& folder);
-  /// The same with what is known of the device's progress already.
+  /// The same, when the device's progress is already known.
   DeviceView(const CommandContext& context, const std::string& folder, const RunProgress& progress);
 
   /// A copy in memory.
   device::LocalDevice& device() { return _session.device(); }
-  /// With how far the packages have come, as far as that is known.
+  /// Including how far the packages have come, as far as that is known.
   const device::DeviceStatus& status() const { return _status; }
   /// Who is changing it.
   const std::optional<DeviceLock::Holder>& holder() const { return _holder; }
-  /// "Process 4711 is at work on it: tsd sync phone host." on a line or more; empty when nobody is.
+  /// "Process 4711 is working on it: tsd sync phone host." on a line or more; empty when nobody is.
   std::string holderText() const;
   /// Adds "busy" with the process to a command's document, when there is one.
   void addHolder(platform::Value& document) const;

@@ -81,7 +81,7 @@ PackageTransfer::Result PackageTransfer::send(const Way& way, HostFile& package,
   }
 }
 
-/// What became of the bytes alone; nothing but progress is reported here.
+/// Moves the bytes; reports nothing but progress.
 PackageTransfer::Result PackageTransfer::sendChunks(const Way& way, HostFile& package, device::FileWriter& target) {
   using Action = device::InjectionRule::Action;
   const std::string& id = identifier();

@@ -27,7 +27,7 @@ class PackageTransfer {
     platform::ErrorRef error;  // of a failed or cancelled one
     std::uint64_t bytes = 0;   // sent
   };
-  /// What packages come from and go through. All of it outlives the transfer.
+  /// Where packages come from and what they pass through. All of it outlives the transfer.
   struct Way {
     const std::string& packagesFolder;  // on the host
     device::LocalDevice& device;
@@ -36,12 +36,12 @@ class PackageTransfer {
     const StopSignal& stop;
   };
 
-  /// `reported`, which outlives it, is what the daemon says of the asset.
+  /// `reported` is what the daemon says of the asset; it outlives the transfer.
   PackageTransfer(platform::TSAssetRef asset, const AssetReport& reported)
       : _asset(std::move(asset)), _reported(reported) {}
 
   const std::string& identifier() const { return _asset->identifier(); }
-  /// It ends as cancelled at its next chunk; when it has not begun, nothing of it is sent.
+  /// Ends the transfer as cancelled at its next chunk; if it has not begun, nothing is sent.
   void cancel() { _cancelled = true; }
   /// Throws nothing: running out of memory is the transfer's failure.
   Result carry(const Way& way);

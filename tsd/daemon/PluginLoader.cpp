@@ -20,10 +20,10 @@ PluginLoader::PluginLoader(const std::string& file) : _file(file) {
   }
   void* symbol = ::dlsym(library, platform::pluginEntryPointName);
   if (!symbol) {
-    throw CommandError(file + ": no plug-in: it has no entry point '" + platform::pluginEntryPointName + "'");
+    throw CommandError(file + ": not a plug-in: it has no entry point '" + platform::pluginEntryPointName + "'");
   }
   _table = reinterpret_cast<platform::PluginEntryPoint>(symbol)();
-  if (!_table) throw CommandError(file + ": its entry point answers no table");
+  if (!_table) throw CommandError(file + ": its entry point returns no table");
   if (_table->interfaceVersion != platform::pluginInterfaceVersion) {
     throw CommandError(file + ": speaks version " + std::to_string(_table->interfaceVersion) +
                        " of the plug-in interface, this program version " +
@@ -45,7 +45,7 @@ std::string PluginLoader::defaultFile() {
 
 std::shared_ptr<platform::TSClient> PluginLoader::create(const platform::Platform& platform) const {
   auto client = _table->create(platform);
-  if (!client) throw CommandError(_file + ": the plug-in made no object");
+  if (!client) throw CommandError(_file + ": the plug-in could not make its object");
   return client;
 }
 

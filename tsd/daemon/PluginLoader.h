@@ -7,7 +7,7 @@
 
 namespace tsd {
 
-/// The plug-in's library, which stays loaded until the process ends: what the plug-in handed out may outlive its
+/// The plug-in's library. It stays loaded until the process ends, since what the plug-in handed out may outlive its
 /// object.
 class PluginLoader {
  public:

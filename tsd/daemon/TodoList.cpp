@@ -16,7 +16,7 @@ Value readFile(platform::FileSystem& files, std::string_view path, platform::Err
   return bytes ? plist::read(std::move(*bytes), error) : Value();
 }
 
-/// The dictionary under the key, made when there is none.
+/// The dictionary under the key, which is made if it is missing.
 platform::Dictionary& level(platform::Dictionary& parent, std::string_view key) {
   if (!parent.dictionary(key)) parent.set(key, Value::makeDictionary());
   return *parent.dictionary(key);

@@ -69,7 +69,7 @@ void TransferQueue::start(const std::vector<platform::TSAssetRef>& assets) {
   for (const auto& asset : assets) {
     auto transfer = std::make_shared<PackageTransfer>(asset, report(asset->identifier()));
     if (_unwanted.contains(asset->identifier())) transfer->cancel();
-    _results[asset->identifier()] = {};  // its thread is to find a place for it
+    _results[asset->identifier()] = {};  // so that its thread finds a place for the result
     _waiting.push_back(transfer);
     _transfers[asset->identifier()] = std::move(transfer);
   }

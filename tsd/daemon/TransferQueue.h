@@ -21,11 +21,11 @@
 
 namespace tsd {
 
-/// The daemon's transfers of packages, several in flight, each on a thread of its own ("transfer-1", …), and the
+/// The daemon's transfers of packages, several at a time, each on a thread of its own ("transfer-1", …), and the
 /// service through which the plug-in asks for one to come first or to end.
 ///
-/// Made before the device, as the device hands the plug-in's requests to it; serves it as long as a `Serving` lives.
-/// From the daemon's thread, but for what the plug-in asks, which comes from any.
+/// Made before the device, which passes the plug-in's requests on to it; serves the device as long as a `Serving`
+/// lives. To be called from the daemon's thread; the plug-in's requests come from any.
 class TransferQueue : public platform::TSDeviceService {
  public:
   using End = PackageTransfer::End;
@@ -43,8 +43,8 @@ class TransferQueue : public platform::TSDeviceService {
   TransferQueue(const TransferQueue&) = delete;
   TransferQueue& operator=(const TransferQueue&) = delete;
 
-  /// The device whose packages the queue carries, and the daemon that is told of them. On the way out nothing more is
-  /// taken, and what is in flight ends.
+  /// The device that the queue serves, and the daemon that is told of the packages. At its end nothing more is taken,
+  /// and the running transfers end.
   class Serving {
    public:
     Serving(TransferQueue& queue, device::LocalDevice& device, Daemon& daemon);
@@ -56,15 +56,15 @@ class TransferQueue : public platform::TSDeviceService {
     TransferQueue& _queue;
   };
 
-  /// A sync begins, and what the last one transferred is forgotten: until `start`, requests are about transfers that
-  /// are still to come.
+  /// A sync begins, and what the last one transferred is forgotten. Until `start`, requests are about transfers to
+  /// come.
   void expect();
-  /// Transfers the assets in this order, but for those that were asked for first meanwhile. Throws a `CommandError`
-  /// when there is no place for packages; nothing has been transferred then.
+  /// Transfers the assets in this order, except that those asked for first meanwhile come first. Throws a
+  /// `CommandError` when the directory for packages cannot be made; nothing has been transferred then.
   void start(const std::vector<platform::TSAssetRef>& assets);
   /// True when the last transfer has ended, false when the deadline came first.
   bool waitUntil(platform::Clock::Instant deadline);
-  /// Takes none any more and waits for those in flight. Who asked for one that never came is told.
+  /// Takes no more and waits for the running transfers. Whoever asked for one that never came is told.
   void finish();
 
   Result result(const std::string& identifier) const;
@@ -78,7 +78,7 @@ class TransferQueue : public platform::TSDeviceService {
  private:
   using TransferRef = std::shared_ptr<PackageTransfer>;
   using Completion = std::function<void(platform::ErrorRef)>;
-  /// That a transfer which is still to come goes first.
+  /// The request that a transfer to come goes first.
   struct Wish {
     std::string identifier;
     Completion completion;
@@ -87,7 +87,7 @@ class TransferQueue : public platform::TSDeviceService {
   void work(std::size_t number);
   void endThreads();
   TransferRef takeNext();
-  /// False when there is no such transfer, or it is over; one in flight is first already.
+  /// False when there is no such transfer, or it is over; a running one counts as first.
   bool moveToFront(const std::string& identifier) REQUIRES(_mutex);
   void answer(const Wish& wish, bool outstanding, device::LocalDevice& device) const;
 

@@ -3,8 +3,8 @@
 namespace tsd {
 namespace {
 
-// What does not depend on the options. The shell takes "=" and ":" for words of their own; they are put together again,
-// and what it already has in front of the last of them is cut off the answers.
+// What does not depend on the options. The shell treats "=" and ":" as words of their own; they are joined again, and
+// what precedes the last of them is cut off the answers.
 constexpr const char* frame = R"frame(# Completes command lines of PROGRAM in bash.
 _PROGRAM() {
   local -a words=()
@@ -103,7 +103,7 @@ std::string kindOf(const OptionEntry& option) {
   return words;
 }
 
-/// The line that sets what a subcommand takes.
+/// The line that sets the options and arguments of a subcommand.
 std::string commandCase(const CommandEntry& command) {
   std::string options, arguments;
   bool isRepeatable = false;
@@ -120,7 +120,7 @@ std::string commandCase(const CommandEntry& command) {
          (arguments.empty() ? "none" : arguments.substr(1)) + ") ;;\n";
 }
 
-/// The lines that tell what values the options of a subcommand take.
+/// The lines that tell which values the options of a subcommand take.
 std::string kindCases(const CommandEntry& command) {
   std::string cases;
   for (const auto& option : command.options) {

@@ -6,8 +6,8 @@
 
 namespace tsd {
 
-/// What a shell reads to complete a command line of the program: subcommands, options, their values where those can be
-/// listed, files and folders. Each needs nothing but the shell itself.
+/// The scripts with which shells complete command lines of the program: subcommands, options, their values if those can
+/// be listed, files and folders. Each needs nothing but the shell itself.
 std::string bashCompletion(const OptionTable& table);
 std::string zshCompletion(const OptionTable& table);
 std::string fishCompletion(const OptionTable& table);

@@ -11,7 +11,7 @@ namespace tsd {
 /// How the program ends, and what each code means.
 const std::vector<ExitCodeEntry>& exitCodes();
 
-/// In lines for the right column of a help text on a terminal of 80 columns, or of another width.
+/// Broken into lines for the right column of a help text on a terminal of 80 columns, or of another width.
 std::string wrapped(const std::string& text, std::size_t width = 50);
 
 }  // namespace tsd

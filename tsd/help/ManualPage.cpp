@@ -6,8 +6,8 @@
 namespace tsd {
 namespace {
 
-/// As text that the formatter shows as it is: a hyphen stays one that can be pasted, a full stop at the beginning of a
-/// line is no request.
+/// Escaped so that the formatter shows the text as it is: hyphens can still be copied, and a full stop at the beginning
+/// of a line is not a request.
 std::string plain(const std::string& text) {
   std::string result;
   if (!text.empty() && (text.front() == '.' || text.front() == '\'')) result = "\\&";

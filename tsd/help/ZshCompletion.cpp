@@ -42,7 +42,7 @@ std::string specsOf(const CommandEntry& command) {
   return text;
 }
 
-// Sourced, the script names what it completes; as a file of completions it is called.
+// When it is sourced, the script registers its function; as a file of completions it is the function and is called.
 constexpr const char* frame = R"frame(
 _tsd_apps() {
   local device=${${(Q)words[2]}/#\~/$HOME}

@@ -13,14 +13,14 @@ using platform::Value;
 
 namespace {
 
-/// In the line of a call that may be the end of a mark, which does not name the app.
+/// In the line of a call that may be the end of a mark; it does not name the app.
 constexpr const char* writeOfTodoList = "\"op\":\"writeAtomically\"";
 
 bool isPartOfIdentifier(char c) {
   return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '.' || c == '-' || c == '_';
 }
 
-/// Whether the text names the app, and not one whose identifier has this one's in it.
+/// Whether the text names the app, and not another one whose identifier contains its own.
 bool names(std::string_view text, std::string_view app) {
   for (std::size_t at = text.find(app); at != std::string_view::npos; at = text.find(app, at + 1)) {
     std::size_t end = at + app.size();
@@ -37,7 +37,7 @@ std::string withoutPrefix(std::string_view text) {
   return std::string(bar == std::string_view::npos ? text : text.substr(bar + 1));
 }
 
-/// What a command did by itself, without a call that a journal would have.
+/// What a command did by itself, without a call that a journal would hold.
 std::string deedOf(const RunSummary& run, const std::string& app) {
   auto has = [&](const std::string& word) {
     return std::find(run.arguments.begin(), run.arguments.end(), word) != run.arguments.end();
@@ -58,7 +58,7 @@ std::string AppChapter::answer() const {
     return isRuns ? words + ": " + run.message : words;
   }
   std::string last = lines.empty() ? "" : lines.back().text;
-  if (!run.ended) return "killed, or still running; the last that is known: " + last;
+  if (!run.ended) return "killed, or still running; last known: " + last;
   return run.message.empty() ? last : "the whole run failed: " + run.message;
 }
 

@@ -18,16 +18,16 @@ namespace {
 
 constexpr std::string_view messagePrefix = "com.vantor.tsd.appsync|";
 
-/// What the plug-in says, and which event that is.
+/// A message of the plug-in, and the event it stands for.
 struct MessageRow {
   const char* pattern;
-  std::size_t app;  // which of the pattern's gaps is the app
+  std::size_t app;  // the number of the pattern's gap that holds the app
   Kind kind;
   const char* text;
-  int fact = -1;  // which gap is what else is known; none
+  int fact = -1;  // the number of the gap that holds the fact; -1: none
 };
 
-// The first that fits counts.
+// The first match counts.
 constexpr MessageRow messageRows[] = {
     {"{} not installed, but is in our todo list. Not marking deleted", 0, Kind::goneUntold,
      "gone from the device, still to be installed: the host is not told"},
@@ -42,7 +42,7 @@ constexpr MessageRow messageRows[] = {
     {"prioritize {}", 0, Kind::considered, "its place is that on the home screen"},
     {"lastly {}", 0, Kind::considered, "its place is after those on the home screen"},
     {"{} is currenlty marked to be restored and will be handled by tillerd - skipping", 0, Kind::skipped,
-     "being restored: its package is the restore's to bring"},
+     "being restored: the restore brings its package"},
     {"skipping {} - its not a restore and app installation is disabled", 0, Kind::notAllowed,
      "installing apps is restricted"},
     {"{} is auto demoted: {}, manual demoted: {}, system app:1 - skipping", 0, Kind::skipped,
@@ -54,7 +54,7 @@ constexpr MessageRow messageRows[] = {
      "auto demoted, but requested"},
     {"{} is currenlty demoted (manual:{}, auto:{}) - but will be installed as it's requested by client", 0,
      Kind::chosen, "demoted by hand, but requested"},
-    {"App {} is already installed and will be updated.", 0, Kind::updates, "installed already, to be updated"},
+    {"App {} is already installed and will be updated.", 0, Kind::updates, "already installed, to be updated"},
     {"processing app install for bundle {} finished with status 1 error {}", 0, Kind::prepared,
      "its package is asked for"},
     {"processing app install for bundle {} finished with status {} error {}", 0, Kind::preparationFailed,
@@ -86,7 +86,7 @@ constexpr MessageRow messageRows[] = {
     {"RC finished installing placeholder for {}, _restoringPlaceholderCount {}", 0, Kind::awaitEnded,
      "the restore has its placeholder"},
     {"Shiftwell cancelled coordinator for restoring app bundle {} _restoringPlaceholderCount {}", 0, Kind::awaitEnded,
-     "the restore does not wait for its placeholder any more"},
+     "the restore no longer waits for its placeholder"},
     {"no HarluneMetadata for '{}' - ignoring", 0, Kind::refused, "the restore list has no store metadata of it"},
     {"no harlune restore info for '{}' - skipping", 0, Kind::refused,
      "its entry of the restore list is not a dictionary"},
@@ -106,7 +106,7 @@ std::string wordsOf(std::string_view name) {
   return words;
 }
 
-/// An error as the journal and the messages have it, in words.
+/// An error as the journal and the messages show it, in words.
 std::string reasonIn(std::string_view described) {
   if (described == "(null)") return {};
   return reasonForPeople(described);
@@ -209,7 +209,7 @@ void AppStory::hearCall(const device::CallRecord& record) {
            reasonOfError((*arguments)["error"]));
   } else if (record.operation == "coordinatorCanceledWithReason") {
     std::uint64_t client = (*arguments)["client"].unsignedInteger().value_or(0);
-    // The person gives no reason of their own.
+    // The person gives no reason.
     tell(Kind::cancelled, record.app, "cancelled by " + nameOfClient(client),
          client == 0 ? "" : reasonOfError((*arguments)["reason"]));
   } else if (record.operation == "coordinatorShouldPrioritize") {
@@ -231,7 +231,7 @@ void AppStory::hearMessage(std::string_view text) {
   if (matches(text, "Assets already in progress (not returning these): ({})", gaps)) return hearInProgress(gaps[0]);
   if (matches(text, "RC returned {} creatorIdentifier={}) for {} with error {} - Will not perform {}", gaps)) {
     std::uint64_t client = std::strtoull(std::string(gaps[1]).c_str(), nullptr, 10);
-    _facts[std::string(gaps[2])] = nameOfClient(client) + " has an install of it under way";
+    _facts[std::string(gaps[2])] = nameOfClient(client) + " is already installing it";
     return;
   }
   if (matches(text, "processing app install for bundle '{}', title {}", gaps))
@@ -251,7 +251,7 @@ void AppStory::hearMessage(std::string_view text) {
       tell(Kind::refused, gaps[0], "its identifier would lead out of its folder");
     else
       tell(Kind::pathRefused, called->second,
-           gaps[0] == "(null)" ? "its package came without a path" : "the path of its package is not taken",
+           gaps[0] == "(null)" ? "its package came without a path" : "the path of its package is refused",
            gaps[0] == "(null)" ? "" : std::string(gaps[0]));
     return;
   }

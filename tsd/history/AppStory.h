@@ -16,7 +16,7 @@ namespace tsd {
 /// Something that happened to one app.
 struct AppEvent {
   enum class Kind : std::uint8_t {
-    goneUntold,          // it is not on the device, which the host is not told as it is about to be installed
+    goneUntold,          // it is not on the device; the host is not told, as the app is about to be installed
     deleted,             // it was removed on the device, which the host is told
     removing,            // the host wants it removed
     removed,             // … and it is
@@ -26,8 +26,8 @@ struct AppEvent {
     pathRefused,         // the path of its package
     skipped,             // `text` is the rule, `fact` what the rule saw
     notAllowed,          // installing apps is restricted
-    chosen,              // it passes a rule that it could have been stopped by
-    updates,             // it is installed already
+    chosen,              // it passes a rule that could have stopped it
+    updates,             // it is already installed
     preparing,           // its install is being prepared
     prepared,            // … and is: its package is asked for
     preparationFailed,   // … and is not
@@ -38,8 +38,8 @@ struct AppEvent {
     transferFailed,      // … or has not
     installing,          // the device has all it needs
     installed,           // the end of an install
-    failed,              // the other end
-    cancelled,           // the third: `text` says by whom, `fact` why
+    failed,              // the install failed
+    cancelled,           // the install was cancelled: `text` says by whom, `fact` why
     prioritized,         // the person wants it first
     reported,            // the daemon's own report of an install
     marked,              // its entry of the todo list was changed, and is on disk
@@ -50,8 +50,8 @@ struct AppEvent {
     leftToStore,         // the store is to deliver its package
     awaited,             // the restore waits for its placeholder
     awaitEnded,          // … and does not any more
-    removalsRestricted,  // no app is removed, whatever the host wants; of no app
-    restoreDeclined      // the backup service wants no placeholders; of no app
+    removalsRestricted,  // no app is removed, whatever the host wants; concerns no single app
+    restoreDeclined      // the backup service wants no placeholders; concerns no single app
   };
 
   Kind kind;
@@ -66,17 +66,17 @@ struct AppEvent {
 /// "deleted", "preparationFailed", …
 const char* nameOfKind(AppEvent::Kind kind);
 
-/// What happened to apps, told from the records of a run's journal, given in their order. Everything that makes an
-/// event of a record is here: the calls into the plug-in, and what the plug-in says about what it does.
+/// What happened to apps, from the records of a run's journal, given in their order. Everything that turns records into
+/// events is here: the calls into the plug-in, and the plug-in's messages about what it does.
 class AppStory {
  public:
   using Listener = std::function<void(const AppEvent& event)>;
 
   explicit AppStory(Listener listener) : _listener(std::move(listener)) {}
 
-  /// Whether the record told of an app.
+  /// Answers whether the record told of an app.
   bool hear(const device::CallRecord& record);
-  /// How far a package has come that is on the way; nothing for any other.
+  /// How far the app's package has come; nothing if it is not on the way.
   std::optional<double> fractionOf(const std::string& app) const;
 
  private:
@@ -92,14 +92,14 @@ class AppStory {
   Listener _listener;
   std::chrono::microseconds _now{};
   bool _told = false;
-  std::map<std::string, std::string> _called;              // thread: the app whose package's end it reports
-  std::map<std::string, std::string, std::less<>> _facts;  // app: what was seen before the rule that it matters to
-  std::map<std::string, double> _fractions;                // app: of the package on its way
+  std::map<std::string, std::string> _called;              // by thread: the app whose package's end is being reported
+  std::map<std::string, std::string, std::less<>> _facts;  // by app: what was seen before the rule that uses it
+  std::map<std::string, double> _fractions;                // by app: of the package on its way
   struct Mark {
     std::string app;
     std::string word;
   };
-  std::map<std::string, Mark> _marks;  // thread: what it is about to write into the todo list
+  std::map<std::string, Mark> _marks;  // by thread: what is about to be written into the todo list
   std::string _thread;
 };
 

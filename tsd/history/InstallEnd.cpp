@@ -8,7 +8,7 @@ namespace tsd {
 
 InstallEnd endOf(const device::AppStatus& app) {
   using device::InstallOutcome;
-  // Of the plug-in's cancellation reasons: an install, or a restore, that could not be prepared.
+  // The plug-in's cancellation reasons for an install, or a restore, that could not be prepared.
   constexpr std::string_view givenUp[] = {"TSError 1", "TSError 29"};
   std::string reason = reasonForPeople(app.lastReason);
   if (app.lastOutcome == InstallOutcome::installed) return {Outcome::installed, ""};

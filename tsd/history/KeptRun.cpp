@@ -23,7 +23,7 @@ KeptRun::KeptRun(const std::string& device, const CommonOptions& options, Consol
     writeSummary(nullptr);
     _calls.emplace(_folder + "/calls.jsonl", mostBytes,
                    R"({"note":"the journal is cut off here, as it has become too long"})");
-    _log.emplace(_folder + "/log", mostBytes, "the log is cut off here, as it has become too long");
+    _log.emplace(_folder + "/log", mostBytes, "the log is cut off here because it has become too long");
   } catch (const std::exception& problem) {
     tell(problem.what());
   }
@@ -102,7 +102,7 @@ void KeptRun::end(ExitCode code, const std::string& message) {
 }
 
 void KeptRun::tell(const std::string& problem) {
-  if (!std::exchange(_told, true)) _console.message("this run is not kept whole: " + problem);
+  if (!std::exchange(_told, true)) _console.message("not all of this run is kept: " + problem);
 }
 
 }  // namespace tsd

@@ -16,26 +16,26 @@
 namespace tsd {
 
 /// The run of a command as the device's folder keeps it, in `runs/NUMBER-COMMAND/`: the call journal with brief values,
-/// the system log, what came of each app, and what was run, when and with what result. A line is with the system when
-/// it was heard, so that the files tell of a killed process what it did last. Nothing here fails a command: what goes
-/// wrong is said once.
+/// the system log, what became of each app, and what was run, when and with what result. Each line is handed to the
+/// system at once, so that the files show what a killed process did last. Nothing here makes a command fail: a
+/// problem is reported once.
 class KeptRun {
  public:
-  static constexpr std::size_t most = 20;  // runs of a device; the oldest make room
-  /// Bytes of a run's journal, and of its log; what comes then is left out, which the last line says.
+  static constexpr std::size_t most = 20;  // runs kept on a device; the oldest make room
+  /// Bytes of a run's journal, and of its log; what exceeds them is left out, and the last line says so.
   static constexpr std::uint64_t mostBytes = std::uint64_t{64} << 20;
 
   /// `device` is the device's folder, which this process has locked; `console` outlives the run.
   KeptRun(const std::string& device, const CommonOptions& options, Console& console);
 
-  /// Each under its caller's own lock.
+  /// Both are called under their caller's own lock.
   void hear(const device::CallRecord& record);
   void hear(const device::LogRecord& record);
-  /// Notes what came of the apps, and, where it failed as a whole, why; of a run that does its work several times the
+  /// Notes what became of the apps and, if the run failed as a whole, why; when a run does its work several times, the
   /// last time counts.
   void conclude(const std::vector<AppOutcome>& apps, const std::string& message);
   /// Notes how it ended, with the message of a command that could not go on, once nothing is heard any more (or the
-  /// process is about to end). Without it the run counts as one that was killed.
+  /// process is about to end). Without this the run counts as killed.
   void end(ExitCode code, const std::string& message = {});
 
  private:

@@ -7,8 +7,8 @@
 
 namespace tsd {
 
-/// A text file that is written line by line. A line is with the system when `write` returns, so that it is there even
-/// when the process dies next. One thread at a time.
+/// A text file that is written line by line. The system has a line when `write` returns, so that it survives the death
+/// of the process. One thread at a time.
 class LineFile {
  public:
   /// Replaces an older file. Throws a `CommandError` that names it.

@@ -37,7 +37,7 @@ MappedLines::~MappedLines() {
 
 bool MappedLines::mapNext() {
   std::uint64_t begin = _chunk ? _begin + chunkSize : 0;
-  // Blocks that are not there would end the process when they are written to.
+  // Writing to blocks that the disk does not have would kill the process.
   if (::posix_fallocate(_file.get(), static_cast<off_t>(begin), chunkSize) != 0) return false;
   void* chunk = ::mmap(nullptr, chunkSize, PROT_READ | PROT_WRITE, MAP_SHARED, _file.get(), static_cast<off_t>(begin));
   if (chunk == MAP_FAILED) return false;

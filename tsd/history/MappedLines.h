@@ -10,9 +10,9 @@
 
 namespace tsd {
 
-/// A text file that many lines are written to, through mapped memory: a line is with the system when `write` returns,
-/// so that it is there even when the process dies next, and costs no system call. Until the file is closed it ends with
-/// zero bytes; those that a process left when it died, `trim` removes. One thread at a time.
+/// A text file for many lines, written through mapped memory: the system has a line when `write` returns, so that it
+/// survives the death of the process, and yet costs no system call. Until the file is closed it ends with zero bytes;
+/// `trim` removes those that a killed process left. One thread at a time.
 class MappedLines {
  public:
   /// At most `room` bytes; then `lastLine`, and nothing more. Replaces an older file. Throws a `CommandError` that
@@ -23,12 +23,12 @@ class MappedLines {
   MappedLines(const MappedLines&) = delete;
   MappedLines& operator=(const MappedLines&) = delete;
 
-  /// The line is one: it has no line ends in it. A failure is only remembered.
+  /// The line must not contain line ends. A failure is only remembered.
   void write(std::string_view line);
   /// Whether a line could not be written, for want of room on the disk. From any thread.
   bool failed() const { return _failed; }
 
-  /// Removes the zero bytes at the end of a file that was not closed. Passes over what goes wrong.
+  /// Removes the zero bytes at the end of a file that was not closed. Ignores failures.
   static void trim(const std::string& path);
 
  private:

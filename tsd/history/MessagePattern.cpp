@@ -12,7 +12,7 @@ bool matches(std::string_view text, std::string_view pattern, std::vector<std::s
     pattern.remove_prefix(next + gap.size());
     next = pattern.find(gap);
     std::string_view literal = pattern.substr(0, next);
-    // What stands at the end reaches to the text's end.
+    // A gap at the pattern's end reaches to the end of the text.
     std::size_t end = next != std::string_view::npos ? text.find(literal)
                       : text.size() < literal.size() ? std::string_view::npos
                                                      : text.size() - literal.size();

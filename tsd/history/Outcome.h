@@ -11,20 +11,20 @@
 
 namespace tsd {
 
-/// What came of one app in a sync or a restore. The set is closed: these words stand in tables, last lines, documents
-/// and kept runs, and nowhere else is an outcome told by other words.
+/// What became of one app in a sync or a restore. The set is closed: tables, last lines, documents and kept runs use
+/// these words and no others.
 enum class Outcome : std::uint8_t {
   installed,     // as the host wants it
-  removed,       // … not on the device any more
-  absent,        // … nor was it before
+  removed,       // as the host wants it: no longer on the device
+  absent,        // the same, and it was not there before either
   placed,        // of a restore: its placeholder is on the home screen, the rest is the store's
-  unrecorded,    // it is installed, and its entry of the todo list does not say so
-  sent,          // its package has arrived, and is not to be installed by this sync
-  downloaded,    // … and is the restore's to install
+  unrecorded,    // it is installed, but its entry of the todo list does not say so
+  sent,          // its package has arrived, but this sync does not install it
+  downloaded,    // the same: the restore installs it
   waiting,       // an install of it is open
   notAllowed,    // restricted on the device
-  skipped,       // a rule of the plug-in passes over it
-  notRequested,  // the plug-in did not ask for its package, and did not say why
+  skipped,       // by a rule of the plug-in
+  notRequested,  // the plug-in did not ask for its package and did not say why
   refused,       // its identifier, or its entry of the restore list
   unchanged,     // its entry of the todo list asks for nothing
   cancelled,     // by somebody
@@ -40,16 +40,16 @@ std::optional<Outcome> outcomeNamed(std::string_view name);
 /// Whether the app is as the host wants it.
 bool isInOrder(Outcome outcome);
 
-/// What came of one app, with its facts.
+/// What became of one app, with its facts.
 struct AppOutcome {
   std::string id;
   std::string name;
   std::string version;
   Outcome outcome = Outcome::notReached;
-  std::string reason;  // empty where there is none to give
+  std::string reason;  // empty if there is none
 };
 
-/// How many apps there are of each outcome.
+/// How many apps have each outcome.
 class OutcomeCounts {
  public:
   OutcomeCounts() = default;
@@ -60,7 +60,7 @@ class OutcomeCounts {
   std::size_t inOrder() const;
   /// "5 of 8 apps in order, 2 failed, 1 not allowed"; empty without apps.
   std::string text() const;
-  /// A dictionary of names and numbers, of outcomes that there are.
+  /// A dictionary of the outcomes that occur, by name, with their numbers.
   platform::Value document() const;
   static OutcomeCounts ofDocument(const platform::Value& document);
 
@@ -68,7 +68,7 @@ class OutcomeCounts {
   std::map<Outcome, std::size_t> _counts;
 };
 
-/// The reasons for people, a line each; one that several apps have is told once, with their number.
+/// The reasons for people, a line each; a reason that several apps share appears once, with their number.
 std::string reasonsText(const std::vector<AppOutcome>& apps);
 
 /// An array of dictionaries of "id", "name", "version", "outcome" and "reason".

@@ -92,7 +92,7 @@ void readJournal(const RunSummary& run, const std::vector<std::string>& texts,
   std::ifstream file(run.folder + "/calls.jsonl", std::ios::binary);
   std::string line;
   while (std::getline(file, line)) {
-    if (!line.empty() && line.front() == '\0') break;  // of a run that goes on
+    if (!line.empty() && line.front() == '\0') break;  // the run is still going on
     auto isIn = [&line](const std::string& text) { return line.find(text) != std::string::npos; };
     if (std::none_of(texts.begin(), texts.end(), isIn)) continue;
     if (auto record = device::parseJournalLine(line)) each(*record);

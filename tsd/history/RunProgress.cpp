@@ -19,7 +19,7 @@ namespace {
 constexpr std::size_t blockSize = std::size_t{1} << 20;
 constexpr std::string_view progressCall = R"("op":"assetTransferUpdatedProgress","app":)";
 
-/// The journal of the last sync, when that has not come to its end.
+/// The journal of the last sync, if that sync has not come to its end.
 std::string openJournalOf(const std::string& runs) {
   auto all = keptRuns(runs);
   auto last = std::find_if(all.rbegin(), all.rend(), [](const auto& run) { return run.command == "sync"; });
@@ -45,7 +45,7 @@ bool RunProgress::refresh() {
     ssize_t count = ::pread(file.get(), block.data() + kept, blockSize, static_cast<off_t>(_read + kept));
     if (count < 0 && errno == EINTR) count = 0;
     block.resize(kept + static_cast<std::size_t>(std::max<ssize_t>(0, count)));
-    // Behind the last line of a run that goes on there are zeros.
+    // Behind the last line of a run that is still going on there are zeros.
     std::size_t end = std::min(block.find('\0', kept), block.size());
     std::string_view text = std::string_view(block).substr(0, end);
     const std::size_t lines = text.rfind('\n') + 1;  // bytes of those that are whole

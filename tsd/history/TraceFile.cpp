@@ -12,14 +12,14 @@ using Kind = AppEvent::Kind;
 
 namespace {
 
-// What an app goes through, in this order; a later one ends those before it.
+// What an app goes through, in this order; a later stage ends those before it.
 constexpr int stagePrepare = 1;
 constexpr int stagePlaceholder = 2;
 constexpr int stageReady = 3;
 constexpr int stageTransfer = 4;
 constexpr int stageInstall = 5;
 
-/// A stage that lasts; nothing for one that is only the end of the stage before.
+/// The name of a stage that lasts; nothing for one that is only the end of the stage before.
 const char* nameOfStage(int stage) {
   switch (stage) {
     case stagePrepare:
@@ -158,7 +158,7 @@ void TraceFile::hearStep(const device::CallRecord& record) {
 }
 
 void TraceFile::enterStage(Track& track, int stage, std::string_view app, microseconds time, const std::string& facts) {
-  // The outermost slice is the app's whole way.
+  // The outermost slice covers the app's whole way.
   if (track.open == 0) begin(track, time, app, "");
   while (track.open > 1) end(track, time, "");
   track.stage = stage;
@@ -187,7 +187,7 @@ void TraceFile::instant(Track& track, microseconds time, std::string_view name, 
   write(track, "i", std::max(track.last, time), name, ",\"s\":\"t\",\"args\":{" + facts + "}");
 }
 
-/// A call to a service is heard of when it has returned.
+/// The record of a call to a service comes when the call has returned.
 void TraceFile::whole(Track& track, const device::CallRecord& record, const std::string& facts) {
   auto began = std::max(track.last, record.began);
   auto took = std::max(microseconds(0), record.time - began);

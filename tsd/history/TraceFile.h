@@ -12,16 +12,16 @@
 
 namespace tsd {
 
-/// A timeline of a run in the trace event format: a track for each app, with what became of it as slices in one
-/// another, and a track for each thread, with the calls that crossed between the plug-in and the device.
+/// A timeline of a run in the trace event format: a track for each app, with what became of it as nested slices, and a
+/// track for each thread, with the calls that crossed between the plug-in and the device.
 ///
-/// An event is with the system when it was heard. The file of a process that was killed lacks the bracket at its end
-/// and the ends of what was under way, which the format allows. One thread at a time.
+/// Each event is handed to the system at once. The file of a killed process lacks the bracket at its end and the ends
+/// of what was running, which the format allows. One thread at a time.
 class TraceFile {
  public:
   /// Replaces an older file. Throws a `CommandError` that names it.
   explicit TraceFile(const std::string& path);
-  /// Ends what is still under way, and the file.
+  /// Ends what is still running, and the file.
   ~TraceFile();
   TraceFile(const TraceFile&) = delete;
   TraceFile& operator=(const TraceFile&) = delete;
@@ -35,7 +35,7 @@ class TraceFile {
   struct Track {
     Group group;
     std::size_t number;                // within its group
-    std::chrono::microseconds last{};  // nothing on the track ends later so far
+    std::chrono::microseconds last{};  // the latest end on the track so far
     std::size_t open = 0;              // slices that have begun and not ended
     int stage = 0;                     // of an app: how far it is (see the source)
   };

@@ -106,7 +106,7 @@ void Verdicts::take(const AppEvent& event) {
       if (!_declined.count(event.app)) _verdicts[event.app].removal = event;
       break;
     default:
-      // What the plug-in takes for a failure there is that its turn never came.
+      // The plug-in takes it for a failure there, but its turn never came.
       if (_declined.count(event.app)) break;
       if (outcomeOf(event.kind)) _verdicts[event.app].last = event;
   }

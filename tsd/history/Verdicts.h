@@ -13,20 +13,20 @@
 
 namespace tsd {
 
-/// What the plug-in said of each app while it worked, from the records of the journal. A plan and a sync ask here, so
-/// that both give the same reasons. Heard under the journal's lock, asked from any thread.
+/// What the plug-in said of each app while it worked, from the records of the journal. A plan and a sync both ask here,
+/// so that they give the same reasons. `hear` runs under the journal's lock; questions come from any thread.
 class Verdicts {
  public:
   struct Verdict {
-    std::optional<AppEvent> last;       // that settles its install
-    std::optional<AppEvent> removal;    // how its removal ended, which may be told before or after the former
-    std::optional<AppEvent> exception;  // the rule that it passed though it might have been stopped
+    std::optional<AppEvent> last;       // what settles its install
+    std::optional<AppEvent> removal;    // how its removal ended; may be heard before or after the end of its install
+    std::optional<AppEvent> exception;  // the rule that it passed although it could have been stopped
     std::optional<AppEvent> pathRefused;
     std::optional<AppEvent> markFailed;
     bool updates = false;
-    bool isAwaited = false;  // by a restore, still
+    bool isAwaited = false;  // by a restore, even now
 
-    /// Why it is not installed. That it was removed first is no answer to that.
+    /// Why it is not installed. That it was removed first does not answer that.
     const std::optional<AppEvent>& ofInstall() const {
       return !last && removal && removal->kind == AppEvent::Kind::removalFailed ? removal : last;
     }
@@ -44,11 +44,11 @@ class Verdicts {
   void restart();
 
   Verdict of(const std::string& app) const;
-  /// Why no app is removed; empty: they are.
+  /// Why no app is removed; empty: apps are removed.
   std::string removalsRestricted() const;
-  /// Why the restore did nothing; nothing when it did.
+  /// Why the restore did nothing; nothing if it did something.
   std::optional<AppEvent> restoreDeclined() const;
-  /// The transfers that came to a bad end since this was last asked.
+  /// The transfers that have failed since this was last asked.
   std::vector<Ending> takeEndings();
 
  private:
@@ -62,10 +62,10 @@ class Verdicts {
   std::string _removalsRestricted GUARDED_BY(_mutex);
   std::optional<AppEvent> _restoreDeclined GUARDED_BY(_mutex);
   std::vector<Ending> _endings GUARDED_BY(_mutex);
-  std::set<std::string, std::less<>> _declined GUARDED_BY(_mutex);  // the device did not begin with them any more
+  std::set<std::string, std::less<>> _declined GUARDED_BY(_mutex);  // the device declined to begin with them
 };
 
-/// The outcome that an app has by such an event, when that settles it.
+/// The outcome that such an event settles, if any.
 std::optional<Outcome> outcomeOf(AppEvent::Kind kind);
 
 }  // namespace tsd

@@ -135,7 +135,7 @@ void HostCheck::checkTodoEntry(const List& list, std::size_t place) {
   const std::size_t line = list.lineOf(place);
   const std::string number = "entry " + std::to_string(place + 1);
   if (auto problem = problemOfTodoEntry(entry); !problem.empty()) {
-    add({Weight::problem, list.path, line, "", number + " is passed over: " + problem,
+    add({Weight::problem, list.path, line, "", number + " is ignored: " + problem,
          "give it an \"identifier\" and an \"operation\", install or remove"});
     return;
   }

@@ -15,7 +15,7 @@ namespace tsd {
 
 namespace {
 
-/// The number at the front of a part between dots; what is no number counts as 0.
+/// The number at the front of a part between dots; 0 if there is no number.
 std::uint64_t partOf(std::string_view version, std::size_t& at) {
   std::uint64_t number = 0;
   bool isNumber = true;
@@ -27,7 +27,7 @@ std::uint64_t partOf(std::string_view version, std::size_t& at) {
   return number;
 }
 
-/// Whether it comes before the other, part by part.
+/// Whether the version is older than the other, compared part by part.
 bool isOlder(std::string_view version, std::string_view other) {
   for (std::size_t one = 0, two = 0; one < version.size() || two < other.size();) {
     auto left = partOf(version, one), right = partOf(other, two);

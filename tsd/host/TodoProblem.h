@@ -6,7 +6,7 @@
 
 namespace tsd {
 
-/// Why nobody can act on an element of a todo list; empty: somebody can.
+/// Why an element of a todo list cannot be acted on; empty if it can.
 std::string problemOfTodoEntry(const platform::Value& entry);
 
 }  // namespace tsd

@@ -35,7 +35,7 @@ bool turnsText(gunichar c) {
   return c == 0x200e || c == 0x200f || c == 0x61c || (c >= 0x202a && c <= 0x202e) || (c >= 0x2066 && c <= 0x2069);
 }
 
-/// Valid UTF-8 on one line, without what would turn other text round.
+/// Valid UTF-8 on one line, without what would change the direction of other text.
 std::string drawable(std::string_view text) {
   std::unique_ptr<char, Free> valid(g_utf8_make_valid(text.data(), static_cast<gssize>(text.size())));
   std::string result;
@@ -49,7 +49,7 @@ std::string drawable(std::string_view text) {
   return result;
 }
 
-/// Letters stand where the font wants them, not on the next whole pixel: the picture is scaled.
+/// Letters are placed where the font wants them, not at the nearest whole pixel: the picture is scaled.
 void placeFreely(PangoLayout* layout) {
   std::unique_ptr<cairo_font_options_t, void (*)(cairo_font_options_t*)> options(cairo_font_options_create(),
                                                                                  cairo_font_options_destroy);
@@ -159,7 +159,7 @@ void drawTextInMiddle(cairo_t* pen, std::string_view text, const Box& box, const
 
 std::string withoutMiddle(cairo_t* pen, std::string_view text, double width, const TextStyle& style) {
   if (widthOfText(pen, text, style) <= width) return std::string(text);
-  // The end matters most: it says what went wrong, the beginning of what.
+  // The end matters most: it says what went wrong; the beginning says with what.
   std::string_view front, back;
   std::string best;
   auto fits = [&](std::string_view one, std::string_view other) {

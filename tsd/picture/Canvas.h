@@ -25,7 +25,7 @@ struct Box {
 /// The colours of a picture.
 struct Theme {
   Colour ground, paper, ink, faintInk, accent, failure;
-  Colour veil;      // over what is not there yet
+  Colour veil;      // covers what is not there yet
   double hairline;  // opacity of the ink round an icon
 };
 constexpr Theme lightTheme{{0.925, 0.933, 0.945}, {1, 1, 1},          {0.13, 0.16, 0.21}, {0.36, 0.40, 0.47},
@@ -43,8 +43,8 @@ class Canvas {
   Canvas(double width, double height, double scale = 1, PictureFormat format = PictureFormat::png);
 
   cairo_t* pen() const { return _pen.get(); }
-  /// The picture as a file has it; nothing is drawn any more. Throws a `CommandError` when anything that was drawn
-  /// could not be.
+  /// The picture as the content of a file; nothing can be drawn afterwards. Throws a `CommandError` when anything that
+  /// was drawn could not be.
   platform::Bytes finish();
 
  private:
@@ -67,12 +67,12 @@ struct TextStyle {
   int lines = 1;                                 // at most; what does not fit ends in "…",
   enum class Cut { end, front } cut = Cut::end;  // or begins with it
 };
-/// Writes a text from anywhere into a box, at its top: any script, in its own direction, whatever it says of the
-/// direction of others. Broken UTF-8 and characters that no font has become marks.
+/// Writes a text from outside into a box, at its top: any script, in its own direction, whatever direction marks it
+/// holds. Broken UTF-8 and characters that no font has are shown as marks.
 void drawText(cairo_t* pen, std::string_view text, const Box& box, const TextStyle& style);
 /// The same with the text's one line in the middle of the box's height.
 void drawTextInMiddle(cairo_t* pen, std::string_view text, const Box& box, const TextStyle& style);
-/// The text, or so many of its first and of its last words as fit into the width, with "…" between them.
+/// The text, or as many of its first and last words as fit into the width, with "…" between them.
 std::string withoutMiddle(cairo_t* pen, std::string_view text, double width, const TextStyle& style);
 /// How wide the text is on one line.
 double widthOfText(cairo_t* pen, std::string_view text, const TextStyle& style);

@@ -41,7 +41,7 @@ struct LegendItem {
   std::size_t line = 0;
 };
 
-/// What the looks mean that occur, and how often they do.
+/// What each look in the picture means, and how often it occurs.
 std::vector<LegendItem> legendOf(const HomePages& home) {
   std::vector<LegendItem> items;
   auto add = [&](std::size_t count, const char* text, HomeLook look, bool failed) {
@@ -59,7 +59,7 @@ std::vector<LegendItem> legendOf(const HomePages& home) {
   return items;
 }
 
-/// Where everything goes; in units.
+/// The places of everything, in units.
 struct Arrangement {
   std::size_t pages;   // drawn
   std::size_t across;  // pages side by side
@@ -86,7 +86,7 @@ struct Arrangement {
     height = failuresTop + (failures ? 34 + static_cast<double>(failures) * failureHeight : 0) + 8;
   }
 
-  /// Answers its number of lines.
+  /// Answers the number of lines.
   double placeLegend() {
     Canvas scratch(1, 1);
     double x = margin;

@@ -11,11 +11,11 @@ namespace tsd {
 
 /// Icons that fit on a page of the picture.
 constexpr std::size_t homePageSize = 20;
-/// Pages that are drawn; of more the picture tells how many there are.
+/// Pages that are drawn; if there are more, the picture says how many.
 constexpr std::size_t homePagesDrawn = 24;
 
-/// A picture of the home screen as a file has it: pages of icons side by side, each icon looking like what its app is,
-/// and a legend. Throws a `CommandError` when it cannot be drawn.
+/// A picture of the home screen as the content of a file: pages of icons side by side, each drawn by the state of its
+/// app, and a legend. Throws a `CommandError` when it cannot be drawn.
 platform::Bytes drawHome(const HomePages& home, const std::string& title, const Theme& theme, PictureFormat format);
 
 }  // namespace tsd

@@ -26,7 +26,7 @@ cairo_status_t take(void* source, unsigned char* data, unsigned length) {
 
 void traceIcon(cairo_t* pen, const Box& box) { traceRounded(pen, box, box.width * cornerShare); }
 
-/// The same for the same identifier, always.
+/// Always the same for the same identifier.
 double hueOf(const std::string& id) {
   std::uint32_t hash = 2166136261U;
   for (unsigned char c : id) hash = (hash ^ c) * 16777619U;
@@ -52,7 +52,7 @@ void drawLetter(cairo_t* pen, const HomeIcon& icon, const Box& box) {
   drawTextInMiddle(pen, initialOf(icon), box, {box.width * 0.5, white, 1, true, TextStyle::Align::centre});
 }
 
-/// Takes the colour out of an image.
+/// Removes the colour from an image.
 void drainColour(cairo_surface_t* image) {
   auto format = cairo_image_surface_get_format(image);
   if (format != CAIRO_FORMAT_ARGB32 && format != CAIRO_FORMAT_RGB24) return;
@@ -101,7 +101,7 @@ void drawBar(cairo_t* pen, const Box& box, double progress, const Theme& theme) 
   cairo_fill(pen);
 }
 
-/// That somebody else is to bring the package.
+/// The sign that somebody else will bring the package.
 void drawDots(cairo_t* pen, const Box& box, const Theme& theme) {
   double radius = box.width * 0.04;
   for (int dot = -1; dot <= 1; ++dot) {
@@ -112,7 +112,7 @@ void drawDots(cairo_t* pen, const Box& box, const Theme& theme) {
   }
 }
 
-/// So that one that is white, or has transparent edges, ends somewhere.
+/// An outline, for icons that are white or have transparent edges.
 void drawOutline(cairo_t* pen, const Box& box, bool dashed, const Theme& theme) {
   double width = dashed ? std::max(1.0, box.width * 0.028) : std::max(0.6, box.width * 0.012);
   double dash[] = {box.width * 0.09, box.width * 0.06};

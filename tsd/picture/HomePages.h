@@ -17,7 +17,7 @@ enum class HomeLook : std::uint8_t {
   updating,   // installed, and a newer version is on its way
   waiting,    // a placeholder whose package is on its way
   restoring,  // a placeholder that the store is to deliver
-  demoted,    // a placeholder that stays one until the person wants the app
+  demoted,    // a placeholder until the person wants the app
 };
 constexpr std::size_t homeLooks = 5;
 /// "installed", "updating", …
@@ -29,10 +29,10 @@ struct HomeIcon {
   HomeLook look = HomeLook::installed;
   bool failed = false;    // its last install did
   double progress = 0;    // 0…1, of an app that is updating or waiting
-  platform::Bytes image;  // PNG; empty when the app has none that can be drawn, and where none was asked for
+  platform::Bytes image;  // PNG; empty if the app has none that can be drawn, or none was asked for
 };
 
-/// What stands under the icon: the name or, when that is blank, the last part of the identifier.
+/// The text under the icon: the name or, when that is blank, the last part of the identifier.
 std::string labelOf(const HomeIcon& icon);
 
 /// An app that is not on the home screen because its install failed.
@@ -41,7 +41,7 @@ struct FailedApp {
   std::string reason;
 };
 
-/// The home screen as the device's services tell of it.
+/// The home screen as the device's services describe it.
 struct HomePages {
   std::vector<std::vector<HomeIcon>> pages;  // none of them empty
   std::vector<FailedApp> failed;
@@ -51,8 +51,8 @@ struct HomePages {
   std::size_t icons() const;
 };
 
-/// The apps in the order of the host's layout, then those that it does not name; a page of the layout that holds more
-/// than `pageSize` goes on on another one. `status` is the device's. Images are those of the first `pagesWithImages`
+/// The apps in the order of the host's layout, then those that it does not name; a page of the layout with more than
+/// `pageSize` apps continues on another one. `status` is the device's. Images are those of the first `pagesWithImages`
 /// pages.
 HomePages readHomePages(device::LocalDevice& device, const device::DeviceStatus& status, std::size_t pageSize,
                         std::size_t pagesWithImages);

@@ -48,7 +48,7 @@ std::string whatOf(const HomeIcon& icon) {
 }
 
 std::string pageText(const std::vector<HomeIcon>& page, const std::string& heading) {
-  // Each app's cell ends with a space, the last one's beyond the line.
+  // Each app's cell ends with a space; that of the last one is beyond the line.
   auto line = [](std::string inside) {
     inside.pop_back();
     return "│ " + fitted(inside, lineColumns) + " │\n";

@@ -6,8 +6,8 @@
 
 namespace tsd {
 
-/// A picture of the home screen in signs, 80 columns wide at most: pages with four apps in a row, below each what it
-/// is, and what the signs mean.
+/// A picture of the home screen in characters, at most 80 columns wide: pages with four apps in a row, below each app
+/// its state, and a legend.
 std::string homeInText(const HomePages& home, const std::string& title);
 
 }  // namespace tsd

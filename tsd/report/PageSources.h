@@ -4,7 +4,7 @@
 
 namespace tsd {
 
-/// The files of `tsd/report/page/`, which the build puts into the program.
+/// The files of `tsd/report/page/`, which the build embeds in the program.
 extern const std::string_view reportMarkup;
 extern const std::string_view reportStyle;
 extern const std::string_view reportScript;

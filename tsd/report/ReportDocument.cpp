@@ -23,7 +23,7 @@ namespace {
 constexpr std::size_t pageSize = 20;
 constexpr std::size_t pagesWithImages = 6;  // those that the page shows at first
 
-/// How an outcome is meant: as wanted, wrong, not at its end, or neither.
+/// What an outcome means: as wanted, wrong, not at its end, or none of these.
 const char* toneOf(Outcome outcome) {
   if (isInOrder(outcome)) return "good";
   switch (outcome) {
@@ -42,7 +42,7 @@ const char* toneOf(Outcome outcome) {
   }
 }
 
-/// The outcome that the event decides, as far as the run's journal tells it: of what is still under way, for now.
+/// The outcome that the event decides, as far as the run's journal tells; provisional for what is still running.
 std::optional<Outcome> outcomeFor(Kind kind) {
   switch (kind) {
     case Kind::installed:
@@ -102,7 +102,7 @@ Value pair(std::string_view one, const Value& other) {
   return item;
 }
 
-/// What the run was to each app, and the journal itself.
+/// What the run meant for each app, and the journal itself.
 class Reading {
  public:
   explicit Reading(const RunSummary& run) : _story([this](const AppEvent& event) { take(event); }) {
@@ -177,11 +177,11 @@ Value valueOfHome(const ReportSubject& subject, device::LocalDevice& device) {
     item.set("reason", app.reason);
   }
   result.dictionary()->set("failed", failedApps);
-  result.dictionary()->set("note", subject.isRunning
-                                       ? "As it was when this report was made, while a process was at work."
-                                   : subject.isLast ? "As the run left it."
-                                                    : "As it was when this report was made; later runs have "
-                                                      "changed it since this one.");
+  result.dictionary()->set(
+      "note", subject.isRunning ? "As it was when this report was made, while a process was working on the device."
+              : subject.isLast  ? "As the run left it."
+                                : "As it was when this report was made; later runs have "
+                                  "changed it since this one.");
   return result;
 }
 

@@ -11,12 +11,12 @@
 
 namespace tsd {
 
-/// What a report is made of besides what the run itself left.
+/// What a report is made from, besides what the run itself left.
 struct ReportSubject {
   std::string deviceName;
   RunSummary run;
   bool isLast = true;        // no run came after it
-  bool isRunning = false;    // a process is at work on the device
+  bool isRunning = false;    // a process is working on the device
   device::DeviceStatus now;  // the device's
   std::string version;       // of the program
 };

@@ -19,7 +19,7 @@ int kindOf(const device::CallRecord& record) {
   return record.service == "AppsClient" ? 1 : 0;
 }
 
-/// At most so many bytes, whole characters.
+/// At most that many bytes, in whole characters.
 std::string shortened(std::string text) {
   if (text.size() <= mostText) return text;
   std::size_t end = mostText;
@@ -42,7 +42,7 @@ std::string textOfRow(const device::CallRecord& record) {
   return shortened(text + endOf(record));
 }
 
-/// An error may also be what was asked for, or among a callback's arguments.
+/// An error may also be the result itself, or among a callback's arguments.
 bool isWrong(const device::CallRecord& record) {
   if (record.error) return true;
   if (record.operation == "error") return record.service == "log" || !record.result.isAbsent();
@@ -88,7 +88,7 @@ void ReportJournal::hearEnd(const device::CallRecord& record) {
 
 ReportJournal::Worth ReportJournal::worthOf(const device::CallRecord& record) const {
   if (isWrong(record)) return Worth::message;
-  // What a package's progress causes is thousands of records that say the same.
+  // The progress of a package causes thousands of records that say the same.
   if (record.operation == "assetTransferUpdatedProgress") return Worth::progress;
   auto open = _open.find(record.thread);
   if (open != _open.end() && !open->second.empty() && _rows[open->second.back()].worth == Worth::progress)

@@ -13,21 +13,21 @@
 
 namespace tsd {
 
-/// A run's journal as a report has it: short, a call into the plug-in and its return in one row, and of more rows than
-/// fit those that tell most.
+/// A run's journal in a form for reports: short, with a call into the plug-in and its return in one row; if there are
+/// more rows than fit, it keeps those that tell most.
 class ReportJournal {
  public:
   static constexpr std::size_t mostRows = 40000;
 
   /// In their order.
   void hear(const device::CallRecord& record);
-  /// Tables of words, rows of places in them, and what was left out.
+  /// Tables of words, rows of indices into them, and what was left out.
   platform::Value document() const;
-  /// When the last record was made, since the device was opened.
+  /// When the last record was made, counted from the opening of the device.
   std::chrono::microseconds end() const { return _end; }
 
  private:
-  /// What a row is worth, the best first; those that do not fit are left out by it.
+  /// How much a row tells, the most first; rows that do not fit are left out in this order, from the end.
   enum class Worth : std::uint8_t { message, pluginCall, deviceCall, file, progress };
   static constexpr std::size_t worths = 5;
 
@@ -52,7 +52,7 @@ class ReportJournal {
 
   Words _threads, _services, _operations, _apps;
   std::vector<Row> _rows;
-  std::map<std::string, std::vector<std::size_t>> _open;  // thread: its calls into the plug-in, as places of rows
+  std::map<std::string, std::vector<std::size_t>> _open;  // by thread: its calls into the plug-in, as indices of rows
   std::chrono::microseconds _end{};
 };
 

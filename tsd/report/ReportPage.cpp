@@ -8,7 +8,7 @@
 namespace tsd {
 namespace {
 
-/// JSON that holds nothing that could end the element it stands in.
+/// JSON without anything that could end the element that contains it.
 std::string jsonForMarkup(const platform::Value& document) {
   const std::string json = device::jsonText(document);
   std::string text;

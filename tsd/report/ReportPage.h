@@ -6,8 +6,8 @@
 
 namespace tsd {
 
-/// One HTML file that shows the document in any browser, and asks for nothing else. Nothing in the document is taken
-/// for markup or for a script.
+/// One HTML file that shows the document in any browser and needs nothing else. Nothing in the document can act as
+/// markup or script.
 std::string reportPage(const platform::Value& document);
 
 }  // namespace tsd

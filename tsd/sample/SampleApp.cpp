@@ -17,7 +17,7 @@ constexpr const char* firstParts[] = {"Quill", "Bramble", "Tarn",   "Osier",  "F
                                       "Moss",  "Pocket",  "Sorrel", "Wicker", "Candle", "Thistle", "Ferry", "Gable"};
 constexpr const char* secondParts[] = {"wick", "gate", "mere", "well", "fold", "stead", "low", "field"};
 constexpr const char* makers[] = {"Example Works", "Sample & Daughters", "Fictional Software", "Nowhere Labs"};
-// The names that every fifth app goes by, and the languages they are of.
+// The names of every fifth app, and their languages.
 constexpr const char* otherNames[] = {"Grünspecht", "Тихий сад",    "静かな庭", "حديقة هادئة",
                                       "शांत बाग",    "Ήσυχος κήπος", "สวนเงียบ"};
 constexpr const char* otherLanguages[] = {"de", "ru", "ja", "ar", "hi", "el", "th"};
@@ -41,7 +41,7 @@ std::string lowered(std::string text) {
   return text;
 }
 
-/// Every pair of parts once, then again with a number.
+/// Every pair of parts once, then all of them again with a number.
 std::string sampleName(std::size_t first, std::size_t place) {
   std::size_t pairs = std::size(firstParts) * std::size(secondParts);
   std::size_t pair = (first + place) % pairs;

@@ -17,7 +17,7 @@ class SampleNumbers {
   /// Below `count`, which is not 0.
   std::size_t below(std::size_t count) { return static_cast<std::size_t>(next() % count); }
   platform::Bytes bytes(std::size_t count);
-  /// A whole second of this century.
+  /// A date in this century, in whole seconds.
   platform::Date date();
 
  private:
@@ -31,13 +31,13 @@ struct SampleApp {
   std::string version;
   std::string maker;
   std::string account;          // the store account under which it was obtained
-  std::uint64_t accountNumber;  // the same, as the store counts
+  std::uint64_t accountNumber;  // the same account as the store numbers it
   bool isAutoDownload = false;
   platform::Bytes icon;  // PNG
   std::size_t files;     // of its package
-  std::uint64_t seed;    // of what else is in its lists
+  std::uint64_t seed;    // of the other values in its lists
 
-  /// "Info.plist" of its bundle: 40 keys, most of which nobody asks for, as with any app.
+  /// "Info.plist" of its bundle: 40 keys, most of which nobody reads, as with any app.
   platform::Value manifest() const;
   /// "HarluneMetadata.plist": 25 keys.
   platform::Value storeMetadata() const;

@@ -19,7 +19,7 @@ struct SampleOptions {
   std::uint64_t seed = 1;
   bool demo = false;
 };
-/// What an entry of a sample's todo list is there for.
+/// What an entry of a sample's todo list is meant to show.
 enum class SampleRole : std::uint8_t { install, older, damaged, badIdentifier, remove };
 const char* nameOfRole(SampleRole role);
 
@@ -37,14 +37,14 @@ class SampleHost {
 
   explicit SampleHost(const SampleOptions& options);
 
-  /// Writes everything into the folder, which is made. Throws a `CommandError` that names the file.
+  /// Makes the folder and writes everything into it. Throws a `CommandError` that names the file.
   void write() const;
 
   const std::vector<Entry>& entries() const { return _entries; }
   /// The apps of the restore list: of each five two plain ones, one demoted by hand, one automatically, one in both
   /// lists.
   std::vector<const SampleApp*> restored() const;
-  /// How the app at that place of `restored()` stands in the demoted-apps list.
+  /// How the demoted-apps list has the app at that place of `restored()`.
   static Demotion demotionAt(std::size_t place) {
     return {place % 5 == 2 || place % 5 == 4, place % 5 == 3 || place % 5 == 4};
   }

@@ -24,7 +24,7 @@ void drawGround(cairo_t* pen, double hue) {
   cairo_clip(pen);
 }
 
-/// A large faint figure behind the letters, so that icons differ in shape as well as in colour.
+/// A large faint figure behind the letters, so that icons differ in more than colour.
 void drawMark(cairo_t* pen, std::size_t figure) {
   cairo_set_source_rgba(pen, 1, 1, 1, 0.22);
   switch (figure) {

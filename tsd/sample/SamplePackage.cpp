@@ -24,7 +24,7 @@ void writeSamplePackage(const std::string& path, const SampleApp& app, std::uint
   std::uint64_t used = manifest->size() + app.icon.size() + overhead;
   std::uint64_t left = size > used ? size - used : 0;
   SampleNumbers numbers(seed);
-  // What the other files hold, of a few sizes, is half of it at most.
+  // The other files, of a few sizes, hold at most half of it.
   const std::size_t others = app.files - 3;
   const std::uint64_t share = others ? left / 2 / others : 0;
   for (std::size_t number = 0; number < others; ++number) {

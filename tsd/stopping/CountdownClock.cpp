@@ -14,7 +14,7 @@ void CountdownClock::runAheadTo(Instant instant) {
 
 bool CountdownClock::waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
                                const std::function<bool()>& satisfied) {
-  // A stop cannot wake a thread that waits for something else.
+  // A stop request cannot wake a thread that waits for something else.
   constexpr auto lookInterval = std::chrono::milliseconds(100);
   long long told = 0;
   while (true) {

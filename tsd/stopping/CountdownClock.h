@@ -8,8 +8,8 @@
 
 namespace tsd {
 
-/// The device's clock for the plug-in's waits: it tells how long a wait can still take, and when a stop is wanted it
-/// runs ahead to the deadline, so that whoever waits goes on as after a wait in vain.
+/// The device's clock for the plug-in's waits: it tells how long a wait can still take, and when a stop is requested it
+/// jumps to the deadline, so that the waiter goes on as after a time-out.
 class CountdownClock : public platform::Clock {
  public:
   /// Told on the waiting thread, once a second while somebody waits, with the whole seconds that are left. May be null.
@@ -29,7 +29,7 @@ class CountdownClock : public platform::Clock {
   platform::Clock& _clock;
   const StopSignal& _stop;
   const Tick _tick;
-  std::atomic<Instant> _reached{Instant::min()};  // it never is before this
+  std::atomic<Instant> _reached{Instant::min()};  // the clock never shows an earlier time
 };
 
 }  // namespace tsd

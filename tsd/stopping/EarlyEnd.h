@@ -9,10 +9,10 @@
 
 namespace tsd {
 
-/// Lets an operation of the plug-in that works through many apps end early once a stop is wanted: the device declines
-/// the calls by which the operation would begin one more app, or mark one that was not begun as failed. The plug-in
-/// takes each for that app's failure and goes on to the next, so that it ends in order and soon. What was begun stays
-/// as it is.
+/// Lets an operation of the plug-in that works through many apps end early once a stop is requested: the device
+/// declines the calls by which the operation would begin one more app, or mark one that was not begun as failed. The
+/// plug-in takes each for that app's failure and goes on to the next, so that it ends soon and properly. What was begun
+/// stays as it is.
 class EarlyEnd {
  public:
   explicit EarlyEnd(const StopSignal& stop) : _stop(stop) {}
@@ -26,10 +26,10 @@ class EarlyEnd {
     Operation& operator=(const Operation&) = delete;
 
    private:
-    EarlyEnd* const _earlyEnd;  // null: it is not to end early
+    EarlyEnd* const _earlyEnd;  // null: the operation does not end early
   };
 
-  /// Why a call of the plug-in is declined; absent when it is not. From any thread.
+  /// Why a call of the plug-in is declined; absent if it is not. From any thread.
   platform::ErrorRef declines(std::string_view service, std::string_view operation) const;
 
  private:

@@ -20,7 +20,7 @@ QuietWatch::QuietWatch(device::EventQueue& events, StopSignal& stop)
         _quiet = true;
         _changed.notifyAll();
       })) {
-  // What this thread holds back would never run while it waits here.
+  // Events that this thread holds back would never run while it waits here.
   device::EventQueue::release();
 }
 

@@ -16,12 +16,12 @@ class QuietWatch {
  public:
   /// Throws a `CommandError` when the system has no thread left.
   QuietWatch(device::EventQueue& events, StopSignal& stop);
-  /// Waits for the events' end.
+  /// Waits until the events have ended.
   ~QuietWatch();
   QuietWatch(const QuietWatch&) = delete;
   QuietWatch& operator=(const QuietWatch&) = delete;
 
-  /// True when it is quiet, false when the deadline or a stop request came first.
+  /// True when the device is quiet, false when the deadline or a stop request came first.
   bool waitUntil(platform::Clock::Instant deadline);
 
  private:

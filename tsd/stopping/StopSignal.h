@@ -10,11 +10,10 @@
 
 namespace tsd {
 
-/// SIGINT and SIGTERM as a wish to stop. The first is remembered and told to whoever waits; a second ends the process
-/// at once, with the exit code for a cancelled command, whatever any thread is doing.
+/// SIGINT and SIGTERM as a request to stop. The first is remembered and told to whoever waits; a second ends the
+/// process at once, with the exit code for a cancelled command, whatever any thread is doing.
 ///
-/// One at a time, made before any other thread: the threads that follow inherit that they do not take these signals
-/// themselves.
+/// One at a time, made before any other thread: later threads inherit the blocked signals.
 class StopSignal {
  public:
   /// Throws a `CommandError` when the system has no thread or descriptor left.
@@ -24,12 +23,12 @@ class StopSignal {
   StopSignal& operator=(const StopSignal&) = delete;
 
   bool requested() const { return _requested; }
-  /// From now on a second signal does not end the process any more: what is left is to write the result, and half a
-  /// document would be worse than none.
+  /// From now on a second signal no longer ends the process: only the result is left to be written, and half a document
+  /// would be worse than none.
   void letFinish();
 
   /// Calls `told` on the signals' thread when a stop is requested, or at once when it was. Once the subscription is
-  /// gone it is not called.
+  /// destroyed it is not called.
   class Subscription {
    public:
     Subscription(StopSignal& signal, std::function<void()> told);

@@ -18,9 +18,9 @@ std::vector<TodoEntry> readHostTodoList(const std::string& host, Console& consol
   for (std::size_t place = 0; list.array() && place < list.array()->size(); ++place) {
     std::string problem = problemOfTodoEntry((*list.array())[place]);
     if (!problem.empty() && ++odd <= mostNamed)
-      console.message(path + ": entry " + std::to_string(place + 1) + " is passed over: " + problem);
+      console.message(path + ": entry " + std::to_string(place + 1) + " is ignored: " + problem);
   }
-  if (odd > mostNamed) console.message(path + ": " + std::to_string(odd - mostNamed) + " more entries are passed over");
+  if (odd > mostNamed) console.message(path + ": " + std::to_string(odd - mostNamed) + " more entries are ignored");
   return todoEntriesOf(list);
 }
 

@@ -8,8 +8,8 @@
 
 namespace tsd {
 
-/// The todo list in a host's folder; nothing where there is none. Entries that nobody can act on are named on the
-/// console. Throws a `CommandError` when it cannot be read.
+/// The todo list in a host's folder; empty if there is none. Entries that cannot be acted on are named on the console.
+/// Throws a `CommandError` when the list cannot be read.
 std::vector<TodoEntry> readHostTodoList(const std::string& host, Console& console);
 
 }  // namespace tsd

@@ -12,10 +12,10 @@ struct SyncOptions {
   std::string device;
   std::string host;
   AssetReports reports;
-  std::optional<bool> endPhase;  // what the phase is said to have ended with; absent: what happened
+  std::optional<bool> endPhase;  // how the phase is reported to have ended; absent: as it did
   bool daemonReports = false;
   std::size_t repeat = 1;
-  std::size_t transfers = 2;  // packages in flight
+  std::size_t transfers = 2;  // packages sent at the same time
 };
 
 }  // namespace tsd

@@ -58,7 +58,7 @@ SyncOutcomes::Told SyncOutcomes::toldOfMarked(const std::string& id, const std::
   auto app = _facts.device.app(id);
   if (mark == platform::todo::installed) {
     if (app && app->isOnDevice() && app->state != device::AppState::placeholder) return {Outcome::installed, ""};
-    return {Outcome::failed, "it was installed, and is not on the device any more"};
+    return {Outcome::failed, "it was installed, but is no longer on the device"};
   }
   auto verdict = _facts.verdicts.of(id).ofInstall();
   if (!_requested.count(id)) {
@@ -81,7 +81,7 @@ SyncOutcomes::Told SyncOutcomes::toldOfUnrequested(const std::string& id) const 
   if (!isFileName(id)) return {Outcome::refused, "this cannot be an app's identifier"};
   auto open = _openInstalls.find(id);
   if (open != _openInstalls.end())
-    return {Outcome::skipped, "install under way: " + nameOfClient(open->second) + " has an install of it under way"};
+    return {Outcome::skipped, "install under way: " + nameOfClient(open->second) + " is already installing it"};
   return {Outcome::notRequested, "the plug-in did not ask for its package"};
 }
 
@@ -137,7 +137,7 @@ SyncOutcomes::Told SyncOutcomes::toldOfOther(const std::string& id, const std::s
   if (operation == platform::todo::installed && app && app->state == device::AppState::installed)
     return {Outcome::installed, ""};
   return {Outcome::unchanged,
-          "nothing is to be done for its entry of the todo list: " + (operation.empty() ? "no operation" : operation)};
+          "its entry of the todo list asks for nothing: " + (operation.empty() ? "no operation" : operation)};
 }
 
 bool SyncOutcomes::isThere(const std::string& id) const {

@@ -24,17 +24,17 @@ struct SyncFacts {
   const std::set<std::string>& before;   // the apps that were on the device
   const std::vector<platform::TSAssetRef>& assets;
   const std::map<std::string, std::string>& reportedReasons;  // of installs that the daemon reported as failed
-  std::string broken;                                         // why the sync ended before its end; empty: it did not
+  std::string broken;                                         // why the sync ended early; empty if it did not
 };
 
-/// Says of each app that the host named, or that was asked for, what came of it: from what is on the device and on its
-/// disk, and from what the plug-in said. Used once.
+/// Says what became of each app that the host named or that was asked for: from what is on the device and its disk, and
+/// from what the plug-in said. Used once.
 class SyncOutcomes {
  public:
   explicit SyncOutcomes(const SyncFacts& facts);
 
   std::vector<AppOutcome> all() const;
-  /// Of the apps that the host wanted removed, those that have gone.
+  /// The apps that the host wanted removed and that are gone.
   std::vector<std::string> removed() const;
 
  private:

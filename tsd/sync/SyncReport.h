@@ -11,7 +11,7 @@
 
 namespace tsd {
 
-/// What came of one sync.
+/// The result of one sync.
 struct SyncReport {
   ExitCode code = ExitCode::done;
   std::string message;                 // of a sync that failed as a whole, or of a deadline that passed

@@ -21,7 +21,7 @@ using platform::Value;
 namespace {
 
 constexpr auto displayInterval = std::chrono::milliseconds(100);
-/// How long the outcomes are waited for: a base, and as long as a slow device needs for the bytes.
+/// How long to wait for the outcomes: a base, plus the time that a slow device needs for the bytes.
 constexpr auto outcomeBase = std::chrono::seconds(60);
 constexpr std::uint64_t outcomeBytesPerSecond = std::uint64_t{4} << 20;
 
@@ -43,7 +43,7 @@ SyncReport SyncRun::run(const std::vector<TodoEntry>& wanted) {
   return std::move(_report);
 }
 
-/// False, with the report's message, when the device takes no more of the host's files; nothing has begun then.
+/// False, with the report's message, when the device cannot take the host's files; nothing has begun then.
 bool SyncRun::pushHost() {
   _parts.progress.headline("Taking the host's files onto the device");
   try {
@@ -101,7 +101,7 @@ void SyncRun::requestPackages() {
   for (const auto& asset : _assets) {
     _report.requested.push_back(asset->identifier());
     _parts.progress.add(asset->identifier(), asset->prettyName().value_or(""));
-    // It is there already; the device's report may come later.
+    // It is already there; the device's report may come later.
     auto app = _parts.session.device().app(asset->identifier());
     if (app && app->isOnDevice()) _parts.progress.placeholderShown(asset->identifier());
   }
@@ -133,7 +133,7 @@ void SyncRun::transferPackages() {
   _parts.queue.finish();
 }
 
-/// A package that failed has told the plug-in so; only one that neither came nor failed leaves the phase unfinished.
+/// The plug-in was told of a package that failed; only one that neither came nor failed leaves the phase unfinished.
 bool SyncRun::transferPhaseSucceeded() const {
   return std::none_of(_assets.begin(), _assets.end(), [&](const auto& asset) {
     auto end = _parts.queue.result(asset->identifier()).end;
@@ -147,7 +147,7 @@ void SyncRun::awaitOutcomes() {
   auto& events = _parts.session.device().events();
   auto deadline = events.clock().now() + outcomeBase + std::chrono::seconds(bytes / outcomeBytesPerSecond);
   if (!_assets.empty()) _parts.progress.headline("Waiting for the outcomes");
-  // On the heap, as a device that never goes quiet must not keep this thread: see below.
+  // On the heap, because a device that never goes quiet must not keep this thread waiting: see below.
   auto quiet = std::make_unique<QuietWatch>(events, _parts.stop);
   bool isQuiet = false;
   while (!isQuiet && !_parts.stop.requested() && events.clock().now() < deadline) {
@@ -185,7 +185,7 @@ void SyncRun::removeLeftPackages() {
     ErrorRef error;
     if (!open.count(entry.name) &&
         !files.removeItem(std::string(platform::packagesDirectory) + "/" + entry.name, &error))
-      _parts.context.console.message("a package was left: " + textOf(error));
+      _parts.context.console.message("a package was left behind: " + textOf(error));
   }
 }
 

@@ -55,7 +55,7 @@ class SyncRun {
   void removeLeftPackages();
   void fillReport();
 
-  /// Reads the todo list again when anything changed since, and tells the display of outcomes that are new.
+  /// Reads the todo list again if anything changed since, and passes new outcomes to the display.
   void showOutcomes(bool always);
   std::string whyBroken() const;
   ExitCode code() const;
@@ -70,9 +70,9 @@ class SyncRun {
   std::map<std::string, std::string> _reportedReasons;  // of installs that the daemon reported as failed
   std::vector<TodoEntry> _todo;                         // as it was read last
   std::uint64_t _changesRead = 0;                       // of the watch, when the list was read last
-  bool _isTaken = false;  // the host's list is on the device; what lies there before is an earlier sync's
+  bool _isTaken = false;  // the host's list is on the device; before that, what lies there is from an earlier sync
   bool _deadlinePassed = false;
-  bool _phase = false;  // what the transfer phase is said to have ended with
+  bool _phase = false;  // how the transfer phase is reported to have ended
 };
 
 }  // namespace tsd

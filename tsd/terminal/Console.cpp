@@ -44,7 +44,7 @@ void Console::setRegion(std::vector<TerminalLine> lines) {
 
 std::string Console::toRegionsBegin() const {
   if (_region.empty()) return {};
-  // A terminal that has become narrower shows what was wider on several rows.
+  // A terminal that has become narrower shows a wider line on several rows.
   std::size_t columns = size().columns;
   std::size_t rows = 0;
   for (const auto& each : _region) rows += std::max<std::size_t>(1, (each.columns() + columns - 1) / columns);

@@ -22,8 +22,8 @@ class Console {
   void line(std::string_view text);
   /// "tsd: " and the text, one line.
   void message(std::string_view text);
-  /// Replaces the lines that are redrawn in place; none takes them away. A line that is too wide for the terminal is
-  /// cut by it; that the terminal has become narrower since the last time is allowed for.
+  /// Replaces the lines that are redrawn in place; an empty list removes them. The terminal cuts lines that are too
+  /// wide; it may have become narrower since the last time.
   void setRegion(std::vector<TerminalLine> lines);
 
   struct Size {

@@ -69,7 +69,7 @@ void writeFailure(const CommonOptions& options, ExitCode code, std::string_view 
   try {
     writeDocument(document);
   } catch (const CommandError&) {
-    // The failure is told on standard error, and most likely is this very one.
+    // The failure is reported on standard error, and most likely it is this very one.
   }
 }
 

@@ -17,8 +17,7 @@ void writeDocument(const platform::Value& document);
 /// The document of a command that could not go on.
 void writeFailure(const CommonOptions& options, ExitCode code, std::string_view message);
 
-/// What a document says the result was: "done", "partial" (some apps failed, or a deadline passed), "failed" or
-/// "cancelled".
+/// The result in a document: "done", "partial" (some apps failed, or a deadline passed), "failed" or "cancelled".
 const char* nameOfResult(ExitCode code);
 /// The same for people: "done", "not complete", "failed" or "cancelled".
 std::string wordsOfEnd(ExitCode code);
@@ -26,15 +25,15 @@ std::string wordsOfEnd(ExitCode code);
 /// An array of strings.
 platform::Value arrayOf(const std::vector<std::string>& texts);
 
-/// An error's one-line description without its domain and code, where words follow them; the plug-in's own codes, which
-/// have none, in words.
+/// An error's one-line description without its domain and code if words follow them; the plug-in's own codes, which
+/// have no description, in words.
 std::string reasonForPeople(std::string_view description);
 
-/// The front and the text on a line no wider than the terminal that standard output is (80 columns where it is none),
-/// and, indented by the front's width as far as that leaves room, as many more as the text needs. The front is
-/// printable.
+/// The front and the text on a line no wider than the terminal on standard output (80 columns if it is not a terminal),
+/// followed by as many more lines as the text needs, indented by the front's width as far as that leaves room. The
+/// front is printable.
 std::string wrappedLine(const std::string& front, std::string_view text);
-/// The same, but in one line where standard output is no terminal, for whoever searches in it; further lines are
+/// The same, but in one line if standard output is not a terminal, so that it can be searched; further lines are
 /// indented a little.
 std::string noteLine(const std::string& front, std::string_view text);
 

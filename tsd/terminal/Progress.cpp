@@ -86,7 +86,7 @@ void Progress::sending(const std::string& id, double fraction) {
   _lastChange = std::chrono::steady_clock::now();
   if (_mode == ProgressMode::plain && step <= line->shownStep) return;
   line->shownStep = step;
-  // A whole package is no whole app yet.
+  // A complete package is not yet a complete app.
   changed(*line, step == 100 ? "sent" : "sent " + std::to_string(step) + " %", false);
 }
 
@@ -165,7 +165,7 @@ void Progress::changed(const ProgressLine& line, const std::string& what, bool u
   auto now = std::chrono::steady_clock::now();
   _lastChange = now;
   if (_mode == ProgressMode::plain) {
-    // Names may stand out of their column, as nobody could tell apart what was cut.
+    // Names may be wider than their column: names that were cut could not be told apart.
     constexpr std::size_t nameColumns = 24;
     print(fitted(line.name, std::max(nameColumns, columnsOf(printable(line.name)))) + "  " + what);
   }
@@ -183,7 +183,7 @@ void Progress::print(const std::string& text) {
 std::vector<TerminalLine> Progress::drawing() {
   auto now = std::chrono::steady_clock::now();
   _lastDrawn = now;
-  // Apps that join later must not take it back.
+  // Apps that join later must not lower it.
   _percent = std::max(_percent, percentOf(_lines));
   std::string headline;
   if (!_headline.empty()) {
@@ -193,7 +193,7 @@ std::vector<TerminalLine> Progress::drawing() {
   return drawProgress(headline, _lines, _percent, Console::size(), _colours);
 }
 
-/// For want of memory a picture or a line may be missing, but nothing that is shown.
+/// For want of memory a drawing or a line may be missing, but nothing that is shown is lost.
 void Progress::live() {
   for (bool over = false; !over;) {
     try {

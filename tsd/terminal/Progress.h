@@ -16,16 +16,16 @@
 namespace tsd {
 
 /// Shows on the console how far each app is: on a terminal as bars that are redrawn in place, otherwise as a line for
-/// each change. A thread of its own writes them, so that nobody who tells of a change waits for a terminal; it keeps
-/// the bars in the terminal's size and shows that the program is alive while nothing changes: on a terminal with a
-/// moving sign, otherwise with a line now and then. From any thread.
+/// each change. A thread of its own writes them, so that whoever reports a change never waits for the terminal; it
+/// adapts the bars to the terminal's size and shows that the program is alive while nothing changes: on a terminal by
+/// a moving sign, otherwise by a line now and then. From any thread.
 ///
 /// An app's percentage and phase never go back; it has 100 % only once its outcome is recorded and good.
 class Progress {
  public:
   using Phase = ProgressLine::Phase;
 
-  /// What an app is to reach: with `placeholder` it has ended when its placeholder is shown.
+  /// What an app has to reach: with `placeholder` it has ended when its placeholder is shown.
   enum class Goal : std::uint8_t { installed, placeholder };
 
   /// Throws a `CommandError` when the system has no thread left.
@@ -40,13 +40,14 @@ class Progress {
   /// `fraction` of the package has been sent, from 0 to 1.
   void sending(const std::string& id, double fraction);
   void installing(const std::string& id);
-  /// The outcome in one word for people, with a reason where there is one.
+  /// The outcome in a word for people, with a reason if there is one.
   void ended(const std::string& id, const std::string& outcome, const std::string& reason, bool good);
-  /// A line of its own about the whole, above the apps; on a terminal replaced by the next one, empty to take it away.
+  /// A separate line about the whole, above the apps; on a terminal the next one replaces it, and an empty one removes
+  /// it.
   void headline(const std::string& text);
   /// A headline with the seconds that are left.
   void countdown(const std::string& text, long long seconds);
-  /// Everything that was told is on the console when it returns, and nothing is redrawn in place any more.
+  /// When it returns everything reported is on the console, and nothing is redrawn in place any more.
   void finish();
 
  private:
@@ -60,7 +61,7 @@ class Progress {
   void live() EXCLUDES(_mutex);
   void beat() EXCLUDES(_mutex);
   void beatInPlainMode() REQUIRES(_mutex);
-  /// What the console is to show in place now.
+  /// The lines that the console should now show in place.
   std::vector<TerminalLine> drawing() REQUIRES(_mutex);
 
   Console& _console;
@@ -77,7 +78,7 @@ class Progress {
   std::size_t _endings GUARDED_BY(_mutex) = 0;          // apps that have ended
   std::vector<std::string> _unsaid GUARDED_BY(_mutex);  // lines of the plain mode, for the heart to write
   bool _mustDraw GUARDED_BY(_mutex) = false;            // at once
-  bool _writing GUARDED_BY(_mutex) = false;             // the heart is at the console
+  bool _writing GUARDED_BY(_mutex) = false;             // the heart is writing to the console
   Instant _lastDrawn GUARDED_BY(_mutex){};
   Instant _lastChange GUARDED_BY(_mutex){};   // of anything
   Instant _lastPrinted GUARDED_BY(_mutex){};  // line in plain mode

@@ -64,7 +64,7 @@ TerminalLine drawn(const ProgressLine& line, const std::string& what, std::size_
     result.add(repeated("░", columns.bar - full), Colour::dim);
     result.add(" ");
   }
-  // Without the words, a sign has to tell that it will get no further.
+  // Without the words, a sign has to show that the app will get no further.
   bool isSign = isBad && columns.what == 0;
   result.add(isSign ? "  ✗  " : percentText(line.percent), isSign ? colour : Colour::none);
   if (columns.what) {
@@ -81,7 +81,7 @@ std::string whatOf(const ProgressLine& line) {
   return line.reason.empty() ? line.outcome : line.outcome + ": " + line.reason;
 }
 
-/// Which apps to show when there is room for `room` of them, in their order: those that a person looks at first.
+/// Which apps to show when there is room for `room` of them, in their order: those that interest a person most.
 std::vector<const ProgressLine*> chosen(const std::vector<ProgressLine>& lines, std::size_t room) {
   std::vector<const ProgressLine*> result;
   for (const auto& line : lines) {

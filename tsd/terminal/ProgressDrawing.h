@@ -21,7 +21,7 @@ struct ProgressLine {
   std::string outcome;      // once it has ended
   std::string reason;       // of the outcome; may be empty
   int shownStep = 0;        // percent of the package, the last that was printed in plain mode
-  std::size_t endedAs = 0;  // which one it was to end; 0: it has not
+  std::size_t endedAs = 0;  // how many had ended with it; 0: it has not ended
 };
 
 /// "3 of 8 ended"

@@ -8,12 +8,12 @@ namespace tsd {
 
 namespace {
 
-// What is longer than any name that people type is compared with nothing, as that takes the product of the lengths.
+// Words longer than any name that people type are not compared: the time is the product of the lengths.
 constexpr std::size_t longestWord = 256;
 
 char folded(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
 
-/// Letters put in, left out, exchanged, or swapped with their neighbour.
+/// The number of letters inserted, left out, replaced, or swapped with their neighbour.
 std::size_t distanceOf(std::string_view one, std::string_view other) {
   std::vector<std::size_t> beforeLast, last(other.size() + 1), row(other.size() + 1);
   for (std::size_t j = 0; j <= other.size(); ++j) last[j] = j;

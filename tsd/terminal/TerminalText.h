@@ -8,9 +8,9 @@ namespace tsd {
 
 /// Text from elsewhere, made harmless for a terminal: control characters and broken UTF-8 become '?'.
 std::string printable(std::string_view text);
-/// Columns that a printable text takes on a terminal: two for each wide character, none for a mark that combines.
+/// The columns of a printable text on a terminal: two for each wide character, none for a combining mark.
 std::size_t columnsOf(std::string_view text);
-/// `printable(text)` in exactly `columns` columns: filled up with spaces, or cut with "…" at its end.
+/// `printable(text)` in exactly `columns` columns: padded with spaces, or cut with "…" at its end.
 std::string fitted(std::string_view text, std::size_t columns);
 
 /// A line for a terminal, put together from parts, some of them in colour.
