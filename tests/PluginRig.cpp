@@ -3,8 +3,11 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <atomic>
+#include <cstdlib>
 #include <stdexcept>
 
+#include "device/boundary/Journal.h"
 #include "platform/Describe.h"
 #include "platform/FileSystem.h"
 #include "platform/NotificationCenter.h"
@@ -95,12 +98,25 @@ PluginRig::PluginRig(const Options& options) : PluginRig(options, nullptr, nullp
 PluginRig::PluginRig(const Options& options, std::unique_ptr<device::FileTree> files,
                      std::unique_ptr<device::Store> store)
     : _options(options) {
+  openJournal();
   _parts.files = std::move(files);
   _parts.store = std::move(store);
   if (!_parts.files) _parts.makeInMemory();
   open();
   EXPECT_TRUE(_device->set("icon-size", "16"));
   load();
+}
+
+/// One file for the life of the rig, for the tests that hold journals against the rules.
+void PluginRig::openJournal() {
+  static std::atomic<int> number = 0;
+  const char* folder = std::getenv("APPSYNC_JOURNALS");
+  if (!folder || !_options.journaled) return;
+  const auto* test = ::testing::UnitTest::GetInstance()->current_test_info();
+  std::string name = test ? std::string(test->test_suite_name()) + "." + test->name() : "rig";
+  std::replace(name.begin(), name.end(), '/', '-');
+  _journal.open(std::string(folder) + "/" + name + "." + std::to_string(++number) + ".jsonl");
+  EXPECT_TRUE(_journal.is_open()) << folder;
 }
 
 void PluginRig::open() {
@@ -112,6 +128,7 @@ void PluginRig::open() {
     _records.reserve(1024);
     chosen.journals.push_back({[this](const CallRecord& record) {
       if (_options.told) _options.told(record);
+      if (_journal.is_open()) _journal << device::journalLine(record) << '\n';
       // What the transaction log makes of its records says the same again.
       if (!isTransactionMessage(record)) _records.push_back(record);
     }});

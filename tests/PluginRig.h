@@ -1,5 +1,6 @@
 #pragma once
 
+#include <fstream>
 #include <functional>
 #include <memory>
 #include <mutex>
@@ -141,6 +142,7 @@ class PluginRig {
 
  private:
   void open();
+  void openJournal();
   std::vector<const device::CallRecord*> recordsIn(std::string_view operation, std::size_t nth) const;
 
   const Options _options;
@@ -148,6 +150,7 @@ class PluginRig {
   SharedParts _parts;
   DaemonTransfers _transfers;
   std::vector<device::CallRecord> _records;  // written under the journal's lock
+  std::ofstream _journal;                    // as well, where APPSYNC_JOURNALS names a folder
   device::ManualEventQueue* _manualEvents = nullptr;
   std::unique_ptr<device::LocalDevice> _device;
   std::shared_ptr<platform::TSClient> _client;

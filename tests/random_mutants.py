@@ -42,13 +42,14 @@ PLUGIN_SUITES = [
     ["%bin/plugin_tests", "--gtest_filter=-*Simulation*:*Sweep*:*Thread*"],
     ["%bin/plugin_tests", "--gtest_filter=*Simulation*:*Sweep*"],
     ["%bin/plugin_tests", "--gtest_filter=*Thread*"],
+    [sys.executable, "@tests/journal_tests.py", "%bin/tsd", "%bin/plugin_tests", "Journals"],
 ]
 AREAS = {
     "plugin": Area(["core", "transfer", "coordination", "restore", "placeholder"],
-                   ["ApplicationSync", "plugin_tests"], PLUGIN_SUITES, 97),
-    "values": Area(["platform", "plist"], ["ApplicationSync", "plugin_tests", "property_list_tests", "device_foundation_tests"],
+                   ["ApplicationSync", "plugin_tests", "tsd"], PLUGIN_SUITES, 97),
+    "values": Area(["platform", "plist"], ["ApplicationSync", "plugin_tests", "property_list_tests", "device_foundation_tests", "tsd"],
                    [["%bin/property_list_tests"], ["%bin/device_foundation_tests"], *PLUGIN_SUITES], 90),
-    "install": Area(["device/package", "device/reports", "device/install", "device/coordination"], ["plugin_tests", "device_service_tests", "contract_tests"],
+    "install": Area(["device/package", "device/reports", "device/install", "device/coordination"], ["plugin_tests", "device_service_tests", "contract_tests", "tsd"],
                     [["%bin/device_service_tests"], ["%bin/contract_tests"], *PLUGIN_SUITES], 90),
 }
 
@@ -98,8 +99,11 @@ class Job(Copy):
 
     def tests(self):
         """Which test failed; empty: none."""
-        for program, *arguments in self._area.suites:
-            command = [str(self.build / program[1:]), *arguments, "--gtest_brief=1", "--gtest_fail_fast"]
+        places = {"%": self.build, "@": self.sources}
+        for words in self._area.suites:
+            command = [str(places[word[0]] / word[1:]) if word[0] in places else word for word in words]
+            if words[0][0] == "%":
+                command += ["--gtest_brief=1", "--gtest_fail_fast"]
             try:
                 ended = subprocess.run(command, capture_output=True, text=True, check=False, timeout=120, errors="replace",
                                        env={"APPSYNC_SEEDS": SEEDS, "PATH": "/usr/bin:/bin"})

@@ -6,8 +6,10 @@
 #include <string>
 #include <string_view>
 #include <type_traits>
+#include <utility>
 #include <vector>
 
+#include "device/boundary/ObjectFacts.h"
 #include "device/boundary/ObjectKind.h"
 #include "platform/Error.h"
 #include "platform/FileSystem.h"
@@ -78,7 +80,15 @@ platform::Value journalValueOfContent(Names& names, const std::optional<T>& valu
 template <class Names, HasObjectKind T>
 platform::Value journalValueOfContent(Names& names, const std::shared_ptr<T>& object, bool) {
   if (!object) return {};
-  return platform::Value(names.nameOfObject(kindOfObject(object.get()), wholeObject(object.get()), object));
+  platform::Value name(names.nameOfObject(kindOfObject(object.get()), wholeObject(object.get()), object));
+  if constexpr (requires { factsOf(*object); }) {
+    if (names.showsWhole()) {
+      platform::Value facts = factsOf(*object);
+      facts.dictionary()->set("object", std::move(name));
+      return facts;
+    }
+  }
+  return name;
 }
 template <class Names, HasObjectKind T>
 platform::Value journalValueOfContent(Names& names, const std::unique_ptr<T>& object, bool) {

@@ -52,10 +52,13 @@ void RegistryReports::bringUpToDate() {
 void RegistryReports::report(Observer& observer) {
   bringUpToDate();
   auto shown = [&](const Proxies& proxies) {
-    return _boundary.hasJournal() ? identifiers(proxies) : std::vector<std::string>();
+    if (!_boundary.hasJournal()) return platform::Value();
+    return _boundary.showsWhole() ? journalValue(_boundary, proxies) : journalValue(_boundary, identifiers(proxies));
   };
   _boundary.enter({"AppsClient", "applicationInstallsArePrioritized"},
-                  {{"prioritized", shown(_prioritized)}, {"paused", shown(_paused)}},
+                  {{"prioritized", shown(_prioritized)},
+                   {"paused", shown(_paused)},
+                   CallArgument::object("observer", "observer", wholeObject(&observer))},
                   [&] { observer.applicationInstallsArePrioritized(_prioritized, _paused); });
 }
 

@@ -37,15 +37,16 @@ bool RegistryService::applicationIsInstalled(std::string_view bundleIdentifier) 
 
 void RegistryService::enumerateBundlesOfType(
     std::uint64_t type, const std::function<void(const platform::OBBundleProxyRef& bundle, bool& stop)>& block) {
-  std::vector<platform::OBBundleProxyRef> bundles;
-  _boundary.call({className, "enumerateBundlesOfType"}, nullptr, {{"type", type}}, [&] {
+  auto bundles = _boundary.call({className, "enumerateBundlesOfType"}, nullptr, {{"type", type}}, [&] {
+    std::vector<platform::OBBundleProxyRef> listed;
     Lock lock(_records);
     for (const auto& [id, app] : _records.state().apps) {
       // Every bundle of this device is an application.
-      bool listed = type == bundleType::every || type == bundleType::applications ||
-                    (type == bundleType::systemBundles && app.systemBundle);
-      if (listed) bundles.push_back(app.proxy);
+      bool isMeant = type == bundleType::every || type == bundleType::applications ||
+                     (type == bundleType::systemBundles && app.systemBundle);
+      if (isMeant) listed.push_back(app.proxy);
     }
+    return listed;
   });
   // The block is the caller's own, on its own thread; what it does is not part of the call.
   bool stop = false;
