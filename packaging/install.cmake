@@ -40,6 +40,15 @@ install(DIRECTORY ${CMAKE_SOURCE_DIR}/contract DESTINATION ${share_folder} COMPO
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/examples/minimal-daemon DESTINATION ${share_folder}/examples
         COMPONENT development)
 
+# The documents, for those who build a host and for those who run the program.
+foreach(place development/libapplicationsync-dev program/tsd)
+  string(REPLACE "/" ";" place ${place})
+  list(GET place 0 component)
+  list(GET place 1 name)
+  install(DIRECTORY ${CMAKE_SOURCE_DIR}/docs/ DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/${name} COMPONENT ${component}
+          FILES_MATCHING PATTERN *.md PATTERN *.png PATTERN *.svg PATTERN README.md EXCLUDE)
+endforeach()
+
 # The program, with its manual pages and completions, which it writes itself.
 set(pages ${CMAKE_BINARY_DIR}/packaging/man)
 set(completions ${CMAKE_BINARY_DIR}/packaging/completions)

@@ -56,6 +56,14 @@ def unknown_targets(document, text):
                     yield f"{document.relative_to(ROOT)}: make {word}: there is no such target"
 
 
+def unknown_packages(document, text):
+    """The library's Debian package is called after the version of the interface."""
+    header = (ROOT / "platform/Plugin.h").read_text(encoding="utf-8")
+    version = re.search(r"pluginInterfaceVersion = (\d+)", header)[1]
+    for name in set(re.findall(r"libapplicationsync\d+", text)) - {f"libapplicationsync{version}"}:
+        yield f"{document.relative_to(ROOT)}: {name}: there is no such package"
+
+
 def failing_commands(document, text, program_folder):
     script = "".join(block for language, block in FENCE.findall(text) if language == "sh")
     if not script:
@@ -78,6 +86,7 @@ def main():
         problems += broken_links(document, text)
         problems += strange_examples(document, text)
         problems += unknown_targets(document, text)
+        problems += unknown_packages(document, text)
         if len(sys.argv) > 1:
             problems += failing_commands(document, text, os.path.abspath(sys.argv[1]))
     print("\n".join(problems) or f"{len(documents)} documents in order")
