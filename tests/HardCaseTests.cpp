@@ -5,12 +5,10 @@
 #include "platform/OBApplicationWorkspace.h"
 #include "plist/PropertyList.h"
 #include "tests/Scenario.h"
-#include "tsd/daemon/PluginLoader.h"
 
 namespace tests {
 namespace {
 
-using platform::OBApplicationProxy;
 using Lines = std::vector<std::string>;
 
 constexpr char controlCharacter[] = "a bell: \a";  // no XML document can hold it
@@ -104,59 +102,6 @@ TEST(HardCases, ACoordinatorOfAnUnknownAppStillHasTheRestoreStateCleaned) {
   delegate->coordinatorDidCompleteSuccessfully(coordinator);
   EXPECT_EQ(rig.readList(restoreStatePath), records);
   EXPECT_EQ(rig.readList(todoListPath), entries);
-}
-
-/// The device's registry, and placeholders besides that it would not make.
-class OddRegistry final : public platform::OBApplicationWorkspace {
- public:
-  explicit OddRegistry(platform::OBApplicationWorkspace& registry) : _registry(registry) {}
-
-  void addObserver(std::weak_ptr<platform::OBApplicationWorkspaceObserverProtocol> observer) override {
-    _registry.addObserver(std::move(observer));
-  }
-  void removeObserver(const platform::OBApplicationWorkspaceObserverProtocol* observer) override {
-    _registry.removeObserver(observer);
-  }
-  bool applicationIsInstalled(std::string_view identifier) override {
-    return _registry.applicationIsInstalled(identifier);
-  }
-  void enumerateBundlesOfType(std::uint64_t type,
-                              const std::function<void(const platform::OBBundleProxyRef&, bool&)>& block) override {
-    _registry.enumerateBundlesOfType(type, block);
-    bool stop = false;
-    for (const char* half : {"bundle", "application"}) {
-      auto proxy = std::make_shared<OBApplicationProxy>();
-      proxy->appState.isPlaceholder = true;
-      (*half == 'b' ? proxy->bundleIdentifier : proxy->applicationIdentifier) = "app.odd";
-      block(proxy, stop);
-    }
-  }
-  bool uninstallApplication(std::string_view identifier) override { return _registry.uninstallApplication(identifier); }
-  platform::OBApplicationProxyRef applicationProxyForIdentifier(std::string_view identifier,
-                                                                bool placeholder) override {
-    return _registry.applicationProxyForIdentifier(identifier, placeholder);
-  }
-
- private:
-  platform::OBApplicationWorkspace& _registry;
-};
-
-TEST(HardCases, APlaceholderWithoutAnIdentifierIsNoCandidate) {
-  PluginRig rig;
-  const platform::Platform& whole = rig.platform();
-  OddRegistry registry(whole.workspace);
-  const platform::Platform odd{whole.process,      whole.clock,        whole.fileSystem,    whole.propertyLists,
-                               whole.systemLog,    whole.support,      whole.deviceService, whole.installCoordination,
-                               registry,           whole.installer,    whole.backup,        whole.restrictions,
-                               whole.homeScreen,   whole.iconRenderer, whole.imageEncoder,  whole.transactionLog,
-                               whole.notifications};
-  auto client = tsd::PluginLoader(SHIPPED_PLUGIN).create(odd);
-  stage(rig, {"app.a"});
-  auto assets = client->outstandingAssetTransfers();
-  ASSERT_EQ(assets.size(), 1u);
-  EXPECT_EQ(assets[0]->identifier(), "app.a");
-  EXPECT_FALSE(inOrder(rig.messages(), {"[15] processing app install for bundle ''*"}));
-  client = nullptr;
 }
 
 }  // namespace
