@@ -31,12 +31,15 @@ demo: build ## a whole life of a device, from the first sync to a restore, in a 
 test: build-all ## all tests (SEEDS=N: that many random scenarios)
 	@cd build/release && $(WITH_SEEDS) $(CTEST)
 
-check: check-packages ## format, sizes, includes, spelling, documents, interface, clang-tidy, thread safety, state
+check: check-packages ## format, sizes, includes, spelling, documents, interface, clang-tidy, thread safety, state, hardening
 	@mkdir -p build
 	@cmake --preset clang >build/clang.configured
 	@.ci/check build/clang
 	@cmake --build --preset clang
 	@python3 tests/library_state.py build/clang/*/libapplicationsync-*.a build/clang/bin/libApplicationSync.so
+	@$(call PRESET,release,tsd ApplicationSync platform plist)
+	@python3 tests/hardened_files.py build/release/bin/tsd build/release/bin/libApplicationSync.so \
+	  build/release/*/libapplicationsync-*.a
 
 asan: packages ## all tests with the address and undefined-behaviour sanitizers
 	@$(call PRESET,asan)
