@@ -22,7 +22,7 @@ SizeClass sizeClass(std::size_t size) {
     std::size_t units = std::max<std::size_t>(1, (size + 7) / 8);
     return {units - 1, units * 8};
   }
-  int doubling = std::bit_width(size - 1) - 9;
+  int doubling = static_cast<int>(std::bit_width(size - 1)) - 9;
   std::size_t step = std::size_t{64} << doubling;
   std::size_t steps = (size + step - 1) / step;  // 5 to 8 of them
   return {32 + static_cast<std::size_t>(doubling) * 4 + steps - 5, steps * step};

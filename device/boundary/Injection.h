@@ -44,7 +44,7 @@ struct InjectionRule {
   bool matches(std::string_view service, std::string_view operation, std::string_view app) const;
 
   /// Whether the rule takes effect at its match of that number, counted from 1.
-  bool isDue(std::uint64_t number) const { return match == 0 || number == match || (onwards && number > match); }
+  bool isDue(std::uint64_t turn) const { return match == 0 || turn == match || (onwards && turn > match); }
 
   /// Nothing, with an error that names the place, when the text is not a rule or names an unknown point or action.
   static std::optional<InjectionRule> parse(std::string_view text, platform::ErrorRef* error = nullptr);

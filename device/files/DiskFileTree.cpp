@@ -301,9 +301,9 @@ bool DiskFileTree::writeAtomically(std::string_view path, BytesView contents, Er
   int failure = find(path, place);
   if (failure == 0) {
     failure = place.replaceFile([&](const FileInWriting& file) {
-      int failure = writeWhole(file, contents);
+      const int unwritten = writeWhole(file, contents);
       // Before the rename, so that the new content is whole wherever the new name is.
-      return failure == 0 && durability == Durability::lasting ? syncFile(file) : failure;
+      return unwritten == 0 && durability == Durability::lasting ? syncFile(file) : unwritten;
     });
   }
   if (failure == 0 && durability == Durability::lasting) failure = place.syncDirectory();

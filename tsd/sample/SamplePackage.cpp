@@ -30,9 +30,9 @@ void writeSamplePackage(const std::string& path, const SampleApp& app, std::uint
   for (std::size_t number = 0; number < others; ++number) {
     std::string inner = folder + (number % 20 < 10 ? "/Größen " : "/資料 ") + std::to_string(number / 10);
     if (number % 10 == 0) package.addFolder(inner);
-    std::size_t size = share ? numbers.below(static_cast<std::size_t>(share)) : 0;
-    package.addFile(inner + "/piece " + std::to_string(number), numbers.bytes(size));
-    left -= size;
+    std::size_t pieceSize = share ? numbers.below(static_cast<std::size_t>(share)) : 0;
+    package.addFile(inner + "/piece " + std::to_string(number), numbers.bytes(pieceSize));
+    left -= pieceSize;
   }
   package.beginFile(folder + "/content.bin", left);
   while (left > 0) {

@@ -116,11 +116,11 @@ void Progress::headline(const std::string& text) {
 }
 
 void Progress::countdown(const std::string& text, long long seconds) {
-  constexpr long long plainStep = 10;
+  constexpr long long plainSeconds = 10;
   {
     Lock lock(_mutex);
     bool begins = std::exchange(_countingDown, text) != text;
-    if (_mode == ProgressMode::plain && !begins && seconds % plainStep != 0) return;
+    if (_mode == ProgressMode::plain && !begins && seconds % plainSeconds != 0) return;
   }
   headline(text + ", " + std::to_string(seconds) + " s left");
 }

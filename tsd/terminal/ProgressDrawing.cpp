@@ -114,7 +114,7 @@ std::string endedOf(const std::vector<ProgressLine>& lines) {
 int percentOf(const std::vector<ProgressLine>& lines) {
   if (lines.empty()) return 0;
   auto sum = std::accumulate(lines.begin(), lines.end(), std::size_t{0},
-                             [](std::size_t sum, auto& line) { return sum + static_cast<std::size_t>(line.percent); });
+                             [](std::size_t all, auto& line) { return all + static_cast<std::size_t>(line.percent); });
   return static_cast<int>(sum / lines.size());
 }
 
