@@ -27,6 +27,13 @@ platform::Value infoOf(const PlaceholderRecord& placeholder) {
   return info;
 }
 
+/// What the home screen shows of an install that is under way: as much as has come of its package.
+InstallProgressRecord progressSoFar(const CoordinatorRecord& record) REQUIRES(recordsGuard) {
+  InstallProgressRecord progress;
+  if (record.appAsset) progress.fraction = record.appAsset->fraction;
+  return progress;
+}
+
 }  // namespace
 
 std::optional<AppRecord> writePlaceholder(const InstallParts& parts, const PlaceholderRecord& placeholder,
@@ -109,8 +116,7 @@ bool PlaceholderInstall::put(std::optional<AppRecord> written, AbandonedContaine
   bool isDemoted = _coordinator->kind == platform::RVCoordinatorKind::RVRestoringDemotedAppInstallCoordinator;
   bool hadProgress = existing && existing->progress;
   app.progress.reset();
-  if (!isDemoted) app.progress.emplace();
-  if (!isDemoted && state.record.appAsset) app.progress->fraction = state.record.appAsset->fraction;
+  if (!isDemoted) app.progress = progressSoFar(state.record);
   auto record = state.record;
   record.placeholder = _placeholder;
   ChangeSet changes;

@@ -50,6 +50,13 @@ bool isWrong(const device::CallRecord& record) {
   return arguments && !(*arguments)["error"].isAbsent();
 }
 
+template <class... Items>
+Value arrayOf(const Items&... items) {
+  Value array = Value::makeArray();
+  (array.array()->append(items), ...);
+  return array;
+}
+
 }  // namespace
 
 std::size_t ReportJournal::Words::placeOf(const std::string& word) {
@@ -118,11 +125,7 @@ Value ReportJournal::document() const {
   entries.set("total", _rows.size());
   Value leftOut = Value::makeArray();
   for (std::size_t i = 0; i < worths; ++i) {
-    if (counts[i] == room[i]) continue;
-    Value each = Value::makeArray();
-    each.array()->append(names[i]);
-    each.array()->append(counts[i] - room[i]);
-    leftOut.array()->append(each);
+    if (counts[i] != room[i]) leftOut.array()->append(arrayOf(names[i], counts[i] - room[i]));
   }
   entries.set("left", leftOut);
   auto put = [&](const char* key, const Words& words) {
@@ -139,15 +142,8 @@ Value ReportJournal::document() const {
     auto& share = room[static_cast<std::size_t>(row.worth)];
     if (share == 0) continue;
     --share;
-    Value item = Value::makeArray();
-    auto& cells = *item.array();
-    cells.append(row.number);
-    for (auto number : {row.time, row.duration}) cells.append(number);
-    for (auto place : {row.thread, row.service, row.operation}) cells.append(place);
-    cells.append(row.app);
-    cells.append(row.kind);
-    cells.append(row.text);
-    rows.array()->append(item);
+    rows.array()->append(arrayOf(row.number, row.time, row.duration, row.thread, row.service, row.operation, row.app,
+                                 row.kind, row.text));
   }
   entries.set("rows", rows);
   return document;
