@@ -8,14 +8,20 @@
 
 namespace tsd {
 
-/// A thread that runs `body`. Throws a `CommandError` when the system has none left.
-template <class Body>
-std::thread startThread(Body&& body) {
+/// What `start` answers, which starts threads. Throws a `CommandError` when the system has none left.
+template <class Start>
+auto startThreads(Start&& start) {
   try {
-    return std::thread(std::forward<Body>(body));
+    return start();
   } catch (const std::system_error& problem) {
     throw CommandError(std::string("a thread cannot be started: ") + problem.code().message());
   }
+}
+
+/// A thread that runs `body`. Throws the same.
+template <class Body>
+std::thread startThread(Body&& body) {
+  return startThreads([&] { return std::thread(std::forward<Body>(body)); });
 }
 
 }  // namespace tsd

@@ -94,7 +94,7 @@ class EventQueue {
   std::shared_ptr<Door> _door;  // what held events reach this queue through, as they may outlive it
 };
 
-/// One thread per lane and the real clock.
+/// One thread per lane and the real clock. Throws `std::system_error` when the system has no thread left.
 std::unique_ptr<EventQueue> makeThreadedEventQueue();
 
 /// Driven by hand, with a virtual clock: nothing runs until it is told to or somebody waits on the clock.

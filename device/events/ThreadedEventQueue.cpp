@@ -29,8 +29,13 @@ class SystemClock final : public platform::Clock {
 class ThreadedEventQueue final : public EventQueue {
  public:
   ThreadedEventQueue() {
-    for (std::size_t i = 0; i < laneCount; ++i) {
-      _threads[i] = std::thread([this, i] { run(static_cast<Lane>(i)); });
+    try {
+      for (std::size_t i = 0; i < laneCount; ++i) {
+        _threads[i] = std::thread([this, i] { run(static_cast<Lane>(i)); });
+      }
+    } catch (...) {
+      ThreadedEventQueue::stop();
+      throw;
     }
   }
   ~ThreadedEventQueue() override {

@@ -3,6 +3,7 @@
 #include <charconv>
 #include <csignal>
 #include <cstdint>
+#include <cstdio>
 #include <exception>
 #include <functional>
 #include <limits>
@@ -565,15 +566,26 @@ ExitCode run(int count, char** arguments) {
   return ExitCode::usage;
 }
 
+/// For what happens where nothing can be allocated any more.
+void sayWithoutMemory(const char* text) {
+  std::fputs("tsd: ", stderr);
+  std::fputs(text, stderr);
+  std::fputs("\n", stderr);
+}
+
 }  // namespace
 }  // namespace tsd
 
 int main(int count, char** arguments) {
-  // A reader that goes away must not end a sync in the middle.
+  // A reader that goes away must not end a sync in the middle, nor a file that may not grow: that is a full disk.
   std::signal(SIGPIPE, SIG_IGN);
+  std::signal(SIGXFSZ, SIG_IGN);
   try {
     return static_cast<int>(tsd::run(count, arguments));
-  } catch (const std::exception&) {
-    return static_cast<int>(tsd::ExitCode::failed);
+  } catch (const std::bad_alloc&) {
+    tsd::sayWithoutMemory("out of memory");
+  } catch (const std::exception& problem) {
+    tsd::sayWithoutMemory(problem.what());
   }
+  return static_cast<int>(tsd::ExitCode::failed);
 }

@@ -2,6 +2,7 @@
 
 #include "device/boundary/Journal.h"
 #include "tsd/CommandError.h"
+#include "tsd/StartThread.h"
 #include "tsd/history/LogLine.h"
 
 namespace tsd {
@@ -19,7 +20,8 @@ DeviceSession::DeviceSession(const CommandContext& context, const Setup& setup) 
   platform::ErrorRef error;
   _device = setup.use == DeviceUse::copy
                 ? device::openDeviceCopy(setup.folder, device::makeManualEventQueue(), deviceOptions(setup), &error)
-                : device::openDevice(setup.folder, device::makeThreadedEventQueue(), deviceOptions(setup), &error);
+                : device::openDevice(setup.folder, startThreads(device::makeThreadedEventQueue), deviceOptions(setup),
+                                     &error);
   if (!_device) throw CommandError(setup.folder + ": " + textOf(error));
 }
 

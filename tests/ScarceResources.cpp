@@ -1,0 +1,86 @@
+/// Loaded before a program: the threads and the memory that it cannot have. `SCARCE_THREADS=3` lets the third thread
+/// fail to start, and all after it; `SCARCE_MEMORY=3` does the same with allocations, `SCARCE_MEMORY=3!` with the third
+/// alone. `SCARCE_COUNT=FILE` writes the number of allocations when the program ends. What libraries allocate before
+/// `main` does not count: some of them end the process then.
+
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <pthread.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+
+extern "C" {
+
+void* __libc_malloc(std::size_t size);
+void* __libc_calloc(std::size_t count, std::size_t size);
+void* __libc_realloc(void* block, std::size_t size);
+
+static std::atomic<bool> begun{false};
+static std::atomic<unsigned long> threads{0};
+static std::atomic<unsigned long> allocations{0};
+
+/// What an environment's number says; 0 for none.
+static unsigned long numberIn(const char* name, bool* once) {
+  const char* text = getenv(name);
+  if (!text) return 0;
+  char* end = nullptr;
+  unsigned long number = strtoul(text, &end, 10);
+  *once = *end == '!';
+  return number;
+}
+
+static bool failsAllocation() {
+  if (!begun) return false;
+  static bool once = false;
+  static const unsigned long limit = numberIn("SCARCE_MEMORY", &once);
+  unsigned long number = ++allocations;
+  if (limit == 0 || number < limit || (once && number > limit)) return false;
+  errno = ENOMEM;
+  return true;
+}
+
+void* malloc(std::size_t size) { return failsAllocation() ? nullptr : __libc_malloc(size); }
+void* calloc(std::size_t count, std::size_t size) { return failsAllocation() ? nullptr : __libc_calloc(count, size); }
+void* realloc(void* block, std::size_t size) { return failsAllocation() ? nullptr : __libc_realloc(block, size); }
+
+using Main = int (*)(int, char**, char**);
+using Start = int (*)(Main, int, char**, void (*)(), void (*)(), void (*)(), void*);
+static Main programsMain;
+
+static int beginning(int count, char** arguments, char** environment) {
+  begun = true;
+  int code = programsMain(count, arguments, environment);
+  begun = false;
+  return code;
+}
+
+int __libc_start_main(Main program, int count, char** arguments, void (*init)(), void (*fini)(), void (*end)(),
+                      void* stack) {
+  programsMain = program;
+  auto start = reinterpret_cast<Start>(dlsym(RTLD_NEXT, "__libc_start_main"));
+  return start(beginning, count, arguments, init, fini, end, stack);
+}
+
+using Create = int (*)(pthread_t*, const pthread_attr_t*, void* (*)(void*), void*);
+
+int pthread_create(pthread_t* thread, const pthread_attr_t* attributes, void* (*body)(void*), void* argument) {
+  static bool once = false;
+  static const unsigned long limit = numberIn("SCARCE_THREADS", &once);
+  static const auto create = reinterpret_cast<Create>(dlsym(RTLD_NEXT, "pthread_create"));
+  if (limit != 0 && ++threads >= limit) return EAGAIN;
+  return create(thread, attributes, body, argument);
+}
+
+__attribute__((destructor)) static void writeCount() {
+  const char* path = getenv("SCARCE_COUNT");
+  int file = path ? open(path, O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600) : -1;
+  if (file < 0) return;
+  dprintf(file, "%lu", allocations.load());
+  close(file);
+}
+
+}  // extern "C"
