@@ -1,3 +1,7 @@
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include <cerrno>
 #include <filesystem>
 #include <system_error>
 #include <utility>
@@ -6,6 +10,8 @@
 #include "device/DeviceParts.h"
 #include "device/LocalDevice.h"
 #include "device/boundary/InjectedSteps.h"
+#include "device/files/DevicePath.h"
+#include "device/files/DiskFileTree.h"
 #include "device/files/OverlayFileTree.h"
 
 namespace device {
@@ -39,6 +45,14 @@ static bool isUnfinished(const std::string& folder) {
   return store && store->load().empty();
 }
 
+/// The device's own folder for its files. It is no link, even if somebody exchanges it for one just now.
+static std::unique_ptr<FileTree> openTree(const std::string& folder, ErrorRef* error,
+                                          std::shared_ptr<StepWatch> watch = nullptr) {
+  FileDescriptor root(::open((folder + treeName).c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  if (!answerFileOperation(root.isOpen() ? 0 : errno, folder + treeName, error)) return nullptr;
+  return std::make_unique<DiskFileTree>(std::move(root), std::move(watch));
+}
+
 bool createDevice(const std::string& folder, ErrorRef* error) {
   namespace fs = std::filesystem;
   setError(error, nullptr);
@@ -56,9 +70,16 @@ bool createDevice(const std::string& folder, ErrorRef* error) {
   }
   fs::create_directories(folder + treeName, failure);
   if (failure) return refuse(LocalDeviceError::failed, failure.message());
-  auto files = openDiskFileTree(folder + treeName, error);
+  auto files = openTree(folder, error);
   auto store = files ? openDatabaseStore(folder + databaseName, error) : nullptr;
   return store && fillDeviceParts(*files, *store, error);
+}
+
+/// What is wrong with a file of the store: it is to be a file of this folder alone, as it is written in its place.
+static const char* flawOf(const struct stat& facts) {
+  if (S_ISLNK(facts.st_mode)) return "a symbolic link";
+  if (!S_ISREG(facts.st_mode)) return "no regular file";
+  return facts.st_nlink > 1 ? "a file that has other names, too" : nullptr;
 }
 
 /// False with an error that says what is there instead.
@@ -66,17 +87,27 @@ static bool checkIsDevice(const std::string& folder, ErrorRef* error) {
   namespace fs = std::filesystem;
   setError(error, nullptr);
   std::error_code failure;
-  if (fs::is_regular_file(folder + databaseName, failure) && fs::is_directory(folder + treeName, failure)) return true;
-  return fail(
-      error, localDeviceError(LocalDeviceError::notADevice,
-                              folder + (fs::exists(folder, failure) ? ": not a device" : ": there is no such folder")));
+  auto refuse = [&](const std::string& why) {
+    return fail(error, localDeviceError(LocalDeviceError::notADevice, folder + why));
+  };
+  struct stat facts {};
+  const std::string database = folder + databaseName;
+  if (::lstat((folder + treeName).c_str(), &facts) != 0 || !S_ISDIR(facts.st_mode) ||
+      ::lstat(database.c_str(), &facts) != 0 || S_ISDIR(facts.st_mode))
+    return refuse(fs::exists(folder, failure) ? ": not a device" : ": there is no such folder");
+  // A pipe would be waited for.
+  for (const char* ending : {"", "-journal", "-wal", "-shm"}) {
+    if (::lstat((database + ending).c_str(), &facts) != 0) continue;
+    if (const char* flaw = flawOf(facts)) return refuse(std::string(databaseName) + ending + ": " + flaw);
+  }
+  return true;
 }
 
 std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_ptr<EventQueue> events,
                                         DeviceOptions options, ErrorRef* error) {
   if (!checkIsDevice(folder, error)) return nullptr;
   auto steps = InjectedSteps::of(options.rules);
-  auto files = openDiskFileTree(folder + treeName, error, steps);
+  auto files = openTree(folder, error, steps);
   auto store = files ? openDatabaseStore(folder + databaseName, error, steps) : nullptr;
   if (!store) return nullptr;
   return LocalDevice::open(std::move(files), std::move(store), std::move(events), std::move(options), error);
@@ -85,7 +116,7 @@ std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_p
 std::unique_ptr<LocalDevice> openDeviceCopy(const std::string& folder, std::unique_ptr<EventQueue> events,
                                             DeviceOptions options, ErrorRef* error) {
   if (!checkIsDevice(folder, error)) return nullptr;
-  auto files = openDiskFileTree(folder + treeName, error);
+  auto files = openTree(folder, error);
   auto store = files ? copyDatabaseStore(folder + databaseName, error) : nullptr;
   if (!store) return nullptr;
   return LocalDevice::open(std::make_unique<OverlayFileTree>(std::move(files)), std::move(store), std::move(events),

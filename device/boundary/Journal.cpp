@@ -83,7 +83,24 @@ std::string jsonText(const Value& value, int indent) {
   return text;
 }
 
+/// Whether arrays and objects are nested so deep at most.
+static bool isNestedAtMost(std::size_t depth, std::string_view text) {
+  std::size_t open = 0;
+  for (std::size_t at = 0; at < text.size(); ++at) {
+    char c = text[at];
+    if (c == '"') {
+      while (++at < text.size() && text[at] != '"') at += text[at] == '\\' ? 1 : 0;
+    } else if (c == '[' || c == '{') {
+      if (++open > depth) return false;
+    } else if ((c == ']' || c == '}') && open > 0) {
+      --open;
+    }
+  }
+  return true;
+}
+
 Value valueOfJson(std::string_view text) {
+  if (!isNestedAtMost(deepestJson, text)) return {};
   auto parsed = json::parse(text, nullptr, false);
   return parsed.is_discarded() ? Value() : valueOf(parsed);
 }

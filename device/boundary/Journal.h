@@ -20,7 +20,9 @@ std::optional<CallRecord> parseJournalLine(std::string_view line);
 
 /// JSON text of a property-list value: data as its count of bytes, dates as ISO 8601; `indent` below 0 for one line.
 std::string jsonText(const platform::Value& value, int indent = -1);
-/// A property-list value of JSON text, null as absent; absent also for text that is not JSON.
+/// The depth of arrays and objects that JSON text may have: more than any value of a document has.
+constexpr std::size_t deepestJson = 1024;
+/// A property-list value of JSON text, null as absent; absent also for text that is not JSON or is nested too deeply.
 platform::Value valueOfJson(std::string_view text);
 
 }  // namespace device

@@ -54,8 +54,9 @@ std::vector<std::string> settingKeys() {
 
 std::string settingOf(const DeviceState& state, std::string_view key) {
   auto set = state.settings.find(key);
-  if (set != state.settings.end()) return set->second;
   const auto* known = findSetting(key);
+  // Somebody else may have written to the store.
+  if (set != state.settings.end() && (!known || known->accepts(set->second))) return set->second;
   return known ? std::string(known->byDefault) : std::string();
 }
 

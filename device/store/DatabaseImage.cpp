@@ -58,7 +58,7 @@ class LogSum {
 
 /// Answers an error number.
 int readWhole(const std::string& path, Bytes& bytes) {
-  FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW));
+  FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
   if (!file.isOpen()) return errno;
   struct stat facts {};
   if (::fstat(file.get(), &facts) != 0) return errno;
@@ -92,9 +92,9 @@ struct Period {
 
 int periodOf(const std::string& path, Period& period) {
   struct stat facts {};
-  if (::stat(path.c_str(), &facts) != 0) return errno;
+  if (::lstat(path.c_str(), &facts) != 0) return errno;
   period = {facts.st_ino, facts.st_mtim, std::string(logHeaderSize, '\0')};
-  FileDescriptor log(::open((path + "-wal").c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW));
+  FileDescriptor log(::open((path + "-wal").c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
   if (!log.isOpen() && errno != ENOENT) return errno;
   ssize_t count = log.isOpen() ? ::pread(log.get(), period.header.data(), logHeaderSize, 0) : 0;
   if (count < 0) return errno;

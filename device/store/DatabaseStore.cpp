@@ -2,8 +2,10 @@
 
 #include <algorithm>
 #include <cstdint>
+#include <filesystem>
 #include <memory>
 #include <string_view>
+#include <system_error>
 #include <utility>
 
 #include "device/files/DevicePath.h"
@@ -48,6 +50,15 @@ std::string_view bytesOfColumn(sqlite3_stmt* statement, int column) {
   return {static_cast<const char*>(bytes), static_cast<std::size_t>(sqlite3_column_bytes(statement, column))};
 }
 
+/// The path with the links on the way to its last name resolved; as it is when that fails.
+std::string withoutLinks(const std::string& path) {
+  namespace fs = std::filesystem;
+  std::error_code failure;
+  const fs::path file(path);
+  const fs::path folder = fs::canonical(file.has_parent_path() ? file.parent_path() : ".", failure);
+  return failure ? path : (folder / file.filename()).string();
+}
+
 /// A transaction that is rolled back unless it was committed.
 class Transaction {
  public:
@@ -80,8 +91,10 @@ class DatabaseStore final : public Store {
   bool open(ErrorRef* error) {
     platform::Mutex::Lock lock(_mutex);
     sqlite3* opened = nullptr;
-    int status = sqlite3_open_v2(_path.c_str(), &opened,
-                                 SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE | SQLITE_OPEN_NOMUTEX, nullptr);
+    // The folder may be reached through links; the file itself is none, nor becomes one meanwhile.
+    int status = sqlite3_open_v2(
+        withoutLinks(_path).c_str(), &opened,
+        SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_NOFOLLOW, nullptr);
     _database.reset(opened);
     if (status != SQLITE_OK) return fail(error);
     sqlite3_extended_result_codes(_database.get(), 1);

@@ -30,7 +30,7 @@ RunSummary chosenRun(const std::string& device, const std::vector<RunSummary>& r
 
 ExitCode runReport(const CommandContext& context, const ReportOptions& options) {
   DeviceView view(context, options.device);
-  auto runs = keptRuns(options.device + "/runs");
+  auto runs = keptRuns(options.device, context.console.problems());
   ReportSubject subject;
   subject.run = chosenRun(options.device, runs, options.run);
   subject.isLast = subject.run.number == runs.back().number;

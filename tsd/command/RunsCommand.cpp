@@ -65,7 +65,7 @@ std::string text(const std::vector<RunSummary>& runs) {
 
 ExitCode runRuns(const CommandContext& context, const DeviceOnlyOptions& options) {
   DeviceLock::requireDevice(options.device);
-  auto runs = keptRuns(options.device + "/runs");
+  auto runs = keptRuns(options.device, context.console.problems());
   if (context.options.json)
     writeDocument(document(context, runs));
   else

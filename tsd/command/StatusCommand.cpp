@@ -96,7 +96,7 @@ ExitCode runStatus(const CommandContext& context, const DeviceOnlyOptions& optio
     view.addHolder(answer);
     writeDocument(answer);
   } else {
-    writeOutput(text(view, keptRuns(options.device + "/runs")));
+    writeOutput(text(view, keptRuns(options.device, context.console.problems())));
   }
   return ExitCode::done;
 }

@@ -186,8 +186,8 @@ std::string text(const std::string& id, const std::string& answer, const Present
   return text + nowText(present);
 }
 
-std::vector<RunSummary> runsOf(const WhyOptions& options) {
-  auto runs = keptRuns(options.device + "/runs");
+std::vector<RunSummary> runsOf(const CommandContext& context, const WhyOptions& options) {
+  auto runs = keptRuns(options.device, context.console.problems());
   if (options.run == 0) return runs;
   for (auto& run : runs) {
     if (run.number == options.run) return {run};
@@ -210,7 +210,7 @@ std::vector<AppChapter> chaptersOf(const std::vector<RunSummary>& runs, const st
 }  // namespace
 
 ExitCode runWhy(const CommandContext& context, const WhyOptions& options) {
-  const auto runs = runsOf(options);
+  const auto runs = runsOf(context, options);
   const DeviceView view(context, options.device);
   std::string id = options.app;
   auto chapters = chaptersOf(runs, id);

@@ -32,9 +32,12 @@ const char* sortOfFile(unsigned mode) {
 
 std::optional<HostFile> HostFile::open(const std::string& folder, const std::string& name, platform::ErrorRef* error) {
   if (folder.empty()) return openAt(AT_FDCWD, name, error);
-  int directory = ::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  int directory = ::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
   if (directory < 0) {
-    platform::setError(error, hostError(errno));
+    int reason = errno;
+    struct stat facts {};
+    bool isLink = reason == ENOTDIR && ::lstat(folder.c_str(), &facts) == 0 && S_ISLNK(facts.st_mode);
+    platform::setError(error, isLink ? hostError(ELOOP, std::string("in ") + sortOfFile(S_IFLNK)) : hostError(reason));
     return std::nullopt;
   }
   auto file = openAt(directory, name, error);
@@ -84,6 +87,11 @@ std::optional<platform::Bytes> HostFile::read(std::size_t count, platform::Error
 
 std::optional<platform::Bytes> HostFile::readRest(std::size_t limit, platform::ErrorRef* error) {
   platform::Bytes all;
+  if (_size > limit) {
+    platform::setError(error, hostError(EFBIG));
+    return std::nullopt;
+  }
+  all.reserve(static_cast<std::size_t>(_size));
   while (true) {
     auto some = read(std::size_t{1} << 20, error);
     if (!some) return std::nullopt;

@@ -14,8 +14,8 @@ namespace tsd {
 /// step, no pipe or device is touched.
 class HostFile {
  public:
-  /// `name` is one component below `folder`, or, with an empty folder, a path. Nothing on failure, with an error of the
-  /// domain "Host" whose description says what is wrong without naming the file.
+  /// `name` is one component below `folder`, which is no link, or, with an empty folder, a path. Nothing on failure,
+  /// with an error of the domain "Host" whose description says what is wrong without naming the file.
   static std::optional<HostFile> open(const std::string& folder, const std::string& name,
                                       platform::ErrorRef* error = nullptr);
   /// Below a directory that is open already.

@@ -79,6 +79,12 @@ void requireHostFolder(const std::string& folder) {
   auto has = [&](std::string_view name) { return std::binary_search(names.begin(), names.end(), name); };
   if (has("device.db") && has("fs")) throw CommandError(folder + ": this is a device, not a host");
   if (auto misspelled = misspelledFiles(folder); !misspelled.empty()) throw CommandError(misspelled.front());
+  for (auto name : {packagesName, restoreName}) {
+    const std::string path = folder + "/" + std::string(name);
+    std::error_code problem;
+    if (std::filesystem::is_symlink(std::filesystem::symlink_status(path, problem)))
+      throw CommandError(path + ": a symbolic link, which is not followed");
+  }
   if (std::none_of(hostNames.begin(), hostNames.end(), has)) {
     throw CommandError(folder + ": nothing of a host is in it: no " + std::string(todoListName) + ", " +
                        std::string(iconLayoutName) + ", " + std::string(packagesName) + " or " +

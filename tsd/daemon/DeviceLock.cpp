@@ -11,8 +11,8 @@
 #include <iterator>
 
 #include "device/LocalDevice.h"
-#include "device/files/FileDescriptor.h"
 #include "tsd/CommandError.h"
+#include "tsd/conduit/HostFile.h"
 #include "tsd/terminal/Console.h"
 
 namespace tsd {
@@ -55,13 +55,18 @@ void DeviceLock::requireDevice(const std::string& folder) {
 DeviceLock::DeviceLock(const std::string& folder) {
   requireDevice(folder);
   std::string path = folder + "/" + std::string(device::lockName);
-  _descriptor = ::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0644);
-  if (_descriptor < 0) throw CommandError(path + ": " + std::strerror(errno));
-  while (::flock(_descriptor, LOCK_EX | LOCK_NB) != 0) {
+  _file = device::FileDescriptor(
+      ::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY, 0644));
+  struct stat facts {};
+  if (!_file.isOpen() || ::fstat(_file.get(), &facts) != 0)
+    throw CommandError(path + ": " + (errno == ELOOP ? sortOfFile(S_IFLNK) : std::strerror(errno)));
+  // It is cut and written to: it is to be no other's.
+  if (!S_ISREG(facts.st_mode)) throw CommandError(path + ": " + sortOfFile(facts.st_mode));
+  if (facts.st_nlink > 1) throw CommandError(path + ": a file that has other names, too");
+  while (::flock(_file.get(), LOCK_EX | LOCK_NB) != 0) {
     if (errno == EINTR) continue;
     int reason = errno;
-    std::string holder = reason == EWOULDBLOCK ? contentOf(_descriptor) : "";
-    ::close(_descriptor);
+    std::string holder = reason == EWOULDBLOCK ? contentOf(_file.get()) : "";
     if (reason != EWOULDBLOCK) throw CommandError(path + ": " + std::strerror(reason));
     throw CommandError(ExitCode::busy,
                        folder + ": in use by " + (holder.empty() ? "another process" : "process " + holder));
@@ -70,11 +75,9 @@ DeviceLock::DeviceLock(const std::string& folder) {
 }
 
 DeviceLock::~DeviceLock() {
-  if (_descriptor < 0) return;
   // The file stays: removing it would let two processes lock two files of one name.
-  while (::ftruncate(_descriptor, 0) < 0 && errno == EINTR) {
+  while (::ftruncate(_file.get(), 0) < 0 && errno == EINTR) {
   }
-  ::close(_descriptor);
 }
 
 std::optional<DeviceLock::Holder> DeviceLock::holderOf(const std::string& folder) {
@@ -95,7 +98,7 @@ std::optional<DeviceLock::Holder> DeviceLock::holderOf(const std::string& folder
 
 void DeviceLock::noteHolder() {
   std::string text = std::to_string(::getpid()) + " (" + commandOf("self") + ")\n";
-  bool noted = ::ftruncate(_descriptor, 0) == 0 && ::pwrite(_descriptor, text.data(), text.size(), 0) >= 0;
+  bool noted = ::ftruncate(_file.get(), 0) == 0 && ::pwrite(_file.get(), text.data(), text.size(), 0) >= 0;
   static_cast<void>(noted);  // the lock holds without its note
 }
 

@@ -3,6 +3,8 @@
 #include <optional>
 #include <string>
 
+#include "device/files/FileDescriptor.h"
+
 namespace tsd {
 
 /// The right to change a device folder, for as long as the object lives. One process at a time has it; it ends with the
@@ -30,7 +32,7 @@ class DeviceLock {
  private:
   void noteHolder();
 
-  int _descriptor = -1;
+  device::FileDescriptor _file;
 };
 
 }  // namespace tsd

@@ -2,10 +2,10 @@
 
 #include <cstdio>
 #include <exception>
-#include <filesystem>
 #include <utility>
 
 #include "device/boundary/Journal.h"
+#include "tsd/CommandError.h"
 #include "tsd/history/LineFile.h"
 #include "tsd/history/LogLine.h"
 #include "tsd/history/RunHistory.h"
@@ -13,36 +13,49 @@
 
 namespace tsd {
 
-namespace fs = std::filesystem;
+using platform::ErrorRef;
 using platform::Value;
 
 KeptRun::KeptRun(const std::string& device, const CommonOptions& options, Console& console)
-    : _options(options), _console(console), _began(currentTimeText()) {
+    : _options(options), _console(console), _device(device), _began(currentTimeText()) {
   try {
-    makeFolder(device + "/runs");
+    makeFolder();
     writeSummary(nullptr);
-    _calls.emplace(_folder + "/calls.jsonl", mostBytes,
+    _calls.emplace(newFile("/calls.jsonl"), mostBytes,
                    R"({"note":"the journal is cut off here, as it has become too long"})");
-    _log.emplace(_folder + "/log", mostBytes, "the log is cut off here because it has become too long");
+    _log.emplace(newFile("/log"), mostBytes, "the log is cut off here because it has become too long");
   } catch (const std::exception& problem) {
     tell(problem.what());
   }
 }
 
-void KeptRun::makeFolder(const std::string& runs) {
-  auto kept = keptRuns(runs);
-  for (std::size_t i = 0; i + most <= kept.size(); ++i) fs::remove_all(kept[i].folder);
-  for (const auto& run : kept) {
-    if (run.ended) continue;
-    MappedLines::trim(run.folder + "/calls.jsonl");
-    MappedLines::trim(run.folder + "/log");
+void KeptRun::require(bool done, const ErrorRef& error) const {
+  if (!done) throw CommandError(_device + textOf(error));
+}
+
+void KeptRun::makeFolder() {
+  ErrorRef error;
+  _files = device::openDiskFileTree(_device, &error);
+  if (!_files) throw CommandError(textOf(error));
+  auto kept = keptRuns(_device, [this](const std::string& problem) { tell(problem); });
+  for (std::size_t i = 0; i + most <= kept.size(); ++i) {
+    bool removed = _files->removeItem(kept[i].folder, &error);
+    require(removed, error);
   }
-  fs::create_directories(runs);
   char number[24];
   std::snprintf(number, sizeof number, "%04llu", (kept.empty() ? 0ULL : kept.back().number) + 1ULL);
-  std::string folder = runs + "/" + number + "-" + _options.command;
-  fs::create_directory(folder);
+  std::string folder = std::string(runsFolder) + "/" + number + "-" + _options.command;
+  bool made =
+      _files->createDirectory(runsFolder, true, {}, &error) && _files->createDirectory(folder, false, {}, &error);
+  require(made, error);
   _folder = std::move(folder);
+}
+
+std::unique_ptr<device::FileWriter> KeptRun::newFile(const char* name) const {
+  ErrorRef error;
+  auto file = _files->createNew(_folder + name, false, &error);
+  require(file != nullptr, error);
+  return file;
 }
 
 void KeptRun::hear(const device::CallRecord& record) {
@@ -68,12 +81,9 @@ void KeptRun::writeSummary(const ExitCode* code) const {
     if (_counts.total() != 0) entries.set("counts", _counts.document());
     if (!_message.empty()) entries.set("message", _message);
   }
-  std::string path = _folder + "/run.json";
-  std::string unfinished = path + ".new";
-  LineFile file(unfinished);
-  file.write(device::jsonText(summary));
-  if (file.failed()) throw fs::filesystem_error("not every line could be written", unfinished, std::error_code());
-  fs::rename(unfinished, path);
+  ErrorRef error;
+  bool written = _files->putFile(_folder + "/run.json", device::jsonText(summary) + '\n', {}, &error);
+  require(written, error);
 }
 
 void KeptRun::conclude(const std::vector<AppOutcome>& apps, const std::string& message) {
@@ -81,10 +91,12 @@ void KeptRun::conclude(const std::vector<AppOutcome>& apps, const std::string& m
   _message = message;
   if (_folder.empty() || apps.empty()) return;
   try {
-    LineFile file(_folder + "/apps.jsonl");
+    std::string lines;
     const Value document = documentOf(apps);
-    for (const auto& app : *document.array()) file.write(device::jsonText(app));
-    if (file.failed()) tell(_folder + "/apps.jsonl: not every line could be written");
+    for (const auto& app : *document.array()) lines += device::jsonText(app) + '\n';
+    ErrorRef error;
+    bool written = _files->putFile(_folder + "/apps.jsonl", lines, {}, &error);
+    require(written, error);
   } catch (const std::exception& problem) {
     tell(problem.what());
   }
@@ -98,7 +110,8 @@ void KeptRun::end(ExitCode code, const std::string& message) {
   } catch (const std::exception& problem) {
     tell(problem.what());
   }
-  if ((_calls && _calls->failed()) || (_log && _log->failed())) tell(_folder + ": not every line could be written");
+  if ((_calls && _calls->failed()) || (_log && _log->failed()))
+    tell(_device + _folder + ": not every line could be written");
 }
 
 void KeptRun::tell(const std::string& problem) {

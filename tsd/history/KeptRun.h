@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
@@ -9,8 +10,8 @@
 #include "device/LocalDevice.h"
 #include "tsd/CommonOptions.h"
 #include "tsd/ExitCode.h"
-#include "tsd/history/MappedLines.h"
 #include "tsd/history/Outcome.h"
+#include "tsd/history/RunLines.h"
 #include "tsd/terminal/Console.h"
 
 namespace tsd {
@@ -39,20 +40,25 @@ class KeptRun {
   void end(ExitCode code, const std::string& message = {});
 
  private:
-  void makeFolder(const std::string& runs);
+  void makeFolder();
+  std::unique_ptr<device::FileWriter> newFile(const char* name) const;
   void writeSummary(const ExitCode* code) const;
+  /// Throws a `CommandError` that names the file, when the operation has failed.
+  void require(bool done, const platform::ErrorRef& error) const;
   void tell(const std::string& problem);
 
   const CommonOptions& _options;
   Console& _console;
+  const std::string _device;
   const std::string _began;
-  std::string _folder;  // empty: nothing is kept
+  std::unique_ptr<device::FileTree> _files;  // the device's folder; null: nothing is kept
+  std::string _folder;                       // below it; empty: nothing is kept
   OutcomeCounts _counts;
   std::string _message;
   bool _told = false;
-  std::optional<MappedLines> _calls;  // guarded by the journal's lock
-  std::optional<MappedLines> _log;    // guarded by the system log's lock
-  std::string _line;                  // of the journal, its memory kept; guarded by the journal's lock
+  std::optional<RunLines> _calls;  // guarded by the journal's lock
+  std::optional<RunLines> _log;    // guarded by the system log's lock
+  std::string _line;               // of the journal, its memory kept; guarded by the journal's lock
 };
 
 }  // namespace tsd

@@ -23,9 +23,11 @@ void LineFile::write(std::string line) {
 }
 
 std::string currentTimeText() {
-  auto now = std::chrono::system_clock::now();
-  std::time_t seconds = std::chrono::system_clock::to_time_t(now);
-  auto milliseconds = std::chrono::duration_cast<std::chrono::milliseconds>(now.time_since_epoch()).count() % 1000;
+  // Rounded down also before 1970, where a clock that was never set may stand.
+  auto now = std::chrono::floor<std::chrono::milliseconds>(std::chrono::system_clock::now());
+  auto whole = std::chrono::floor<std::chrono::seconds>(now);
+  std::time_t seconds = std::chrono::system_clock::to_time_t(whole);
+  auto milliseconds = (now - whole).count();
   std::tm parts{};
   gmtime_r(&seconds, &parts);
   char text[48];

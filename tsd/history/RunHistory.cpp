@@ -1,37 +1,45 @@
 #include "tsd/history/RunHistory.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <charconv>
-#include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <system_error>
+#include <utility>
 
 #include "device/boundary/Journal.h"
+#include "tsd/CommandError.h"
 
 namespace tsd {
 
-namespace fs = std::filesystem;
-
 namespace {
 
+/// A summary holds the command's arguments and one message, a line of the journal brief values.
+constexpr std::size_t longestSummary = std::size_t{4} << 20;
+constexpr std::size_t longestLine = std::size_t{1} << 20;
+
 /// "0017-sync"
-std::optional<RunSummary> runOfFolder(const fs::path& folder) {
-  std::string name = folder.filename().string();
+std::optional<RunSummary> runOfFolder(const std::string& name) {
   RunSummary run;
   auto [end, problem] = std::from_chars(name.data(), name.data() + name.size(), run.number);
   if (problem != std::errc() || end == name.data() + name.size() || *end != '-') return std::nullopt;
-  run.folder = folder.string();
+  run.folder = std::string(runsFolder) + '/' + name;
   run.command = end + 1;
   return run;
 }
 
-void readSummary(RunSummary& run) {
-  std::ifstream file(run.folder + "/run.json", std::ios::binary);
-  const std::string text{std::istreambuf_iterator<char>(file), {}};
-  const platform::Value summary = device::valueOfJson(text);
+bool isMissing(const platform::ErrorRef& error) { return error && error->code() == ENOENT; }
+
+/// Why the summary cannot be read; empty when it can, or there is none.
+std::string readSummary(RunSummary& run) {
+  platform::ErrorRef error;
+  const std::string path = run.folder + "/run.json";
+  auto file = run.files->openForReading(path, &error);
+  auto text = file ? file->read(longestSummary + 1, &error) : std::nullopt;
+  if (!text) return isMissing(error) ? "" : textOf(error);
+  if (text->size() > longestSummary) return path + ": too long for the summary of a run";
+  const platform::Value summary = device::valueOfJson(*text);
   const auto* entries = summary.dictionary();
-  if (!entries) return;
+  if (!entries) return path + ": not the summary of a run";
   if (const auto* arguments = (*entries)["arguments"].array()) {
     for (const auto& argument : *arguments) run.arguments.emplace_back(argument.string().value_or(""));
   }
@@ -41,21 +49,46 @@ void readSummary(RunSummary& run) {
   run.counts = OutcomeCounts::ofDocument((*entries)["counts"]);
   run.message = (*entries)["message"].string().value_or("");
   if (auto code = (*entries)["exitCode"].integer()) run.exitCode = static_cast<int>(*code);
+  return {};
+}
+
+/// Calls `each` with every line of one of the run's files; none when it is not there.
+template <class Each>
+void readLines(const RunSummary& run, const char* name, Each&& each) {
+  platform::ErrorRef error;
+  auto file = run.files->openForReading(run.folder + name, &error);
+  if (!file && isMissing(error)) return;
+  std::string text;
+  bool passesOver = false;  // the rest of a line that is too long
+  while (file) {
+    auto block = file->read(longestLine, &error);
+    if (!block) break;
+    if (block->empty()) return;
+    text += *block;
+    std::size_t begin = 0;
+    for (std::size_t end; (end = text.find('\n', begin)) != std::string::npos; begin = end + 1) {
+      if (!std::exchange(passesOver, false)) each(text.substr(begin, end - begin));
+    }
+    text.erase(0, begin);
+    if (text.size() > longestLine) {
+      passesOver = true;
+      text.clear();
+    }
+  }
+  throw CommandError(run.device + textOf(error));
 }
 
 /// Every app of the run's outcomes whose line has the text in it.
 template <class Each>
 void readOutcomes(const RunSummary& run, const std::string& text, Each&& each) {
-  std::ifstream file(run.folder + "/apps.jsonl", std::ios::binary);
-  std::string line;
-  while (std::getline(file, line)) {
-    if (line.find(text) == std::string::npos) continue;
+  readLines(run, "/apps.jsonl", [&](const std::string& line) {
+    if (line.find(text) == std::string::npos) return;
     const platform::Value value = device::valueOfJson(line);
     const auto* fields = value.dictionary();
     auto field = [&](const char* key) { return std::string((*fields)[key].string().value_or("")); };
     auto outcome = fields ? outcomeNamed(field("outcome")) : std::nullopt;
     if (outcome) each(AppOutcome{field("id"), field("name"), field("version"), *outcome, field("reason")});
-  }
+  });
 }
 
 }  // namespace
@@ -74,13 +107,22 @@ std::vector<AppOutcome> outcomesIn(const RunSummary& run) {
   return apps;
 }
 
-std::vector<RunSummary> keptRuns(const std::string& runs) {
+std::vector<RunSummary> keptRuns(const std::string& device, const TellProblem& tell) {
   std::vector<RunSummary> found;
-  std::error_code problem;
-  for (fs::directory_iterator entry(runs, problem), end; !problem && entry != end; entry.increment(problem)) {
-    auto run = runOfFolder(entry->path());
+  auto say = [&](const std::string& problem) {
+    if (tell) tell(device + problem);
+  };
+  platform::ErrorRef error;
+  std::shared_ptr<device::FileTree> files = device::openDiskFileTree(device, &error);
+  auto entries = files ? files->list(runsFolder, &error) : std::nullopt;
+  if (!entries && files && !isMissing(error)) say(textOf(error));
+  if (!entries) return found;
+  for (const auto& entry : *entries) {
+    auto run = entry.isDirectory ? runOfFolder(entry.name) : std::nullopt;
     if (!run) continue;
-    readSummary(*run);
+    run->files = files;
+    run->device = device;
+    if (std::string problem = readSummary(*run); !problem.empty()) say(problem);
     found.push_back(std::move(*run));
   }
   std::sort(found.begin(), found.end(), [](const auto& one, const auto& other) { return one.number < other.number; });
@@ -89,14 +131,11 @@ std::vector<RunSummary> keptRuns(const std::string& runs) {
 
 void readJournal(const RunSummary& run, const std::vector<std::string>& texts,
                  const std::function<void(const device::CallRecord& record)>& each) {
-  std::ifstream file(run.folder + "/calls.jsonl", std::ios::binary);
-  std::string line;
-  while (std::getline(file, line)) {
-    if (!line.empty() && line.front() == '\0') break;  // the run is still going on
+  readLines(run, "/calls.jsonl", [&](const std::string& line) {
     auto isIn = [&line](const std::string& text) { return line.find(text) != std::string::npos; };
-    if (std::none_of(texts.begin(), texts.end(), isIn)) continue;
+    if (std::none_of(texts.begin(), texts.end(), isIn)) return;
     if (auto record = device::parseJournalLine(line)) each(*record);
-  }
+  });
 }
 
 }  // namespace tsd

@@ -1,16 +1,11 @@
 #include "tsd/history/RunProgress.h"
 
-#include <fcntl.h>
-#include <unistd.h>
-
 #include <algorithm>
-#include <cerrno>
 #include <charconv>
 #include <cmath>
-#include <cstring>
+#include <utility>
 
 #include "device/boundary/Journal.h"
-#include "device/files/FileDescriptor.h"
 #include "tsd/history/RunHistory.h"
 
 namespace tsd {
@@ -19,45 +14,44 @@ namespace {
 constexpr std::size_t blockSize = std::size_t{1} << 20;
 constexpr std::string_view progressCall = R"("op":"assetTransferUpdatedProgress","app":)";
 
-/// The journal of the last sync, if that sync has not come to its end.
-std::string openJournalOf(const std::string& runs) {
-  auto all = keptRuns(runs);
+/// The last sync, when that has not come to its end.
+std::optional<RunSummary> openRunOf(const std::string& device) {
+  auto all = keptRuns(device, nullptr);
   auto last = std::find_if(all.rbegin(), all.rend(), [](const auto& run) { return run.command == "sync"; });
-  return last == all.rend() || last->ended ? "" : last->folder + "/calls.jsonl";
+  if (last == all.rend() || last->ended) return std::nullopt;
+  return *last;
 }
 
 }  // namespace
 
 bool RunProgress::refresh() {
-  std::string journal = openJournalOf(_runs);
+  auto run = openRunOf(_device);
+  std::string journal = run ? run->folder + "/calls.jsonl" : "";
   bool changed = journal != _journal;
   if (changed) {
     _journal = std::move(journal);
     _read = 0;
     _fractions.clear();
   }
-  device::FileDescriptor file(_journal.empty() ? -1 : ::open(_journal.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW));
-  if (!file.isOpen()) return changed;
-  std::string block;
+  auto file = run ? run->files->openForReading(_journal) : nullptr;
+  if (!file || !file->seek(_read)) return changed;
+  std::string text;
   while (true) {
-    std::size_t kept = block.size();
-    block.resize(kept + blockSize);
-    ssize_t count = ::pread(file.get(), block.data() + kept, blockSize, static_cast<off_t>(_read + kept));
-    if (count < 0 && errno == EINTR) count = 0;
-    block.resize(kept + static_cast<std::size_t>(std::max<ssize_t>(0, count)));
-    // Behind the last line of a run that is still going on there are zeros.
-    std::size_t end = std::min(block.find('\0', kept), block.size());
-    std::string_view text = std::string_view(block).substr(0, end);
-    const std::size_t lines = text.rfind('\n') + 1;  // bytes of those that are whole
-    text = text.substr(0, lines);
-    for (std::size_t at = text.find(progressCall); at != std::string_view::npos; at = text.find(progressCall, at + 1)) {
-      std::size_t begin = text.rfind('\n', at) + 1;
-      take(text.substr(begin, text.find('\n', at) - begin));
+    auto block = file->read(blockSize);
+    if (!block || block->empty()) return changed;
+    text += *block;
+    const std::size_t size = text.rfind('\n') + 1;  // of the lines that are whole
+    const std::string_view lines = std::string_view(text).substr(0, size);
+    for (std::size_t at = lines.find(progressCall); at != std::string_view::npos;
+         at = lines.find(progressCall, at + 1)) {
+      std::size_t begin = lines.rfind('\n', at) + 1;
+      take(lines.substr(begin, lines.find('\n', at) - begin));
     }
-    changed = changed || lines > 0;
-    _read += lines;
-    if (end < block.size() || count <= 0) return changed;
-    block.erase(0, lines);
+    changed = changed || size > 0;
+    _read += size;
+    text.erase(0, size);
+    // No line is as long: it is none of ours.
+    if (text.size() > blockSize) return changed;
   }
 }
 

@@ -15,7 +15,7 @@ namespace tsd {
 class RunProgress {
  public:
   /// `device` is the device's folder.
-  explicit RunProgress(const std::string& device) : _runs(device + "/runs") {}
+  explicit RunProgress(const std::string& device) : _device(device) {}
 
   /// Reads what was added to the journal since the last time. Answers whether anything was.
   bool refresh();
@@ -27,8 +27,8 @@ class RunProgress {
  private:
   void take(std::string_view line);
 
-  const std::string _runs;
-  std::string _journal;     // of the run being read; empty: there is none
+  const std::string _device;
+  std::string _journal;     // of the run that is looked at; empty: there is none
   std::uint64_t _read = 0;  // bytes of it, up to the end of a line
   platform::TextMap<double> _fractions;
 };

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstddef>
+#include <functional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -22,6 +23,10 @@ class Console {
   void line(std::string_view text);
   /// "tsd: " and the text, one line.
   void message(std::string_view text);
+  /// Whoever finds something wrong says it by this: a message.
+  std::function<void(const std::string& problem)> problems() {
+    return [this](const std::string& problem) { message(problem); };
+  }
   /// Replaces the lines that are redrawn in place; an empty list removes them. The terminal cuts lines that are too
   /// wide; it may have become narrower since the last time.
   void setRegion(std::vector<TerminalLine> lines);
