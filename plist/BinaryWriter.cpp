@@ -7,6 +7,7 @@
 #include "platform/DateText.h"
 #include "plist/BigEndian.h"
 #include "plist/Failure.h"
+#include "plist/PropertyList.h"
 #include "plist/Unicode.h"
 
 namespace plist {
@@ -30,6 +31,11 @@ unsigned integerSize(const Value& value) {
 
 }  // namespace
 
+/// Whether a document of that size may hold so much.
+bool BinaryWriter::isReadable(std::size_t size) const {
+  return _references <= maximumNodes(size) && _text <= maximumText(size);
+}
+
 std::optional<platform::Bytes> BinaryWriter::write(const Value& value, platform::ErrorRef& error) {
   if (!count(value, 0)) {
     error = _error;
@@ -48,6 +54,10 @@ std::optional<platform::Bytes> BinaryWriter::write(const Value& value, platform:
 
   platform::Bytes bytes;
   std::size_t size = table + _objects * _offsetSize + trailerSize;
+  if (_shares && !isReadable(size)) {
+    _strings.reset();
+    return BinaryWriter(false).write(value, error);
+  }
   bytes.reserve(size);
   bytes.resize(stringsEnd);
   _begin = _at = bytes.data();
@@ -86,7 +96,8 @@ bool BinaryWriter::count(const Value& value, std::size_t depth) {
     case Value::Kind::string:
       return countString(*value.string());
     case Value::Kind::data:
-      countObject(markerSize(value.data()->size()) + value.data()->size());
+      if (addText(StringTable::Kind::data, *value.data()))
+        _stringsSize += markerSize(value.data()->size()) + value.data()->size();
       return true;
     case Value::Kind::array:
       if (!countContainer(value.array()->size(), 1, depth)) return false;
@@ -105,10 +116,16 @@ bool BinaryWriter::count(const Value& value, std::size_t depth) {
   return false;
 }
 
+/// Whether it is a new object.
+bool BinaryWriter::addText(StringTable::Kind kind, std::string_view text) {
+  StringTable::Number object = _shares ? _strings->number(kind, text) : _strings->add(kind, text);
+  _stringNumbers.push_back(object.number);
+  _text += text.size();
+  return object.isNew;
+}
+
 bool BinaryWriter::countString(std::string_view text) {
-  StringTable::Number string = _strings->number(text);
-  _stringNumbers.push_back(string.number);
-  if (!string.isNew) return true;
+  if (!addText(StringTable::Kind::string, text)) return true;
   if (isASCII(text)) {
     _stringsSize += markerSize(text.size()) + text.size();
     return true;
@@ -124,8 +141,9 @@ bool BinaryWriter::countString(std::string_view text) {
 
 bool BinaryWriter::countKey(std::string_view text, std::size_t place) {
   Key& last = _lastKeys[place % _lastKeys.size()];
-  if (last.isKnown && last.text == text) {
+  if (_shares && last.isKnown && last.text == text) {
     _stringNumbers.push_back(last.number);
+    _text += text.size();
     return true;
   }
   if (!countString(text)) return false;
@@ -151,7 +169,10 @@ void BinaryWriter::countObject(std::size_t size) {
 void BinaryWriter::writeStrings() {
   for (std::size_t number = 0; number < _strings->size(); ++number) {
     std::string_view text = (*_strings)[number];
-    if (isASCII(text)) {
+    if (_strings->kindOf(number) == StringTable::Kind::data) {
+      writeMarker(0x40, text.size());
+      writeBytes(text);
+    } else if (isASCII(text)) {
       writeMarker(0x50, text.size());
       writeBytes(text);
     } else {
@@ -161,7 +182,7 @@ void BinaryWriter::writeStrings() {
   }
 }
 
-/// The strings have been written; their sizes stand with them.
+/// The strings and data have been written; their sizes stand with them.
 void BinaryWriter::writeStringOffsets() {
   char* end = _at;
   for (_at = _begin + header.size(); _at != end;) {
@@ -179,7 +200,7 @@ void BinaryWriter::writeStringOffsets() {
 
 /// Answers the object's number.
 std::uint32_t BinaryWriter::writeValue(const Value& value) {
-  if (value.kind() == Value::Kind::string) return *_nextString++;
+  if (value.kind() == Value::Kind::string || value.kind() == Value::Kind::data) return *_nextString++;
   if (value.kind() == Value::Kind::array) return writeArray(*value.array());
   if (value.kind() == Value::Kind::dictionary) return writeDictionary(*value.dictionary());
   std::uint32_t number = beginObject();
@@ -187,9 +208,6 @@ std::uint32_t BinaryWriter::writeValue(const Value& value) {
     *_at++ = *boolean ? 0x09 : 0x08;
   } else if (value.kind() == Value::Kind::integer) {
     writeInteger(value);
-  } else if (auto data = value.data()) {
-    writeMarker(0x40, data->size());
-    writeBytes(*data);
   } else {
     *_at++ = value.real() ? 0x23 : 0x33;
     _at = writeBigEndian(_at, std::bit_cast<std::uint64_t>(value.real() ? *value.real() : value.date()->seconds), 8);

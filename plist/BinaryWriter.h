@@ -16,12 +16,15 @@ namespace plist {
 
 /// Writes one binary document.
 ///
-/// A first pass counts: it numbers the strings, finds the sizes of everything, and whatever cannot be written. The
-/// second one writes into a block of the right size, first the strings, then the other objects, each container
-/// after what it holds. So the outermost value is the last object. Lists may be long, so each table goes as soon as
-/// nothing needs it, and before the output it would lie beside.
+/// A first pass counts: it numbers the strings and data, finds the sizes of everything, and whatever cannot be written.
+/// The second one writes into a block of the right size, first the strings and data, then the other objects, each
+/// container after what it holds. So the outermost value is the last object. Lists may be long, so each table goes as
+/// soon as nothing needs it, and before the output it would lie beside.
 class BinaryWriter {
  public:
+  /// Whether equal strings and equal data are one object.
+  explicit BinaryWriter(bool shares) : _shares(shares) {}
+
   /// Nothing, with the error set, when the value has no binary form.
   std::optional<platform::Bytes> write(const platform::Value& value, platform::ErrorRef& error);
 
@@ -33,7 +36,9 @@ class BinaryWriter {
     bool isKnown = false;
   };
 
+  bool isReadable(std::size_t size) const;
   bool count(const platform::Value& value, std::size_t depth);
+  bool addText(StringTable::Kind kind, std::string_view text);
   bool countString(std::string_view text);
   bool countKey(std::string_view text, std::size_t place);
   bool countContainer(std::size_t items, std::size_t references, std::size_t depth);
@@ -50,12 +55,15 @@ class BinaryWriter {
   void writeTrailer(std::uint32_t top);
   std::uint32_t beginObject();
 
+  const bool _shares;
   std::optional<StringTable> _strings{std::in_place};
-  // Of every key and string, in the order of both passes. In pieces: there are too many of them to be moved about.
+  // Of every key, string and data, in the order of both passes. In pieces: there are too many of them to be moved
+  // about.
   std::deque<std::uint32_t> _stringNumbers;
   std::array<Key, 8> _lastKeys;
   std::size_t _objects = 0;
   std::size_t _references = 0;
+  std::size_t _text = 0;  // bytes of strings and data, at all their places
   std::size_t _stringsSize = 0;
   std::size_t _size = 0;  // of the other objects, without references
 

@@ -65,7 +65,7 @@ Value read(Bytes input, ErrorRef* error) {
 }
 
 std::optional<Bytes> writeBinary(const Value& value, ErrorRef* error) {
-  return guarded(error, [&](ErrorRef& failed) { return BinaryWriter().write(value, failed); });
+  return guarded(error, [&](ErrorRef& failed) { return BinaryWriter(true).write(value, failed); });
 }
 
 std::optional<Bytes> writeXML(const Value& value, ErrorRef* error) {

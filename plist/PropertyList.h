@@ -46,16 +46,17 @@ enum class ErrorCode : std::int64_t {
 
 inline constexpr std::size_t maximumDepth = 512;
 inline constexpr std::size_t maximumInput = (std::size_t{1} << 32) - 1;
-constexpr std::size_t maximumNodes(std::size_t inputSize) { return (std::size_t{1} << 18) + 4 * inputSize; }
-constexpr std::size_t maximumText(std::size_t inputSize) { return (std::size_t{1} << 26) + 256 * inputSize; }
+constexpr std::size_t maximumNodes(std::size_t inputSize) { return (std::size_t{1} << 17) + inputSize / 4; }
+constexpr std::size_t maximumText(std::size_t inputSize) { return (std::size_t{1} << 23) + 4 * inputSize; }
 
 /// The document's value, mutable at every level. Absent on failure. The value keeps the input, and its strings and
 /// data lie there, so handing over the bytes with std::move saves a copy.
 platform::Value read(platform::Bytes input, platform::ErrorRef* error = nullptr);
 
-/// Equal strings are written once. Sizes of offsets and references are the smallest of 1, 2, 4 and 8 bytes.
+/// Equal strings and equal data are written once, unless the document would then be refused for what its places hold
+/// together: whatever is written can be read. Sizes of offsets and references are the smallest of 1, 2, 4 and 8 bytes.
 std::optional<platform::Bytes> writeBinary(const platform::Value& value, platform::ErrorRef* error = nullptr);
-/// UTF-8, indented with tabs, without a document-type line.
+/// UTF-8, indented with tabs up to a depth of 16, without a document-type line.
 std::optional<platform::Bytes> writeXML(const platform::Value& value, platform::ErrorRef* error = nullptr);
 
 }  // namespace plist

@@ -9,20 +9,24 @@
 
 namespace plist {
 
-/// Numbers different strings from 0 on, in the order in which they come. The strings' bytes must stay.
+/// Numbers different strings and data from 0 on, in the order in which they come. Their bytes must stay.
 class StringTable {
  public:
   StringTable();
 
+  enum class Kind : std::uint8_t { string, data };
   struct Number {
     std::uint32_t number;
     bool isNew;
   };
-  Number number(std::string_view text);
+  Number number(Kind kind, std::string_view text);
+  /// One that is taken for different from all others. No string is looked for after that.
+  Number add(Kind kind, std::string_view text);
   /// Gives back the memory for finding strings. No string can be numbered after that.
   void complete() { _slots = {}; }
 
   std::size_t size() const noexcept { return _strings.size(); }
+  Kind kindOf(std::size_t number) const noexcept { return static_cast<Kind>(_strings[number].hash & 1); }
   std::string_view operator[](std::size_t number) const noexcept {
     return {_strings[number].bytes, _strings[number].size};
   }
@@ -31,7 +35,7 @@ class StringTable {
   struct String {
     const char* bytes;
     std::uint32_t size;
-    std::uint32_t hash;
+    std::uint32_t hash;  // with the kind for its last bit
   };
 
   void grow();

@@ -1,5 +1,6 @@
 #include "plist/XMLWriter.h"
 
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <cmath>
@@ -81,12 +82,15 @@ std::optional<std::size_t> escapedSize(std::string_view text) {
   return size;
 }
 
+/// Where many small values lie very deep, the tabs would be nearly all there is.
+std::size_t tabsAt(std::size_t depth) { return std::min<std::size_t>(depth, 16); }
+
 }  // namespace
 
 class XMLWriter::Counter {
  public:
   void add(std::string_view text) { size += text.size(); }
-  void addTabs(std::size_t count) { size += count; }
+  void addTabs(std::size_t count) { size += tabsAt(count); }
   bool addEscaped(std::string_view text) {
     std::optional<std::size_t> escaped = escapedSize(text);
     size += escaped.value_or(0);
@@ -105,8 +109,8 @@ class XMLWriter::Text {
     _at += text.size();
   }
   void addTabs(std::size_t count) {
-    std::memset(_at, '\t', count);
-    _at += count;
+    std::memset(_at, '\t', tabsAt(count));
+    _at += tabsAt(count);
   }
   bool addEscaped(std::string_view text) {
     std::size_t plain = plainPrefix(text);

@@ -128,10 +128,10 @@ FOR_NOBODY = [
 # --- Packages: what stands in them beside a manifest, as (name, content, mode), and what is done to the archive then.
 
 
-def zipped(app, *entries, then=lambda archive: archive, compression=zipfile.ZIP_STORED):
+def zipped(app, *entries, then=lambda archive: archive, compression=zipfile.ZIP_STORED, manifest=None):
     buffer = io.BytesIO()
     with zipfile.ZipFile(buffer, "w", compression) as archive:
-        manifest = plistlib.dumps({"KBBundleIdentifier": app, "KBBundleVersion": "9"}, fmt=plistlib.FMT_BINARY)
+        manifest = manifest or plistlib.dumps({"KBBundleIdentifier": app, "KBBundleVersion": "9"}, fmt=plistlib.FMT_BINARY)
         for name, content, mode in [("A.app/Info.plist", manifest, 0o100644), *entries]:
             info = zipfile.ZipInfo(name)
             info.external_attr, info.compress_type = mode << 16, compression

@@ -67,7 +67,7 @@ class Unpacking {
     std::size_t count = 0;
     struct archive_entry* entry = nullptr;
     for (;;) {
-      int status = archive_read_next_header(_source.archive(), &entry);
+      int status = _source.next(&entry);
       if (status == ARCHIVE_EOF) break;
       if (status != ARCHIVE_OK)
         return device::fail(&_reason, packageError("damaged after entry " + shown(_last) + ": " + _source.reason()));

@@ -29,7 +29,7 @@ bool isManifest(std::string_view name) {
 std::optional<platform::Bytes> findManifest(PackageSource& source, std::string& reason) {
   struct archive_entry* entry = nullptr;
   for (std::size_t count = 0; count < maximumEntries; ++count) {
-    int status = archive_read_next_header(source.archive(), &entry);
+    int status = source.next(&entry);
     if (status == ARCHIVE_EOF) break;
     if (status != ARCHIVE_OK) {
       reason = "damaged: " + source.reason();

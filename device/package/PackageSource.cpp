@@ -39,6 +39,12 @@ std::string PackageSource::reason() const {
   return text ? text : "no reason given";
 }
 
+int PackageSource::next(struct archive_entry** entry) {
+  int status = archive_read_next_header(_archive, entry);
+  if (status == ARCHIVE_OK) _tableLeft.reset();
+  return status;
+}
+
 la_ssize_t PackageSource::read(struct archive* archive, void* data, const void** buffer) {
   auto& self = *static_cast<PackageSource*>(data);
   std::optional<platform::Bytes> chunk;
@@ -52,6 +58,11 @@ la_ssize_t PackageSource::read(struct archive* archive, void* data, const void**
     archive_set_error(archive, EIO, "the package cannot be read");
     return ARCHIVE_FATAL;
   }
+  if (self._tableLeft && chunk->size() > *self._tableLeft) {
+    archive_set_error(archive, EFBIG, "its table of entries is too long");
+    return ARCHIVE_FATAL;
+  }
+  if (self._tableLeft) *self._tableLeft -= chunk->size();
   self._chunk = std::move(*chunk);
   self._position += self._chunk.size();
   *buffer = self._chunk.data();

@@ -3,6 +3,7 @@
 #include <archive.h>
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -15,6 +16,9 @@ namespace device {
 class PackageSource {
  public:
   explicit PackageSource(FileTree& files) : _files(files) {}
+  /// How much libarchive may read before it tells of the first entry: it takes the whole table at the archive's end
+  /// into memory, whatever its length.
+  static constexpr std::uint64_t longestTable = std::uint64_t{24} << 20;
   ~PackageSource();
   PackageSource(const PackageSource&) = delete;
   PackageSource& operator=(const PackageSource&) = delete;
@@ -24,6 +28,8 @@ class PackageSource {
   struct archive* archive() {
     return _archive;
   }
+  /// The next entry, as libarchive's function answers.
+  int next(struct archive_entry** entry);
   /// What libarchive or the file system said last.
   std::string reason() const;
 
@@ -38,6 +44,7 @@ class PackageSource {
   platform::Bytes _chunk;  // what libarchive looks at until its next read
   std::uint64_t _size = 0;
   std::uint64_t _position = 0;
+  std::optional<std::uint64_t> _tableLeft = longestTable;  // until the first entry was met
   platform::ErrorRef _error;
 };
 

@@ -7,6 +7,19 @@ namespace device {
 using platform::LogHandle;
 using platform::LogLevel;
 
+namespace {
+
+constexpr std::size_t longestMessage = std::size_t{64} << 10;
+
+/// The front, of whole characters, and how long it was.
+std::string shortened(std::string_view message) {
+  std::size_t end = longestMessage;
+  while (end > 0 && (static_cast<unsigned char>(message[end]) & 0xc0) == 0x80) --end;
+  return std::string(message.substr(0, end)) + "… (cut, of " + std::to_string(message.size()) + " bytes)";
+}
+
+}  // namespace
+
 class SystemLogService::Handle final : public LogHandle {
  public:
   Handle(SystemLogService& log, std::string category) : _log(log), _category(std::move(category)) {}
@@ -32,6 +45,8 @@ std::shared_ptr<LogHandle> SystemLogService::makeHandle(std::string category) {
 }
 
 void SystemLogService::write(LogLevel level, const std::string& category, std::string_view message) {
+  std::string cut;
+  if (message.size() > longestMessage) message = cut = shortened(message);
   Crossing crossing{"log", nameOfLevel(level)};
   crossing.isMessage = true;
   _boundary.call(crossing, nullptr, {{"category", category}, {"text", message}}, [&] {

@@ -28,12 +28,21 @@ bool isAboutName(const platform::ErrorRef& error) {
   return error && (error->code() == EINVAL || error->code() == ENAMETOOLONG || error->code() == EILSEQ);
 }
 
+CommandError tooMany(const std::string& path) {
+  return CommandError(path + ": more than " + std::to_string(FileConduit::maximumEntries) +
+                      " files and folders are not taken");
+}
+CommandError tooMuch(const std::string& path) {
+  return CommandError(path + ": more than " + std::to_string(FileConduit::maximumBytes) + " bytes are not taken");
+}
+
 /// The names in a directory, sorted.
 std::vector<std::string> namesIn(DIR* directory, const std::string& path) {
   std::vector<std::string> names;
   errno = 0;
   while (const dirent* entry = ::readdir(directory)) {
     if (isFileName(entry->d_name)) names.emplace_back(entry->d_name);
+    if (names.size() > FileConduit::maximumEntries) throw tooMany(path);
     errno = 0;
   }
   if (errno != 0) throw CommandError(path + ": " + std::strerror(errno));
@@ -69,15 +78,24 @@ bool FileConduit::pushStaging(const std::string& hostFolder) {
       throw CommandError("the staging directory: " + textOf(error));
   }
   if (!hasList) return false;
-  _pushedFiles = 0;
-  _pushedBytes = 0;
   try {
-    pushDirectory({::dirfd(directory.get()), hostFolder, std::string(platform::stagingDirectory), 0});
+    pushTree({::dirfd(directory.get()), hostFolder, std::string(platform::stagingDirectory), 0});
   } catch (...) {
     _files.removeItem(platform::stagingDirectory);
     throw;
   }
   return true;
+}
+
+void FileConduit::pushTree(const Level& level) {
+  _entries = 0;
+  _refused = 0;
+  _pushedBytes = 0;
+  pushDirectory(level);
+  if (_refused > maximumRefusalsTold) {
+    _console.message(level.hostPath + ": " + std::to_string(_refused - maximumRefusalsTold) +
+                     " more files were not pushed");
+  }
 }
 
 void FileConduit::pushDirectory(const Level& level) {
@@ -106,6 +124,7 @@ void FileConduit::checkStopped() const {
 void FileConduit::pushItem(const Level& level, const std::string& name) {
   checkStopped();
   std::string hostPath = level.hostPath + "/" + name;
+  if (++_entries > maximumEntries) throw tooMany(hostPath);
   std::string devicePath = level.devicePath + "/" + name;
   struct stat facts {};
   if (::fstatat(level.directory, name.c_str(), &facts, AT_SYMLINK_NOFOLLOW) != 0) {
@@ -131,9 +150,11 @@ void FileConduit::pushItem(const Level& level, const std::string& name) {
 
 platform::ErrorRef FileConduit::copy(HostFile& file, const std::string& hostPath, std::string_view devicePath,
                                      bool durable) {
-  if (++_pushedFiles > maximumFiles) {
-    throw CommandError(hostPath + ": more than " + std::to_string(maximumFiles) + " files are not taken");
+  // Before a byte of it is copied: a file may be much longer than what it takes on the host's disk.
+  if (file.size() > _limits.fileBytes) {
+    return platform::makeError("Host", EFBIG, "more than " + std::to_string(_limits.fileBytes) + " bytes");
   }
+  if (file.size() > maximumBytes - _pushedBytes) throw tooMuch(hostPath);
   platform::ErrorRef error;
   auto writer = _files.createNew(devicePath, false, &error);
   if (!writer && isAboutName(error)) return error;
@@ -144,9 +165,7 @@ platform::ErrorRef FileConduit::copy(HostFile& file, const std::string& hostPath
     if (!bytes) throw CommandError(hostPath + ": " + textOf(error));
     if (bytes->empty()) break;
     _pushedBytes += bytes->size();
-    if (_pushedBytes > maximumBytes) {
-      throw CommandError(hostPath + ": more than " + std::to_string(maximumBytes) + " bytes are not taken");
-    }
+    if (_pushedBytes > maximumBytes) throw tooMuch(hostPath);
     if (!writer->write(*bytes, &error)) throw CommandError(hostPath + ": " + textOf(error));
   }
   if (!writer->close(durable, &error)) throw CommandError(hostPath + ": " + textOf(error));
@@ -162,14 +181,13 @@ void FileConduit::pushFile(const std::string& hostFile, std::string_view deviceP
   if (_files.fileExists(devicePath) && !_files.removeItem(devicePath, &error)) {
     throw CommandError(std::string(devicePath) + ": " + textOf(error));
   }
-  _pushedFiles = 0;
   _pushedBytes = 0;
   if (auto refusal = copy(*file, hostFile, devicePath, true)) throw CommandError(hostFile + ": " + textOf(refusal));
   if (!_files.syncDirectory(parent, &error)) throw CommandError(parent + ": " + textOf(error));
 }
 
 void FileConduit::refuse(const std::string& hostPath, const std::string& why) {
-  _console.message(hostPath + ": not pushed: " + why);
+  if (++_refused <= maximumRefusalsTold) _console.message(hostPath + ": not pushed: " + why);
 }
 
 }  // namespace tsd

@@ -15,16 +15,22 @@
 namespace tsd {
 
 /// Brings the host's files onto the device: regular files only, and no more than a limit on their number and bytes.
-/// Whatever it refuses it names on the console.
+/// Names the first files that it refuses on the console, and counts the others.
 class FileConduit {
  public:
-  static constexpr std::size_t maximumFiles = 200'000;
+  static constexpr std::size_t maximumEntries = 200'000;  // files, folders, and what is refused
+  static constexpr std::size_t maximumRefusalsTold = 20;
   static constexpr std::size_t maximumDepth = 16;
   static constexpr std::uint64_t maximumBytes = std::uint64_t{16} << 30;
 
+  struct Limits {
+    std::uint64_t fileBytes = maximumBytes;  // a larger file is refused
+  };
   /// `isStopped`, if there is one, tells whether to end: asked before each piece of a file.
   FileConduit(device::FileTree& files, Console& console, std::function<bool()> isStopped = nullptr)
-      : _files(files), _console(console), _isStopped(std::move(isStopped)) {}
+      : FileConduit(files, console, Limits(), std::move(isStopped)) {}
+  FileConduit(device::FileTree& files, Console& console, Limits limits, std::function<bool()> isStopped = nullptr)
+      : _files(files), _console(console), _limits(limits), _isStopped(std::move(isStopped)) {}
 
   /// Replaces the staging directory by the host's folder, without its packages and its restore lists. A folder without
   /// a todo list leaves no staging directory and answers false. Throws a `CommandError` when the folder or the todo
@@ -44,6 +50,7 @@ class FileConduit {
     std::size_t depth;
   };
 
+  void pushTree(const Level& level);
   void pushDirectory(const Level& level);
   void pushItem(const Level& level, const std::string& name);
   void checkStopped() const;
@@ -54,8 +61,10 @@ class FileConduit {
 
   device::FileTree& _files;
   Console& _console;
+  const Limits _limits;
   const std::function<bool()> _isStopped;
-  std::size_t _pushedFiles = 0;
+  std::size_t _entries = 0;
+  std::size_t _refused = 0;
   std::uint64_t _pushedBytes = 0;
 };
 
