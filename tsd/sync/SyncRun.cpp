@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cstdlib>
 #include <optional>
+#include <utility>
 
 #include "platform/DevicePaths.h"
 #include "platform/TodoOperation.h"
@@ -21,7 +22,7 @@ using platform::Value;
 namespace {
 
 constexpr auto displayInterval = std::chrono::milliseconds(100);
-/// How long to wait for the outcomes: a base, plus the time that a slow device needs for the bytes.
+/// How long to wait for the next sign of an outcome: a base, plus the time that a slow device needs for the bytes.
 constexpr auto outcomeBase = std::chrono::seconds(60);
 constexpr std::uint64_t outcomeBytesPerSecond = std::uint64_t{4} << 20;
 
@@ -145,7 +146,9 @@ void SyncRun::awaitOutcomes() {
   std::uint64_t bytes = 0;
   for (const auto& asset : _assets) bytes += _parts.queue.result(asset->identifier()).bytes;
   auto& events = _parts.session.device().events();
-  auto deadline = events.clock().now() + outcomeBase + std::chrono::seconds(bytes / outcomeBytesPerSecond);
+  const auto patience = outcomeBase + std::chrono::seconds(bytes / outcomeBytesPerSecond);
+  auto deadline = events.clock().now() + patience;
+  std::uint64_t changes = _parts.watch.changes();
   if (!_assets.empty()) _parts.progress.headline("Waiting for the outcomes");
   // On the heap, because a device that never goes quiet must not keep this thread waiting: see below.
   auto quiet = std::make_unique<QuietWatch>(events, _parts.stop);
@@ -153,6 +156,9 @@ void SyncRun::awaitOutcomes() {
   while (!isQuiet && !_parts.stop.requested() && events.clock().now() < deadline) {
     isQuiet = quiet->waitUntil(std::min(deadline, events.clock().now() + displayInterval));
     showOutcomes(isQuiet);
+    // Whatever the device tells of an app is a sign of life.
+    const std::uint64_t now = _parts.watch.changes();
+    if (std::exchange(changes, now) != now) deadline = events.clock().now() + patience;
   }
   if (isQuiet || _parts.stop.requested()) return;
   _deadlinePassed = true;
