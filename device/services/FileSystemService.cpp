@@ -3,6 +3,7 @@
 #include <cerrno>
 
 #include "device/files/DevicePath.h"
+#include "device/services/LastRead.h"
 
 namespace device {
 
@@ -81,8 +82,10 @@ bool FileSystemService::createFile(std::string_view path, BytesView contents, co
 }
 
 std::optional<Bytes> FileSystemService::readFile(std::string_view path, ErrorRef* error) {
-  return run("readFile", path, error, {{"path", path}},
-             [&](ErrorRef* reason) { return _files.readFile(path, reason); });
+  auto bytes =
+      run("readFile", path, error, {{"path", path}}, [&](ErrorRef* reason) { return _files.readFile(path, reason); });
+  if (bytes) LastRead::ofThisThread() = {std::string(path), bytes->size()};
+  return bytes;
 }
 
 bool FileSystemService::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error,

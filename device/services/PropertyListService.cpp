@@ -2,6 +2,7 @@
 
 #include <utility>
 
+#include "device/services/LastRead.h"
 #include "plist/PropertyList.h"
 
 namespace device {
@@ -12,9 +13,19 @@ using platform::PropertyListFormat;
 using platform::Value;
 
 Value PropertyListService::propertyListWithData(Bytes bytes, ErrorRef* error) {
-  return _boundary.call({"PropertyListSerialization", "propertyListWithData"}, error,
-                        {{"bytes", CallArgument::BytesCount{bytes.size()}}},
-                        [&] { return plist::read(std::move(bytes), error); });
+  const std::size_t size = bytes.size();
+  // The reason is wanted here also when the caller does not want it.
+  ErrorRef reason;
+  Value value = _boundary.call({"PropertyListSerialization", "propertyListWithData"}, &reason,
+                               {{"bytes", CallArgument::BytesCount{size}}},
+                               [&] { return plist::read(std::move(bytes), &reason); });
+  if (value.isAbsent() && _unreadable && !Boundary::isDeclined(reason)) {
+    const LastRead& file = LastRead::ofThisThread();
+    _unreadable(file.size == size ? file.path : file.path + ", in it",
+                reason ? std::string_view(reason->description()) : "no reason given");
+  }
+  platform::setError(error, std::move(reason));
+  return value;
 }
 
 std::optional<Bytes> PropertyListService::dataWithPropertyList(const Value& value, PropertyListFormat format,

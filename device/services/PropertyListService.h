@@ -1,5 +1,9 @@
 #pragma once
 
+#include <functional>
+#include <string_view>
+#include <utility>
+
 #include "device/boundary/Boundary.h"
 #include "platform/PropertyListSerialization.h"
 
@@ -8,7 +12,11 @@ namespace device {
 /// The property-list codec behind the boundary.
 class PropertyListService final : public platform::PropertyListSerialization {
  public:
-  explicit PropertyListService(Boundary& boundary) : _boundary(boundary) {}
+  /// Told of every document that cannot be read, as the plug-in passes over some in silence: the file that it came from
+  /// and the reason. From any thread. May be null.
+  using Unreadable = std::function<void(std::string_view path, std::string_view reason)>;
+  PropertyListService(Boundary& boundary, Unreadable unreadable)
+      : _boundary(boundary), _unreadable(std::move(unreadable)) {}
 
   platform::Value propertyListWithData(platform::Bytes bytes, platform::ErrorRef* error) override;
   std::optional<platform::Bytes> dataWithPropertyList(const platform::Value& value, platform::PropertyListFormat format,
@@ -16,6 +24,7 @@ class PropertyListService final : public platform::PropertyListSerialization {
 
  private:
   Boundary& _boundary;
+  const Unreadable _unreadable;
 };
 
 }  // namespace device
