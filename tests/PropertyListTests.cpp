@@ -276,7 +276,7 @@ TEST(PropertyList, LimitsWhatSharingExpandsTo) {
   std::vector<std::string> doubling;
   for (char level = 1; level < 60; ++level) doubling.push_back("\xa2"s + level + level);
   doubling.push_back("\xa0");
-  std::string references(200000, '\1');
+  std::string references(40000, '\1');
   std::string many = "\xaf\x12" + bigEndian(references.size(), 4) + references;
   std::string longText = "\x11" + bigEndian(40000, 2) + std::string(40000, 'x');
   std::string longUnits = "\x11" + bigEndian(20000, 2);
@@ -318,6 +318,27 @@ TEST(PropertyList, ExpandsToItsBudgetAndNotBeyond) {
   std::size_t text = maximumText(ofText(0, 0).size()), places = text / 40000;
   EXPECT_EQ(read(ofText(places, text % 40000)).array()->size(), places + 1);
   expectRejected({{ofText(places, text % 40000 + 1), ErrorCode::tooLarge, "data"}});
+}
+
+TEST(PropertyList, WritesEqualTextOnceAsLongAsItCanBeReadAgain) {
+  auto equals = [](const Value& element, std::size_t count) {
+    Value list = Value::makeArray();
+    for (std::size_t i = 0; i < count; ++i) list.array()->append(element);
+    return list;
+  };
+  const std::string text(1000, 'x');
+  Value mixed = Value::makeArray();
+  for (const Value& each : {Value(text), Value::makeData(text)}) {
+    EXPECT_LT(writeBinary(equals(each, 10))->size(), 1200U);
+    mixed.array()->append(equals(each, 10));
+    // More of it, and more values, than a document that short may hold.
+    for (const Value& list : {equals(each, 20000), equals(each.string() ? Value("x") : Value::makeData("x"), 300000)}) {
+      auto bytes = writeBinary(list);
+      ASSERT_TRUE(bytes);
+      EXPECT_EQ(read(std::move(*bytes)), list);
+    }
+  }
+  EXPECT_EQ(read(*writeBinary(mixed)), mixed);
 }
 
 TEST(PropertyList, RefusesToWriteWhatAFormCannotCarry) {

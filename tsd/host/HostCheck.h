@@ -65,7 +65,7 @@ class HostCheck {
   std::set<std::string> _installs;  // those of them that are to be installed
   std::set<std::string> _restored;  // by the restore list
   std::size_t _removals = 0;
-  std::size_t _files = 0;
+  std::size_t _entries = 0;
   std::uint64_t _bytes = 0;
   bool _isTodoListKnown = false;  // it is there, and can be read
   bool _isFull = false;           // the limits have been passed, and told

@@ -82,6 +82,7 @@ void HostCheck::checkPushed(const std::string& folder, std::size_t depth) {
   for (const auto& item : itemsIn(folder, problem)) {
     std::string name = item.filename().string();
     if (depth == 0 && (name == packagesName || name == restoreName)) continue;
+    ++_entries;
     struct stat facts {};
     if (::lstat(item.c_str(), &facts) != 0) {
       add({Weight::error, item.string(), 0, "", std::strerror(errno), "make it readable"});
@@ -92,14 +93,16 @@ void HostCheck::checkPushed(const std::string& folder, std::size_t depth) {
            "put a file there"});
     } else {
       _bytes += static_cast<std::uint64_t>(facts.st_size);
-      _isFull = ++_files > FileConduit::maximumFiles || _bytes > FileConduit::maximumBytes;
-      if (_isFull)
-        add({Weight::error, _host, 0, "",
-             "more than " + std::to_string(FileConduit::maximumFiles) + " files or " +
-                 std::to_string(FileConduit::maximumBytes) + " bytes are not taken",
-             "leave something out"});
     }
     if (_isFull) return;
+    _isFull = _entries > FileConduit::maximumEntries || _bytes > FileConduit::maximumBytes;
+    if (_isFull) {
+      add({Weight::error, _host, 0, "",
+           "more than " + std::to_string(FileConduit::maximumEntries) + " files and folders or " +
+               std::to_string(FileConduit::maximumBytes) + " bytes are not taken",
+           "leave something out"});
+      return;
+    }
   }
   if (problem) add({Weight::error, folder, 0, "", problem.message(), "make it readable"});
 }
