@@ -78,7 +78,8 @@ void crossBoundary(benchmark::State& state) {
   std::string_view path = "/var/mobile";
   for (auto _ : state) {
     benchmark::DoNotOptimize(path);
-    bool answer = boundary.call({"FileSystem", "fileExists"}, nullptr, {{"path", path}}, [&] { return !path.empty(); });
+    bool answer =
+        boundary.call({{"FileSystem", "fileExists"}}, nullptr, {{"path", path}}, [&] { return !path.empty(); });
     benchmark::DoNotOptimize(answer);
   }
 }

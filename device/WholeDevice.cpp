@@ -67,12 +67,13 @@ class WholeDevice final : public LocalDevice {
         _systemLog(_boundary, options.log),
         _support(_boundary, _systemLog),
         _deviceService(
-            _boundary, [this](std::string_view key) { return setting(key); }, options.deviceService),
+            _boundary, [this] { return settings().prioritizesTransfers; },
+            [this] { return settings().cancelsTransfers; }, options.deviceService),
         _installCoordination(_engine, _coordinatorReports, _boundary, *_events),
         _workspace(_records, _engine, _registryReports, _boundary),
         _installer(_records, _boundary),
-        _backup(_boundary, [this](std::string_view key) { return backupSetting(key); }),
-        _restrictions(_boundary, [this](std::string_view key) { return setting(key); }),
+        _backup(_boundary, [this] { return settings(); }),
+        _restrictions(_boundary, [this] { return settings(); }),
         _homeScreen(_records, _boundary),
         _iconRenderer(_records, *_files, _boundary),
         _imageEncoder(_boundary),
@@ -126,16 +127,14 @@ class WholeDevice final : public LocalDevice {
   }
 
   bool set(std::string_view key, std::string_view value, ErrorRef* error) override {
-    if (!checkSetting(key, value, error)) return false;
+    Settings checked;
+    if (!changeSetting(checked, key, value, error)) return false;
     ChangeSet changes;
     changes.setSetting(key, value);
     Lock lock(_records);
     return _records.commit(std::move(changes), error);
   }
-  std::string setting(std::string_view key) override {
-    Lock lock(_records);
-    return settingOf(_records.state(), key);
-  }
+  std::string setting(std::string_view key) override { return textOfSetting(settings(), key); }
 
   bool uninstallByPerson(std::string_view id, ErrorRef* error) override { return _engine.uninstall(id, error); }
   bool cancelByPerson(std::string_view id, ErrorRef* error) override { return _engine.cancelByPerson(id, error); }
@@ -154,14 +153,9 @@ class WholeDevice final : public LocalDevice {
   void putOffInstalls() override { _engine.putOffInstalls(); }
 
  private:
-  /// What the backup service asks, in its words; empty for what nobody has set.
-  std::string backupSetting(std::string_view key) {
+  Settings settings() {
     Lock lock(_records);
-    auto set = _records.state().settings.find(key);
-    if (set == _records.state().settings.end()) return {};
-    bool yes = set->second == "yes";
-    if (key == "backup-error") return yes ? "1:the backup service is set to fail" : "";
-    return yes ? "wanted" : "declined";
+    return _records.state().settings;
   }
 
   bool flush(ErrorRef* error) override {
@@ -226,9 +220,24 @@ class WholeDevice final : public LocalDevice {
   NotificationService _notifications;
 
   const platform::Platform _platform{
-      _process,       _events->clock(),     _fileSystem,   _propertyLists,  _systemLog,    _support,
-      _deviceService, _installCoordination, _workspace,    _installer,      _backup,       _restrictions,
-      _homeScreen,    _iconRenderer,        _imageEncoder, _transactionLog, _notifications};
+      .process = _process,
+      .clock = _events->clock(),
+      .fileSystem = _fileSystem,
+      .propertyLists = _propertyLists,
+      .systemLog = _systemLog,
+      .support = _support,
+      .deviceService = _deviceService,
+      .installCoordination = _installCoordination,
+      .workspace = _workspace,
+      .installer = _installer,
+      .backup = _backup,
+      .restrictions = _restrictions,
+      .homeScreen = _homeScreen,
+      .iconRenderer = _iconRenderer,
+      .imageEncoder = _imageEncoder,
+      .transactionLog = _transactionLog,
+      .notifications = _notifications,
+  };
 };
 
 }  // namespace

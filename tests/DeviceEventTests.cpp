@@ -19,7 +19,7 @@ using namespace std::chrono_literals;
 
 /// Posts from inside a call across the boundary.
 void postInCall(Boundary& boundary, EventQueue& queue, Lane lane, EventQueue::Event event) {
-  boundary.call({"RVPromise", "setComplete"}, nullptr, {}, [&] { queue.post(lane, std::move(event)); });
+  boundary.call({{"RVPromise", "setComplete"}}, nullptr, {}, [&] { queue.post(lane, std::move(event)); });
 }
 
 TEST(ManualEventQueue, letsTimePassOnlyWhenNothingElseHappens) {
@@ -64,19 +64,19 @@ TEST(HeldEvents, areLetGoByTheNextCallButNotByAMessage) {
   auto post = [&] { postInCall(boundary, *queue, Lane::coordination, [] {}); };
   post();
   EXPECT_EQ(queue->pending(), 0u);
-  Crossing message{"log", "default"};
+  Crossing message{{"log", "default"}};
   message.isMessage = true;
   boundary.call(message, nullptr, {}, [] {});
   EXPECT_EQ(queue->pending(), 0u);
   std::size_t seenByBody = 0;
-  boundary.call({"FileSystem", "fileExists"}, nullptr, {}, [&] {
+  boundary.call({{"FileSystem", "fileExists"}}, nullptr, {}, [&] {
     seenByBody = queue->pending();
     post();  // a call inside a call lets go nothing of the outer one
     post();
   });
   EXPECT_EQ(seenByBody, 1u);
   EXPECT_EQ(queue->pending(), 1u);
-  boundary.enter({"AppsClient", "x"}, {}, [&] {
+  boundary.enter({{"AppsClient", "installedAssets"}}, {}, [&] {
     EXPECT_EQ(queue->pending(), 1u);
     post();
     EXPECT_EQ(queue->pending(), 3u);

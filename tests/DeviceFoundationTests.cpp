@@ -83,7 +83,7 @@ TEST(InjectionRule, isParsedOrRefusedWithTheReason) {
       continue;
     }
     EXPECT_EQ(error, nullptr);
-    EXPECT_EQ(parsed->point, row.rule.point);
+    EXPECT_EQ(parsed->place, row.rule.place);
     EXPECT_EQ(parsed->app, row.rule.app);
     EXPECT_EQ(parsed->match, row.rule.match);
     EXPECT_EQ(parsed->action, row.rule.action);
@@ -131,10 +131,10 @@ TEST(Boundary, carriesOutWhatARuleOrders) {
     if (std::string(row.action) == "none@9") boundary.setRules({rule("setComplete@9=none")});
     boundary.setBystander([&](Action, const std::string& target) {
       bystander += target;
-      boundary.call({"RVPromise", "setComplete"}, nullptr, {}, [] {});  // no rule is about the bystander
+      boundary.call({{"RVPromise", "setComplete"}}, nullptr, {}, [] {});  // no rule is about the bystander
     });
     Called called;
-    Crossing crossing{"RVPromisedTransferToPath", "setComplete"};
+    Crossing crossing{{"RVPromisedTransferToPath", "setComplete"}};
     called.call<bool>(boundary, crossing, true, false, [](bool b) { return std::string(b ? "true" : "false"); });
     called.call<int>(boundary, crossing, 7, -1, [](int n) { return std::to_string(n); });
     called.call<std::optional<std::string>>(boundary, crossing, "text", std::nullopt,
@@ -163,10 +163,10 @@ TEST(Boundary, matchesByClassAppAndCount) {
     SCOPED_TRACE(row.rule);
     Boundary boundary;
     boundary.setRules({rule(row.rule)});
-    const Crossing crossings[] = {{"RVAppInstallCoordinator", "cancelForReason", "a"},
-                                  {"RVPlaceholder", "cancelForReason", "a"},
-                                  {"RVPromisedTransferToPath", "cancelForReason", "b"},
-                                  {"RVPromisedOutOfBandTransfer", "cancelForReason", "a"}};
+    const Crossing crossings[] = {{{"RVAppInstallCoordinator", "cancelForReason"}, "a"},
+                                  {{"RVPlaceholder", "cancelForReason"}, "a"},
+                                  {{"RVPromisedTransferToPath", "cancelForReason"}, "b"},
+                                  {{"RVPromisedOutOfBandTransfer", "cancelForReason"}, "a"}};
     std::string failed;
     for (int round = 0; round < 2; ++round) {
       for (int i = 0; i < 4; ++i) {
@@ -179,7 +179,7 @@ TEST(Boundary, matchesByClassAppAndCount) {
   Boundary boundary;
   boundary.setRules({rule("error=none"), rule("transfer:a@2=none")});
   bool written = false;
-  boundary.call({"log", "error"}, nullptr, {}, [&] { written = true; });
+  boundary.call({{"log", "error"}}, nullptr, {}, [&] { written = true; });
   EXPECT_TRUE(written) << "an operation of the same name is something else than an error message";
   EXPECT_FALSE(boundary.atTransfer("a").has_value());
   EXPECT_FALSE(boundary.atTransfer("b").has_value());
@@ -191,7 +191,7 @@ TEST(BoundaryDeathTest, killsBeforeOrAfterTheEffect) {
     Boundary boundary;
     boundary.addJournal({[](const CallRecord& record) { std::fprintf(stderr, "%s ", record.operation.c_str()); }});
     boundary.setRules({rule(text)});
-    boundary.call({"FileSystem", "removeItem"}, nullptr, {}, [] { std::fputs("effect ", stderr); });
+    boundary.call({{"FileSystem", "removeItem"}}, nullptr, {}, [] { std::fputs("effect ", stderr); });
     std::fputs("alive", stderr);
   };
   EXPECT_EXIT(run("removeItem=kill"), testing::KilledBySignal(SIGKILL), "^$");
@@ -209,20 +209,20 @@ TEST(Journal, hasALineForEveryCall) {
   int coordinator = 0;
   ErrorRef error;
 
-  boundary.enter({"AppsClient", "reconcileSync"}, &error, {{"syncType", 1u}, {"newAnchor", "x"}}, [&] {
-    return boundary.call({"TSDeviceService", "prioritizeAsset", "a"}, nullptr, {{"asset", asset}, {"all", assets}},
+  boundary.enter({{"AppsClient", "reconcileSync"}}, &error, {{"syncType", 1u}, {"newAnchor", "x"}}, [&] {
+    return boundary.call({{"TSDeviceService", "prioritizeAsset"}, "a"}, nullptr, {{"asset", asset}, {"all", assets}},
                          [] { return true; });
   });
-  Crossing message{"log", "default"};
+  Crossing message{{"log", "default"}};
   message.isMessage = true;
   boundary.call(message, nullptr, {{"category", "8"}, {"text", "caf\xc3\xa9 \"\xff\""}}, [] {});
-  boundary.enter({"AppsClient", "applicationInstallsDidCancel"}, {}, [] { FAIL() << "was to be kept away"; });
-  Crossing read{"FileSystem", "readFile"};
+  boundary.enter({{"AppsClient", "applicationInstallsDidCancel"}}, {}, [] { FAIL() << "was to be kept away"; });
+  Crossing read{{"FileSystem", "readFile"}};
   read.answersBytes = true;
   boundary.call(read, &error, {{"path", std::optional<std::string>()}, {"big", UINT64_MAX}, {"half", 0.5}},
                 [] { return std::optional<std::string>("12345"); });
   ThreadName name("transfer-1");
-  boundary.call({"RVAppInstallCoordinator", "error", "a"}, &error,
+  boundary.call({{"RVAppInstallCoordinator", "error"}, "a"}, &error,
                 {CallArgument::object("on", "coordinator", &coordinator), {"bytes", CallArgument::BytesCount{9}}}, [&] {
                   error = platform::makeError("TSError", 29);
                   return platform::makeError("E", 1, "why", error);
@@ -279,7 +279,7 @@ TEST(Journal, numbersRecordsInTheOrderTheyArrive) {
     threads.emplace_back([&] {
       for (int n = 0; n < 200; ++n) {
         auto asset = std::make_shared<platform::TSAsset>();
-        boundary.enter({"AppsClient", "x"}, {{"asset", asset}}, [] {});
+        boundary.enter({{"AppsClient", "installedAssets"}}, {{"asset", asset}}, [] {});
       }
     });
   }

@@ -7,6 +7,7 @@
 #include <map>
 
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 
@@ -76,11 +77,11 @@ struct Boundary::State {
 
   /// The rules that apply to this call now, in their order.
   template <class Each>
-  void forEachRule(std::string_view service, std::string_view operation, std::string_view app, Each&& each) {
+  void forEachRule(const InjectionPoint& point, std::string_view app, Each&& each) {
     if (bystanderActs) return;
     for (auto& candidate : rules) {
       const InjectionRule& rule = candidate->rule;
-      if (!rule.matches(service, operation, app)) continue;
+      if (!rule.matches(point, app)) continue;
       std::uint64_t match = candidate->matches.fetch_add(1) + 1;
       if (rule.isDue(match)) each(rule);
     }
@@ -155,7 +156,8 @@ void Boundary::die() {
 }
 
 ErrorRef Boundary::injectedError(const Crossing& crossing) {
-  return platform::makeError("Injection", 1, "injected at " + std::string(crossing.service) + "." + crossing.operation);
+  return platform::makeError("Injection", 1,
+                             std::string("injected at ") + crossing.point.service() + "." + crossing.point.operation());
 }
 
 CallRecord Boundary::makeRecord(const Visit& visit) {
@@ -163,8 +165,8 @@ CallRecord Boundary::makeRecord(const Visit& visit) {
   CallRecord record;
   record.began = visit.began;
   record.thread = currentThreadName();
-  record.service = crossing.service;
-  record.operation = crossing.operation;
+  record.service = crossing.point.service();
+  record.operation = crossing.point.operation();
   record.app = crossing.app;
   return record;
 }
@@ -180,7 +182,7 @@ void Boundary::begin(Visit& visit, CallArguments arguments) {
       visit.argumentNames.push_back(argument.name);
     }
   }
-  _state->forEachRule(crossing.service, crossing.operation, crossing.app, [&](const InjectionRule& rule) {
+  _state->forEachRule(crossing.point, crossing.app, [&](const InjectionRule& rule) {
     if (_state->actBefore(rule)) return;
     if (rule.action == Action::error) visit.addsError = true;
     if (rule.action == Action::killAfter) visit.dies = true;
@@ -193,7 +195,7 @@ void Boundary::begin(Visit& visit, CallArguments arguments) {
     }
   });
   if (_state->decliner && visit.direction == Direction::out && !crossing.isMessage) {
-    visit.declined = _state->decliner(crossing.service, crossing.operation);
+    visit.declined = _state->decliner(crossing.point.service(), crossing.point.operation());
     if (visit.declined) visit.order = Order::fail;
   }
   if (!_journaled || visit.direction == Direction::out || visit.order != Order::run) return;
@@ -231,7 +233,7 @@ void Boundary::finish(Visit& visit, Value result, const ErrorRef* error) {
 std::optional<InjectionRule> Boundary::atTransfer(std::string_view app) {
   std::optional<InjectionRule> ordered;
   if (!_watched) return ordered;
-  _state->forEachRule({}, "transfer", app, [&](const InjectionRule& rule) {
+  _state->forEachRule({"", "transfer"}, app, [&](const InjectionRule& rule) {
     if (!_state->actBefore(rule) && !ordered) ordered = rule;
   });
   return ordered;

@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "device/boundary/Injection.h"
+#include "device/boundary/InjectionPoint.h"
 #include "device/boundary/JournalValue.h"
 #include "device/boundary/ObjectKind.h"
 #include "device/events/EventQueue.h"
@@ -92,11 +93,9 @@ class CallArgument {
 };
 using CallArguments = std::initializer_list<CallArgument>;
 
-/// Which call crosses the boundary. `service` is the receiver's class, "FileSystem" for file operations,
-/// "AppsClient" for a call into the plug-in. `app` is empty where no app is meant.
+/// Which call crosses the boundary. `app` is empty where no app is meant.
 struct Crossing {
-  const char* service;
-  const char* operation;
+  InjectionPoint point;
   std::string_view app{};
   /// A message or a transaction record. It makes nothing happen, so it releases no held event: what follows from
   /// the call before must not depend on whether somebody listens.

@@ -1,8 +1,6 @@
 #pragma once
 
 #include <functional>
-#include <string>
-#include <string_view>
 #include <utility>
 
 #include "device/boundary/Boundary.h"
@@ -14,11 +12,11 @@ namespace device {
 /// one it has neither operation; and it lacks those that the device's settings take away.
 class DeviceServiceBoundary final : public platform::TSDeviceService {
  public:
-  using Setting = std::function<std::string(std::string_view key)>;
-
-  /// `service` may be null; otherwise it outlives this.
-  DeviceServiceBoundary(Boundary& boundary, Setting setting, platform::TSDeviceService* service)
-      : _boundary(boundary), _setting(std::move(setting)), _service(service) {}
+  /// `service` may be null; otherwise it outlives this. The other two answer, at each call, whether the settings leave
+  /// it the operation.
+  DeviceServiceBoundary(Boundary& boundary, std::function<bool()> prioritizes, std::function<bool()> cancels,
+                        platform::TSDeviceService* service)
+      : _boundary(boundary), _prioritizes(std::move(prioritizes)), _cancels(std::move(cancels)), _service(service) {}
 
   bool respondsToPrioritizeAsset() const override;
   void prioritizeAsset(const platform::TSAssetRef& asset, std::function<void(platform::ErrorRef)> completion) override;
@@ -27,7 +25,8 @@ class DeviceServiceBoundary final : public platform::TSDeviceService {
 
  private:
   Boundary& _boundary;
-  const Setting _setting;
+  const std::function<bool()> _prioritizes;
+  const std::function<bool()> _cancels;
   platform::TSDeviceService* const _service;
 };
 

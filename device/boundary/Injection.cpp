@@ -11,166 +11,8 @@ using platform::ErrorRef;
 
 namespace {
 
-struct Point {
-  std::string_view operation;
-  std::string_view service;
-
-  friend bool operator<(const Point& one, const Point& other) {
-    return std::pair(one.operation, one.service) < std::pair(other.operation, other.service);
-  }
-};
-
-// Sorted by operation, then by service.
-constexpr Point points[] = {
-    {"CorvaneClearUninstalled", "Installer"},
-    {"CorvaneLookupUninstalled", "Installer"},
-    {"GYCreateDeviceAppropriateHomeScreenIconImageFromBundle", "IconRenderer"},
-    {"KBBundleCreate", "IconRenderer"},
-    {"KBNotificationCallback", "AppsClient"},
-    {"KBNotificationCenterAddObserver", "NotificationCenter"},
-    {"KBNotificationCenterRemoveObserver", "NotificationCenter"},
-    {"KBURLCreateWithFileSystemPath", "IconRenderer"},
-    {"PNGetFlattenedIconState", "HomeScreen"},
-    {"PNSPanelloBlockableServerPort", "HomeScreen"},
-    {"PNSetIconState", "HomeScreen"},
-    {"QGImageDestinationAddImage", "QGImageDestination"},
-    {"QGImageDestinationCreateWithData", "ImageEncoder"},
-    {"QGImageDestinationFinalize", "QGImageDestination"},
-    {"RVCreateUserPresentableError", "InstallCoordination"},
-    {"_handleTSDStartupCompletedNotification", "AppsClient"},
-    {"accountsForAssets", "AppsClient"},
-    {"addObserver", "OBApplicationWorkspace"},
-    {"appAssetPromiseResponsibleClientWithError", "RVAppInstallCoordinator"},
-    {"appAssetPromiseWithError", "RVAppInstallCoordinator"},
-    {"applicationInstallsArePrioritized", "AppsClient"},
-    {"applicationInstallsDidCancel", "AppsClient"},
-    {"applicationIsInstalled", "OBApplicationWorkspace"},
-    {"applicationProxyForIdentifier", "OBApplicationWorkspace"},
-    {"assetInstallFailed", "AppsClient"},
-    {"assetInstallSucceeded", "AppsClient"},
-    {"assetTransferEndedWithSuccess", "AppsClient"},
-    {"assetTransferSucceeded", "AppsClient"},
-    {"assetTransferUpdatedProgress", "AppsClient"},
-    {"attributesOfItem", "FileSystem"},
-    {"bundleID", "RVAppInstallCoordinator"},
-    {"cancelAssetTransferForFailedAsset", "TSDeviceService"},
-    {"cancelForReason", "RVAppInstallCoordinator"},
-    {"cancelForReason", "RVPlaceholder"},
-    {"cancelForReason", "RVPromise"},
-    {"clearSyncData", "AppsClient"},
-    {"coordinatorCanceledWithReason", "AppsClient"},
-    {"coordinatorDidCompleteSuccessfully", "AppsClient"},
-    {"coordinatorDidInstallPlaceholder", "AppsClient"},
-    {"coordinatorForAppWithBundleID", "InstallCoordination"},
-    {"coordinatorShouldPrioritize", "AppsClient"},
-    {"copyItem", "FileSystem"},
-    {"createDirectory", "FileSystem"},
-    {"createFile", "FileSystem"},
-    {"createHandle", "SystemLog"},
-    {"creatorIdentifier", "RVAppInstallCoordinator"},
-    {"currentSyncAnchor", "AppsClient"},
-    {"dataWithPropertyList", "PropertyListSerialization"},
-    {"deallocateMemory", "Process"},
-    {"default", "log"},
-    {"disabledAssetTypes", "AppsClient"},
-    {"effectiveBoolValueForSetting", "DPProfileConnection"},
-    {"enumerateBundlesOfType", "OBApplicationWorkspace"},
-    {"error", "RVAppInstallCoordinator"},
-    {"error", "log"},
-    {"fileExists", "FileSystem"},
-    {"hasAppAssetPromise", "RVAppInstallCoordinator"},
-    {"hasInitialZDRAssetPromises", "RVAppInstallCoordinator"},
-    {"hasInstallOptions", "RVAppInstallCoordinator"},
-    {"hasPlaceholderPromise", "RVAppInstallCoordinator"},
-    {"hasUserDataPromise", "RVAppInstallCoordinator"},
-    {"infoDictionaryOfBundleAtPath", "Process"},
-    {"initializeWithLog", "InstallTransactionLog"},
-    {"installedAssetMetrics", "AppsClient"},
-    {"installedAssets", "AppsClient"},
-    {"isComplete", "RVPromise"},
-    {"logScenario", "InstallTransactionLog"},
-    {"logStep", "InstallTransactionLog"},
-    {"mainBundleIdentifier", "Process"},
-    {"makeAccountInfo", "TSSupport"},
-    {"makeAppInstallObserver", "InstallCoordination"},
-    {"makeAppPlaceholder", "InstallCoordination"},
-    {"makeBackupManager", "BackupService"},
-    {"makeInstallOptions", "Installer"},
-    {"makePlaceholderAttributes", "InstallCoordination"},
-    {"makePlaceholderAttributesWithInfoPlistDictionary", "InstallCoordination"},
-    {"makePromisedOutOfBandTransfer", "InstallCoordination"},
-    {"makePromisedTransferToPath", "InstallCoordination"},
-    {"makePromisedTransferToPathWithoutPath", "InstallCoordination"},
-    {"makeStoreMetadata", "Installer"},
-    {"moveItem", "FileSystem"},
-    {"notify_post", "NotificationCenter"},
-    {"notify_register_check", "NotificationCenter"},
-    {"notify_set_state", "NotificationCenter"},
-    {"outstandingAssetTransfers", "AppsClient"},
-    {"prepareForBackup", "AppsClient"},
-    {"prepareForSyncWithHostAnchor", "AppsClient"},
-    {"prioritizeAsset", "TSDeviceService"},
-    {"prioritizeCompletion", "AppsClient"},
-    {"promiseDidBeginFulfillmentWithIdentifier", "AppsClient"},
-    {"propertyListWithData", "PropertyListSerialization"},
-    {"readFile", "FileSystem"},
-    {"reconcileRestoreOfType", "AppsClient"},
-    {"reconcileSync", "AppsClient"},
-    {"releaseAppInstallObserver", "InstallCoordination"},
-    {"removeItem", "FileSystem"},
-    {"removeObserver", "OBApplicationWorkspace"},
-    {"respondsToCancelAssetTransferForFailedAsset", "TSDeviceService"},
-    {"respondsToPrioritizeAsset", "TSDeviceService"},
-    {"setAltDSID", "TSMutableAccountInfo"},
-    {"setAppAssetPromise", "RVAppInstallCoordinator"},
-    {"setAppAssetPromiseResponsibleClient", "RVAppInstallCoordinator"},
-    {"setBundleVersion", "RVPlaceholderAttributes"},
-    {"setComplete", "RVPromise"},
-    {"setConfigurationCompleteWithError", "RVPlaceholder"},
-    {"setDSID", "TSMutableAccountInfo"},
-    {"setHarluneMetadata", "CVInstallOptions"},
-    {"setIconPromise", "RVPlaceholder"},
-    {"setInitialZDRAssetPromises", "RVAppInstallCoordinator"},
-    {"setInstallOptions", "RVAppInstallCoordinator"},
-    {"setInstallTargetType", "CVInstallOptions"},
-    {"setLaunchProhibited", "RVPlaceholderAttributes"},
-    {"setMetadata", "RVPlaceholder"},
-    {"setObInstallType", "CVInstallOptions"},
-    {"setObserver", "RVAppInstallCoordinator"},
-    {"setPercentComplete", "RVPromise"},
-    {"setPlaceholderAttributes", "RVPlaceholder"},
-    {"setPlaceholderPromise", "RVAppInstallCoordinator"},
-    {"setSinfData", "RVPlaceholder"},
-    {"setTransferPath", "RVPromise"},
-    {"setUserDataPromise", "RVAppInstallCoordinator"},
-    {"setVantorID", "TSMutableAccountInfo"},
-    {"step", ""},
-    {"supportedDataclasses", "AppsClient"},
-    {"syncEndedWithSuccess", "AppsClient"},
-    {"temporaryDirectory", "Process"},
-    {"tessaroShouldCreateAppPlaceholdersWithError", "CLManager"},
-    {"textOfErrorNumber", "Process"},
-    {"transfer", ""},
-    {"uninstallAppWithBundleID", "InstallCoordination"},
-    {"uninstallApplication", "OBApplicationWorkspace"},
-    {"uninstallCompletion", "AppsClient"},
-    {"utimes", "FileSystem"},
-    {"vantorIDsForAssets", "AppsClient"},
-    {"writeAtomically", "FileSystem"},
-};
-static_assert([] {
-  for (std::size_t i = 1; i < std::size(points); ++i) {
-    if (points[i].operation < points[i - 1].operation) return false;
-    if (points[i].operation == points[i - 1].operation && points[i].service <= points[i - 1].service) return false;
-  }
-  return true;
-}());
-
-/// The classes of promises share their operations; a rule may name any of them.
-std::string_view declaringClass(std::string_view service) {
-  bool isPromise = service == "RVPromisedTransferToPath" || service == "RVPromisedOutOfBandTransfer";
-  return isPromise ? "RVPromise" : service;
-}
+using Point = InjectionPoint::Name;
+constexpr const auto& points = InjectionPoint::table;
 
 struct KnownAction {
   std::string_view name;
@@ -224,7 +66,7 @@ std::string parsePlace(std::string_view place, InjectionRule& rule) {
     if (rule.app.empty()) return "there is no app after the colon";
     place = place.substr(0, colon);
   }
-  rule.point = place;
+  rule.place = place;
   if (place.empty()) return "there is no point before the action";
   return isInjectionPoint(place) ? std::string() : "there is no point " + quoted(place);
 }
@@ -276,23 +118,24 @@ bool isInjectionPoint(std::string_view point) {
   auto first = std::lower_bound(std::begin(points), std::end(points), Point{operation, {}});
   if (first == std::end(points) || first->operation != operation) return false;
   if (dot == point.npos) return true;
-  std::string_view service = declaringClass(point.substr(0, dot));
+  std::string_view service = InjectionPoint::declaringClass(point.substr(0, dot));
   return !service.empty() && std::binary_search(first, std::end(points), Point{operation, service});
 }
 
-bool isAboutSteps(const InjectionRule& rule) { return rule.point == "step"; }
+bool isAboutSteps(const InjectionRule& rule) { return rule.place == InjectionPoint("", "step").operation(); }
 
-bool InjectionRule::matches(std::string_view service, std::string_view operation, std::string_view ofApp) const {
+bool InjectionRule::matches(const InjectionPoint& point, std::string_view ofApp) const {
   if (!app.empty() && app != ofApp) return false;
-  std::string_view rest = point;
+  std::string_view service = point.service();
+  std::string_view operation = point.operation();
+  std::string_view rest = place;
   if (rest.size() < operation.size() || rest.substr(rest.size() - operation.size()) != operation) return false;
   rest.remove_suffix(operation.size());
   // The level of a message is not an operation: the accessor `error` does not stand for every error message.
   if (rest.empty()) return service != "log";
   if (rest.back() != '.') return false;
   rest.remove_suffix(1);
-  if (rest == "RVPromise") return declaringClass(service) == rest;
-  return rest == service;
+  return rest == service || rest == InjectionPoint::declaringClass(service);
 }
 
 std::optional<InjectionRule> InjectionRule::parse(std::string_view text, ErrorRef* error) {

@@ -6,6 +6,7 @@
 #include <string_view>
 #include <vector>
 
+#include "device/boundary/InjectionPoint.h"
 #include "platform/Error.h"
 
 namespace device {
@@ -31,7 +32,7 @@ struct InjectionRule {
     store,       // the store creates a coordinator for `target`
   };
 
-  std::string point;
+  std::string place;
   std::string app;          // empty: every app
   std::uint64_t match = 0;  // 0: every match
   Action action = Action::fail;
@@ -40,8 +41,8 @@ struct InjectionRule {
   bool onwards = false;     // every match from the N-th on
   std::string text{};       // as it was given
 
-  /// Whether the rule is about calls of this operation for this app (empty: the call is about no app).
-  bool matches(std::string_view service, std::string_view operation, std::string_view app) const;
+  /// Whether the rule is about this point for this app (empty: the call is about no app).
+  bool matches(const InjectionPoint& point, std::string_view app) const;
 
   /// Whether the rule takes effect at its match of that number, counted from 1.
   bool isDue(std::uint64_t turn) const { return match == 0 || turn == match || (onwards && turn > match); }

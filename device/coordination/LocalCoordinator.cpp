@@ -22,15 +22,15 @@ ErrorRef notOurs(const std::string& app, const char* what) {
 }  // namespace
 
 std::optional<std::string> LocalCoordinator::bundleID() {
-  return _boundary.call({className, "bundleID", app}, nullptr, {}, [&] { return std::optional<std::string>(app); });
+  return _boundary.call({{className, "bundleID"}, app}, nullptr, {}, [&] { return std::optional<std::string>(app); });
 }
 
 platform::RVClientIdentifier LocalCoordinator::creatorIdentifier() {
-  return _boundary.call({className, "creatorIdentifier", app}, nullptr, {}, [&] { return creator; });
+  return _boundary.call({{className, "creatorIdentifier"}, app}, nullptr, {}, [&] { return creator; });
 }
 
 ErrorRef LocalCoordinator::error() {
-  return _boundary.call({className, "error", app}, nullptr, {}, [&] {
+  return _boundary.call({{className, "error"}, app}, nullptr, {}, [&] {
     Lock lock(_engine.records());
     return state.failure;
   });
@@ -38,38 +38,39 @@ ErrorRef LocalCoordinator::error() {
 
 void LocalCoordinator::setObserver(std::weak_ptr<platform::RVAppInstallObserverDelegate> observer) {
   auto alive = observer.lock();
-  _boundary.call({className, "setObserver", app}, nullptr, {{"observer", alive}}, [&] {
+  _boundary.call({{className, "setObserver"}, app}, nullptr, {{"observer", alive}}, [&] {
     Lock lock(_engine.records());
     state.observer = observer;
   });
 }
 
-bool LocalCoordinator::holds(const char* operation, bool (*piece)(const CoordinatorRecord&)) {
-  return _boundary.call({className, operation, app}, nullptr, {}, [&] {
+bool LocalCoordinator::holds(const InjectionPoint& point, bool (*piece)(const CoordinatorRecord&)) {
+  return _boundary.call({point, app}, nullptr, {}, [&] {
     Lock lock(_engine.records());
     return piece(state.record);
   });
 }
 
 bool LocalCoordinator::hasAppAssetPromise() {
-  return holds("hasAppAssetPromise", [](const auto& record) { return record.appAsset != nullptr; });
+  return holds({className, "hasAppAssetPromise"}, [](const auto& record) { return record.appAsset != nullptr; });
 }
 bool LocalCoordinator::hasInitialZDRAssetPromises() {
-  return holds("hasInitialZDRAssetPromises", [](const auto& record) { return record.hasInitialZDRAssetPromises; });
+  return holds({className, "hasInitialZDRAssetPromises"},
+               [](const auto& record) { return record.hasInitialZDRAssetPromises; });
 }
 bool LocalCoordinator::hasInstallOptions() {
-  return holds("hasInstallOptions", [](const auto& record) { return record.options.has_value(); });
+  return holds({className, "hasInstallOptions"}, [](const auto& record) { return record.options.has_value(); });
 }
 bool LocalCoordinator::hasPlaceholderPromise() {
-  return holds("hasPlaceholderPromise", [](const auto& record) { return record.placeholder.has_value(); });
+  return holds({className, "hasPlaceholderPromise"}, [](const auto& record) { return record.placeholder.has_value(); });
 }
 bool LocalCoordinator::hasUserDataPromise() {
-  return holds("hasUserDataPromise", [](const auto& record) { return record.userData != nullptr; });
+  return holds({className, "hasUserDataPromise"}, [](const auto& record) { return record.userData != nullptr; });
 }
 
 std::shared_ptr<platform::RVPromisedTransferToPath> LocalCoordinator::appAssetPromiseWithError(ErrorRef* error) {
   return _boundary.call(
-      {className, "appAssetPromiseWithError", app}, error, {},
+      {{className, "appAssetPromiseWithError"}, app}, error, {},
       [&]() -> std::shared_ptr<platform::RVPromisedTransferToPath> {
         Lock lock(_engine.records());
         const auto& held = state.record.appAsset;
@@ -83,7 +84,7 @@ std::shared_ptr<platform::RVPromisedTransferToPath> LocalCoordinator::appAssetPr
 
 bool LocalCoordinator::setAppAssetPromise(const std::shared_ptr<platform::RVPromisedTransferToPath>& promise,
                                           ErrorRef* error) {
-  return _boundary.call({className, "setAppAssetPromise", app}, error, {{"promise", promise}}, [&] {
+  return _boundary.call({{className, "setAppAssetPromise"}, app}, error, {{"promise", promise}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalTransferPromise>(promise);
     if (!ours) return fail(error, notOurs(app, "app asset promise"));
     return _engine.attachAppAsset(*this, ours->record, ours, error);
@@ -92,7 +93,7 @@ bool LocalCoordinator::setAppAssetPromise(const std::shared_ptr<platform::RVProm
 
 bool LocalCoordinator::setPlaceholderPromise(const std::shared_ptr<platform::RVPlaceholder>& placeholder,
                                              ErrorRef* error) {
-  return _boundary.call({className, "setPlaceholderPromise", app}, error, {{"placeholder", placeholder}}, [&] {
+  return _boundary.call({{className, "setPlaceholderPromise"}, app}, error, {{"placeholder", placeholder}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalPlaceholder>(placeholder);
     if (!ours) return fail(error, notOurs(app, "placeholder"));
     return ours->attachTo(*this, error);
@@ -101,7 +102,7 @@ bool LocalCoordinator::setPlaceholderPromise(const std::shared_ptr<platform::RVP
 
 bool LocalCoordinator::setUserDataPromise(const std::shared_ptr<platform::RVPromisedOutOfBandTransfer>& promise,
                                           ErrorRef* error) {
-  return _boundary.call({className, "setUserDataPromise", app}, error, {{"promise", promise}}, [&] {
+  return _boundary.call({{className, "setUserDataPromise"}, app}, error, {{"promise", promise}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalOutOfBandPromise>(promise);
     if (!ours) return fail(error, notOurs(app, "user-data promise"));
     auto attach = [&](CoordinatorRecord& record) {
@@ -116,7 +117,7 @@ bool LocalCoordinator::setUserDataPromise(const std::shared_ptr<platform::RVProm
 
 bool LocalCoordinator::setInitialZDRAssetPromises(const std::vector<std::shared_ptr<platform::RVPromise>>& promises,
                                                   ErrorRef* error) {
-  return _boundary.call({className, "setInitialZDRAssetPromises", app}, error, {{"count", promises.size()}}, [&] {
+  return _boundary.call({{className, "setInitialZDRAssetPromises"}, app}, error, {{"count", promises.size()}}, [&] {
     std::vector<PromiseRef> records;
     for (const auto& promise : promises) {
       if (auto transfer = std::dynamic_pointer_cast<LocalTransferPromise>(promise))
@@ -136,7 +137,7 @@ bool LocalCoordinator::setInitialZDRAssetPromises(const std::vector<std::shared_
 }
 
 bool LocalCoordinator::setInstallOptions(const std::shared_ptr<platform::CVInstallOptions>& options, ErrorRef* error) {
-  return _boundary.call({className, "setInstallOptions", app}, error, {{"options", options}}, [&] {
+  return _boundary.call({{className, "setInstallOptions"}, app}, error, {{"options", options}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalInstallOptions>(options);
     if (!ours) return fail(error, notOurs(app, "install options"));
     auto attach = [&](CoordinatorRecord& record) {
@@ -148,7 +149,7 @@ bool LocalCoordinator::setInstallOptions(const std::shared_ptr<platform::CVInsta
 }
 
 platform::RVClientIdentifier LocalCoordinator::appAssetPromiseResponsibleClientWithError(ErrorRef* error) {
-  return _boundary.call({className, "appAssetPromiseResponsibleClientWithError", app}, error, {}, [&] {
+  return _boundary.call({{className, "appAssetPromiseResponsibleClientWithError"}, app}, error, {}, [&] {
     platform::setError(error, nullptr);
     Lock lock(_engine.records());
     return state.record.responsibleClient;
@@ -156,7 +157,7 @@ platform::RVClientIdentifier LocalCoordinator::appAssetPromiseResponsibleClientW
 }
 
 bool LocalCoordinator::setAppAssetPromiseResponsibleClient(platform::RVClientIdentifier client, ErrorRef* error) {
-  return _boundary.call({className, "setAppAssetPromiseResponsibleClient", app}, error, {{"client", client}}, [&] {
+  return _boundary.call({{className, "setAppAssetPromiseResponsibleClient"}, app}, error, {{"client", client}}, [&] {
     auto name = [&](CoordinatorRecord& record) {
       record.responsibleClient = client;
       return true;
@@ -166,7 +167,7 @@ bool LocalCoordinator::setAppAssetPromiseResponsibleClient(platform::RVClientIde
 }
 
 bool LocalCoordinator::cancelForReason(const ErrorRef& reason, platform::RVClientIdentifier client, ErrorRef* error) {
-  return _boundary.call({className, "cancelForReason", app}, error, {{"reason", reason}, {"client", client}},
+  return _boundary.call({{className, "cancelForReason"}, app}, error, {{"reason", reason}, {"client", client}},
                         [&] { return _engine.cancel(*this, reason, client, error); });
 }
 

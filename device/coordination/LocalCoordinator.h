@@ -50,7 +50,7 @@ class LocalCoordinator final : public Coordinator {
   std::string describe() const override;
 
  private:
-  bool holds(const char* operation, bool (*piece)(const CoordinatorRecord&));
+  bool holds(const InjectionPoint& point, bool (*piece)(const CoordinatorRecord&));
 
   InstallEngine& _engine;
   Boundary& _boundary;

@@ -15,7 +15,7 @@ InstallOptionsRecord LocalInstallOptions::record() const {
 }
 
 void LocalInstallOptions::setHarluneMetadata(std::shared_ptr<platform::CVStoreMetadata> metadata) {
-  _boundary.call({className, "setHarluneMetadata"}, nullptr, {{"metadata", metadata}}, [&] {
+  _boundary.call({{className, "setHarluneMetadata"}}, nullptr, {{"metadata", metadata}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalStoreMetadata>(metadata);
     Lock lock(_mutex);
     _record.metadata = ours ? ours->dictionary : platform::Value();
@@ -23,14 +23,14 @@ void LocalInstallOptions::setHarluneMetadata(std::shared_ptr<platform::CVStoreMe
 }
 
 void LocalInstallOptions::setObInstallType(std::uint64_t type) {
-  _boundary.call({className, "setObInstallType"}, nullptr, {{"type", type}}, [&] {
+  _boundary.call({{className, "setObInstallType"}}, nullptr, {{"type", type}}, [&] {
     Lock lock(_mutex);
     _record.installType = type;
   });
 }
 
 void LocalInstallOptions::setInstallTargetType(std::uint64_t type) {
-  _boundary.call({className, "setInstallTargetType"}, nullptr, {{"type", type}}, [&] {
+  _boundary.call({{className, "setInstallTargetType"}}, nullptr, {{"type", type}}, [&] {
     Lock lock(_mutex);
     _record.installTargetType = type;
   });

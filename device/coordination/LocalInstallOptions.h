@@ -7,6 +7,7 @@
 #include "device/records/CoordinatorRecord.h"
 #include "platform/CVInstallOptions.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -65,7 +65,7 @@ bool LocalPlaceholder::change(ErrorRef* error, Edit&& edit) {
 
 bool LocalPlaceholder::setIconPromise(const std::shared_ptr<platform::RVPromisedTransferToPath>& promise,
                                       ErrorRef* error) {
-  return _boundary.call({className, "setIconPromise", _app}, error, {{"promise", promise}}, [&] {
+  return _boundary.call({{className, "setIconPromise"}, _app}, error, {{"promise", promise}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalTransferPromise>(promise);
     if (!ours) return fail(error, coordinationError(CoordinationError::invalid, "no icon promise for " + _app));
     return change(error, [&](PlaceholderRecord&, auto& icon) { icon = ours; });
@@ -73,7 +73,7 @@ bool LocalPlaceholder::setIconPromise(const std::shared_ptr<platform::RVPromised
 }
 
 bool LocalPlaceholder::setMetadata(const std::shared_ptr<platform::CVStoreMetadata>& metadata, ErrorRef* error) {
-  return _boundary.call({className, "setMetadata", _app}, error, {{"metadata", metadata}}, [&] {
+  return _boundary.call({{className, "setMetadata"}, _app}, error, {{"metadata", metadata}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalStoreMetadata>(metadata);
     return change(error, [&](PlaceholderRecord& record, auto&) {
       record.metadata = ours ? ours->dictionary : platform::Value();
@@ -83,7 +83,7 @@ bool LocalPlaceholder::setMetadata(const std::shared_ptr<platform::CVStoreMetada
 
 bool LocalPlaceholder::setPlaceholderAttributes(const std::shared_ptr<platform::RVPlaceholderAttributes>& attributes,
                                                 ErrorRef* error) {
-  return _boundary.call({className, "setPlaceholderAttributes", _app}, error, {{"attributes", attributes}}, [&] {
+  return _boundary.call({{className, "setPlaceholderAttributes"}, _app}, error, {{"attributes", attributes}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalPlaceholderAttributes>(attributes);
     if (!ours) return fail(error, coordinationError(CoordinationError::invalid, "no attributes for " + _app));
     auto facts = ours->facts();
@@ -97,18 +97,18 @@ bool LocalPlaceholder::setPlaceholderAttributes(const std::shared_ptr<platform::
 
 bool LocalPlaceholder::setSinfData(platform::BytesView data, ErrorRef* error) {
   return _boundary.call(
-      {className, "setSinfData", _app}, error, {{"data", CallArgument::BytesCount{data.size()}}},
+      {{className, "setSinfData"}, _app}, error, {{"data", CallArgument::BytesCount{data.size()}}},
       [&] { return change(error, [&](PlaceholderRecord& record, auto&) { record.rights = platform::Bytes(data); }); });
 }
 
 bool LocalPlaceholder::setConfigurationCompleteWithError(ErrorRef* error) {
-  return _boundary.call({className, "setConfigurationCompleteWithError", _app}, error, {}, [&] {
+  return _boundary.call({{className, "setConfigurationCompleteWithError"}, _app}, error, {}, [&] {
     return change(error, [](PlaceholderRecord& record, auto&) { record.configured = true; });
   });
 }
 
 bool LocalPlaceholder::cancelForReason(const ErrorRef& reason, platform::RVClientIdentifier client, ErrorRef* error) {
-  return _boundary.call({className, "cancelForReason", _app}, error, {{"reason", reason}, {"client", client}}, [&] {
+  return _boundary.call({{className, "cancelForReason"}, _app}, error, {{"reason", reason}, {"client", client}}, [&] {
     platform::setError(error, nullptr);
     CoordinatorRef coordinator;
     {

@@ -9,6 +9,7 @@
 #include "device/reports/Coordinator.h"
 #include "platform/Mutex.h"
 #include "platform/RVPlaceholder.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

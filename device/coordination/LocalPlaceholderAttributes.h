@@ -7,6 +7,7 @@
 #include "device/boundary/Boundary.h"
 #include "platform/Mutex.h"
 #include "platform/RVPlaceholder.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 
@@ -32,13 +33,13 @@ class LocalPlaceholderAttributes final : public platform::RVPlaceholderAttribute
   }
 
   void setBundleVersion(std::optional<std::string> version) override {
-    _boundary.call({"RVPlaceholderAttributes", "setBundleVersion"}, nullptr, {{"version", version}}, [&] {
+    _boundary.call({{"RVPlaceholderAttributes", "setBundleVersion"}}, nullptr, {{"version", version}}, [&] {
       platform::Mutex::Lock lock(_mutex);
       _facts.version = version;
     });
   }
   void setLaunchProhibited(bool prohibited) override {
-    _boundary.call({"RVPlaceholderAttributes", "setLaunchProhibited"}, nullptr, {{"prohibited", prohibited}}, [&] {
+    _boundary.call({{"RVPlaceholderAttributes", "setLaunchProhibited"}}, nullptr, {{"prohibited", prohibited}}, [&] {
       platform::Mutex::Lock lock(_mutex);
       _facts.launchProhibited = prohibited;
     });

@@ -3,6 +3,7 @@
 #include <memory>
 #include <string>
 #include <string_view>
+#include <type_traits>
 
 #include "device/boundary/Boundary.h"
 #include "device/install/InstallEngine.h"
@@ -18,55 +19,55 @@ std::string_view appOfPromise(std::string_view name);
 template <class Interface>
 class LocalPromise : public Interface {
  public:
-  LocalPromise(InstallEngine& engine, Boundary& boundary, PromiseRef promise, const char* className)
-      : record(std::move(promise)), _engine(engine), _boundary(boundary), _className(className) {}
+  LocalPromise(InstallEngine& engine, Boundary& boundary, PromiseRef promise)
+      : record(std::move(promise)), _engine(engine), _boundary(boundary) {}
 
   const PromiseRef record;
 
   void setPercentComplete(double fraction) override {
-    _boundary.call(crossing("setPercentComplete"), nullptr, {self(), {"fraction", fraction}},
+    _boundary.call(crossing({className, "setPercentComplete"}), nullptr, {self(), {"fraction", fraction}},
                    [&] { _engine.setFraction(*record, fraction); });
   }
   void setComplete(bool complete) override {
-    _boundary.call(crossing("setComplete"), nullptr, {self(), {"complete", complete}}, [&] {
+    _boundary.call(crossing({className, "setComplete"}), nullptr, {self(), {"complete", complete}}, [&] {
       if (complete) _engine.deliver(*record);
     });
   }
   bool isComplete() override {
-    return _boundary.call(crossing("isComplete"), nullptr, {self()}, [&] { return _engine.isComplete(*record); });
+    return _boundary.call(crossing({className, "isComplete"}), nullptr, {self()},
+                          [&] { return _engine.isComplete(*record); });
   }
   bool cancelForReason(const platform::ErrorRef& reason, platform::RVClientIdentifier client,
                        platform::ErrorRef* error) override {
-    return _boundary.call(crossing("cancelForReason"), error, {self(), {"reason", reason}, {"client", client}},
+    return _boundary.call(crossing({className, "cancelForReason"}), error,
+                          {self(), {"reason", reason}, {"client", client}},
                           [&] { return _engine.cancel(*record, reason, client, error); });
   }
-  std::string describe() const override { return std::string("<") + _className + ' ' + record->name + '>'; }
+  std::string describe() const override { return std::string("<") + className + ' ' + record->name + '>'; }
 
  protected:
-  Crossing crossing(const char* operation) const { return {_className, operation, appOfPromise(record->name)}; }
+  static constexpr const char* className = std::is_same_v<Interface, platform::RVPromisedTransferToPath>
+                                               ? "RVPromisedTransferToPath"
+                                               : "RVPromisedOutOfBandTransfer";
+  Crossing crossing(const InjectionPoint& point) const { return {point, appOfPromise(record->name)}; }
   CallArgument self() const { return CallArgument::object("self", "promise", wholeObject(this)); }
 
   InstallEngine& _engine;
   Boundary& _boundary;
-
- private:
-  const char* const _className;
 };
 
 class LocalTransferPromise final : public LocalPromise<platform::RVPromisedTransferToPath> {
  public:
-  LocalTransferPromise(InstallEngine& engine, Boundary& boundary, PromiseRef promise)
-      : LocalPromise(engine, boundary, std::move(promise), "RVPromisedTransferToPath") {}
+  using LocalPromise::LocalPromise;
   void setTransferPath(std::string_view path) override {
-    _boundary.call(crossing("setTransferPath"), nullptr, {self(), {"path", path}},
+    _boundary.call(crossing({className, "setTransferPath"}), nullptr, {self(), {"path", path}},
                    [&] { _engine.setPath(*record, path); });
   }
 };
 
 class LocalOutOfBandPromise final : public LocalPromise<platform::RVPromisedOutOfBandTransfer> {
  public:
-  LocalOutOfBandPromise(InstallEngine& engine, Boundary& boundary, PromiseRef promise)
-      : LocalPromise(engine, boundary, std::move(promise), "RVPromisedOutOfBandTransfer") {}
+  using LocalPromise::LocalPromise;
 };
 
 }  // namespace device

@@ -16,6 +16,7 @@
 
 #include "device/files/DevicePath.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -6,6 +6,7 @@
 
 #include "device/files/FileTree.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

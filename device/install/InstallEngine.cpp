@@ -29,7 +29,15 @@ InstallEngine::InstallEngine(AppRecords& records, FileTree& files, EventQueue& e
       _open(std::move(makeCoordinator)),
       _reports(records, registry, coordination),
       _placeholderFailed(std::move(placeholderFailed)),
-      _parts{records, files, _containers, _open, _reports, events, _placeholderFailed} {}
+      _parts{
+          .records = records,
+          .files = files,
+          .containers = _containers,
+          .open = _open,
+          .reports = _reports,
+          .events = events,
+          .placeholderFailed = _placeholderFailed,
+      } {}
 
 void InstallEngine::begin(AppRecords::Loaded loaded, bool recovers) {
   InstallRecovery(_parts).run(std::move(loaded), recovers);

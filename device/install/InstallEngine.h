@@ -15,6 +15,7 @@
 #include "device/install/OpenCoordinators.h"
 #include "device/records/AppRecords.h"
 #include "device/reports/InstallReports.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

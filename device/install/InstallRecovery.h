@@ -1,6 +1,7 @@
 #pragma once
 
 #include "device/install/InstallParts.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -10,6 +10,7 @@
 #include "device/DeviceStatus.h"
 #include "device/records/AppRecords.h"
 #include "device/reports/Coordinator.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

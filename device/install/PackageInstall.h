@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "device/install/InstallOutcomes.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

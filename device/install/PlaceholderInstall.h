@@ -4,6 +4,7 @@
 
 #include "device/install/AbandonedContainer.h"
 #include "device/install/InstallParts.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

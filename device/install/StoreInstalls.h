@@ -3,6 +3,7 @@
 #include <string_view>
 
 #include "device/install/InstallParts.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -159,9 +159,9 @@ void ChangeSet::setLayout(HomeLayout layout) {
       [layout = std::move(layout)](DeviceState& state) { takeLayout(state, layout); });
 }
 
-void ChangeSet::setSetting(std::string_view key, std::string_view value) {
-  add({"setting", std::string(key), value}, [key = std::string(key), value = std::string(value)](DeviceState& state) {
-    state.settings.insert_or_assign(key, value);
+void ChangeSet::setSetting(std::string_view key, std::string_view text) {
+  add({"setting", std::string(key), text}, [key = std::string(key), text = std::string(text)](DeviceState& state) {
+    changeSetting(state.settings, key, text);
   });
 }
 
@@ -210,7 +210,8 @@ bool AppRecords::take(const StoreRecord& record, Loaded& loaded) {
   }
   if (record.kind == "setting") {
     auto value = record.value.string();
-    if (value) _state.settings.insert_or_assign(record.key, std::string(*value));
+    // One of another program's version stays in the store and counts as not set.
+    if (value) changeSetting(_state.settings, record.key, *value);
     return value.has_value();
   }
   if (record.kind == "notification")

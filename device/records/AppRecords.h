@@ -14,10 +14,12 @@
 #include "device/DeviceStatus.h"
 #include "device/records/CoordinatorRecord.h"
 #include "device/records/RecordsGuard.h"
+#include "device/records/Settings.h"
 #include "device/store/Store.h"
 #include "platform/Mutex.h"
 #include "platform/OBApplicationProxy.h"
 #include "platform/TextTable.h"
+#include "platform/ThreadSafety.h"
 #include "platform/Value.h"
 
 namespace device {
@@ -70,7 +72,7 @@ struct DeviceState {
   std::map<std::string, AppRecord, std::less<>> apps;  // in order of identifier, which is every enumeration's order
   std::map<std::string, OutcomeRecord, std::less<>> outcomes;
   std::map<std::string, platform::Value, std::less<>> uninstalled;
-  std::map<std::string, std::string, std::less<>> settings;
+  Settings settings;
   std::map<std::string, std::uint64_t, std::less<>> notificationStates;
   HomeLayout layout;
   platform::TextSet inLayout;
@@ -100,7 +102,8 @@ class ChangeSet {
   void addUninstalled(std::string_view app, const platform::Value& facts);
   void removeUninstalled(std::string_view app);
   void setLayout(HomeLayout layout);
-  void setSetting(std::string_view key, std::string_view value);
+  /// One that `changeSetting` takes.
+  void setSetting(std::string_view key, std::string_view text);
   void setNotificationState(std::string_view name, std::uint64_t state);
   /// A file that is to be removed once this is committed; if that does not happen, the next opening removes it.
   void addLeftover(std::string_view path);

@@ -9,6 +9,7 @@
 #include "device/records/RecordsGuard.h"
 #include "platform/InstallCoordination.h"
 #include "platform/RVClient.h"
+#include "platform/ThreadSafety.h"
 #include "platform/Value.h"
 
 namespace device {

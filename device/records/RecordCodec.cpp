@@ -11,104 +11,157 @@ namespace {
 using platform::Dictionary;
 using platform::Value;
 
-void setText(Dictionary& entries, std::string_view key, const std::optional<std::string>& text) {
-  if (text) entries.set(key, *text);
-}
-void setFlag(Dictionary& entries, std::string_view key, bool flag) {
-  if (flag) entries.set(key, true);
-}
-void setNumber(Dictionary& entries, std::string_view key, std::uint64_t number) {
-  if (number) entries.set(key, number);
+/// Writes the fields that it is shown into a dictionary. Absent values, empty bytes, false and 0 are left out, except
+/// numbers that are `always` written.
+class Writer {
+ public:
+  template <class Record>
+  using Of = const Record;
+
+  void text(std::string_view key, const std::string& text) { entries.set(key, text); }
+  void text(std::string_view key, const std::optional<std::string>& text) {
+    if (text) entries.set(key, *text);
+  }
+  void flag(std::string_view key, bool flag) {
+    if (flag) entries.set(key, true);
+  }
+  void number(std::string_view key, std::uint64_t number) {
+    if (number) entries.set(key, number);
+  }
+  void always(std::string_view key, std::uint64_t number) { entries.set(key, number); }
+  void real(std::string_view key, double number) { entries.set(key, number); }
+  void value(std::string_view key, const Value& value) { entries.set(key, value); }
+  void bytes(std::string_view key, const platform::Bytes& bytes) {
+    if (!bytes.empty()) entries.set(key, Value::makeData(bytes));
+  }
+  template <class Record>
+  void record(std::string_view key, const std::optional<Record>& record) {
+    if (!record) return;
+    Writer inner;
+    fields(inner, *record);
+    entries.set(key, inner.written);
+  }
+  void record(std::string_view key, const PromiseRef& promise) REQUIRES(recordsGuard) {
+    if (promise) entries.set(key, valueOf(*promise));
+  }
+  static Value valueOf(const PromiseRecord& promise) REQUIRES(recordsGuard);
+
+  Value written = Value::makeDictionary();
+  Dictionary& entries = *written.dictionary();
+};
+
+/// Reads the fields that it is shown into a new record; one that is missing, or of another kind, keeps its default.
+class Reader {
+ public:
+  template <class Record>
+  using Of = Record;
+
+  explicit Reader(const Dictionary& entries) : entries(entries) {}
+
+  void text(std::string_view key, std::string& text) { text = entries[key].string().value_or(""); }
+  void text(std::string_view key, std::optional<std::string>& text) {
+    if (auto found = entries[key].string()) text = std::string(*found);
+  }
+  void flag(std::string_view key, bool& flag) { flag = entries[key].boolean().value_or(false); }
+  void number(std::string_view key, std::uint64_t& number) { number = entries[key].unsignedInteger().value_or(0); }
+  void always(std::string_view key, std::uint64_t& number) { this->number(key, number); }
+  void real(std::string_view key, double& number) { number = entries[key].real().value_or(0); }
+  void value(std::string_view key, Value& value) { value = entries[key]; }
+  void bytes(std::string_view key, platform::Bytes& bytes) { bytes = entries[key].data().value_or(""); }
+  template <class Record>
+  void record(std::string_view key, std::optional<Record>& record) {
+    if (!entries[key].dictionary()) return;
+    Reader inner(*entries[key].dictionary());
+    fields(inner, record.emplace());
+  }
+  void record(std::string_view key, PromiseRef& promise) REQUIRES(recordsGuard) { promise = promiseOf(entries[key]); }
+  static PromiseRef promiseOf(const Value& value) REQUIRES(recordsGuard);
+
+  const Dictionary& entries;
+};
+
+// The fields of each record, once for both directions.
+
+template <class Codec>
+void fields(Codec& codec, typename Codec::template Of<PromiseRecord>& promise) REQUIRES(recordsGuard) {
+  codec.text("name", promise.name);
+  codec.number("identifier", promise.identifier);
+  codec.number("client", promise.client);
+  codec.number("diskSpaceNeeded", promise.diskSpaceNeeded);
+  codec.text("path", promise.path);
+  codec.real("fraction", promise.fraction);
+  codec.flag("complete", promise.complete);
 }
 
-std::optional<std::string> optionalText(const Dictionary& entries, std::string_view key) {
-  auto text = entries[key].string();
-  if (!text) return std::nullopt;
-  return std::string(*text);
-}
-std::string text(const Dictionary& entries, std::string_view key) {
-  return std::string(entries[key].string().value_or(""));
-}
-std::uint64_t number(const Dictionary& entries, std::string_view key) {
-  return entries[key].unsignedInteger().value_or(0);
-}
-bool flag(const Dictionary& entries, std::string_view key) { return entries[key].boolean().value_or(false); }
-
-Value valueOfPromise(const PromiseRecord& promise) REQUIRES(recordsGuard) {
-  auto value = Value::makeDictionary();
-  auto& entries = *value.dictionary();
-  entries.set("name", promise.name);
-  setNumber(entries, "identifier", promise.identifier);
-  setNumber(entries, "client", promise.client);
-  setNumber(entries, "diskSpaceNeeded", promise.diskSpaceNeeded);
-  setText(entries, "path", promise.path);
-  entries.set("fraction", promise.fraction);
-  setFlag(entries, "complete", promise.complete);
-  return value;
+Value Writer::valueOf(const PromiseRecord& promise) {
+  Writer writer;
+  fields(writer, promise);
+  return std::move(writer.written);
 }
 
-PromiseRef promiseOfValue(const Value& value) REQUIRES(recordsGuard) {
-  const auto* entries = value.dictionary();
-  if (!entries) return nullptr;
+PromiseRef Reader::promiseOf(const Value& value) {
+  if (!value.dictionary()) return nullptr;
+  Reader reader(*value.dictionary());
   auto promise = std::make_shared<PromiseRecord>();
-  promise->name = text(*entries, "name");
-  promise->identifier = number(*entries, "identifier");
-  promise->client = number(*entries, "client");
-  promise->diskSpaceNeeded = number(*entries, "diskSpaceNeeded");
-  promise->path = optionalText(*entries, "path");
-  promise->fraction = (*entries)["fraction"].real().value_or(0);
-  promise->complete = flag(*entries, "complete");
+  fields(reader, *promise);
   return promise;
 }
 
-Value valueOfOptions(const InstallOptionsRecord& options) {
-  auto value = Value::makeDictionary();
-  auto& entries = *value.dictionary();
-  entries.set("metadata", options.metadata);
-  setNumber(entries, "installType", options.installType);
-  setNumber(entries, "installTargetType", options.installTargetType);
-  return value;
+template <class Codec>
+void fields(Codec& codec, typename Codec::template Of<InstallOptionsRecord>& options) {
+  codec.value("metadata", options.metadata);
+  codec.number("installType", options.installType);
+  codec.number("installTargetType", options.installTargetType);
 }
 
-std::optional<InstallOptionsRecord> optionsOfValue(const Value& value) {
-  const auto* entries = value.dictionary();
-  if (!entries) return std::nullopt;
-  return InstallOptionsRecord{(*entries)["metadata"], number(*entries, "installType"),
-                              number(*entries, "installTargetType")};
+template <class Codec>
+void fields(Codec& codec, typename Codec::template Of<PlaceholderRecord>& placeholder) {
+  codec.text("name", placeholder.name);
+  codec.number("installType", placeholder.installType);
+  codec.number("client", placeholder.client);
+  codec.flag("configured", placeholder.configured);
+  codec.value("manifest", placeholder.manifest);
+  codec.text("version", placeholder.version);
+  codec.flag("launchProhibited", placeholder.launchProhibited);
+  codec.value("metadata", placeholder.metadata);
+  codec.bytes("rights", placeholder.rights);
+  codec.text("iconPath", placeholder.iconPath);
 }
 
-Value valueOfPlaceholder(const PlaceholderRecord& placeholder) {
-  auto value = Value::makeDictionary();
-  auto& entries = *value.dictionary();
-  entries.set("name", placeholder.name);
-  setNumber(entries, "installType", placeholder.installType);
-  setNumber(entries, "client", placeholder.client);
-  setFlag(entries, "configured", placeholder.configured);
-  entries.set("manifest", placeholder.manifest);
-  setText(entries, "version", placeholder.version);
-  setFlag(entries, "launchProhibited", placeholder.launchProhibited);
-  entries.set("metadata", placeholder.metadata);
-  if (!placeholder.rights.empty()) entries.set("rights", Value::makeData(placeholder.rights));
-  setText(entries, "iconPath", placeholder.iconPath);
-  return value;
+template <class Codec>
+void fields(Codec& codec, typename Codec::template Of<InstallProgressRecord>& progress) {
+  codec.always("state", progress.state);
+  codec.always("phase", progress.phase);
+  codec.flag("paused", progress.paused);
+  codec.real("fraction", progress.fraction);
 }
 
-std::optional<PlaceholderRecord> placeholderOfValue(const std::string& app, const Value& value) {
-  const auto* entries = value.dictionary();
-  if (!entries) return std::nullopt;
-  PlaceholderRecord placeholder;
-  placeholder.app = app;
-  placeholder.name = text(*entries, "name");
-  placeholder.installType = number(*entries, "installType");
-  placeholder.client = number(*entries, "client");
-  placeholder.configured = flag(*entries, "configured");
-  placeholder.manifest = (*entries)["manifest"];
-  placeholder.version = optionalText(*entries, "version");
-  placeholder.launchProhibited = flag(*entries, "launchProhibited");
-  placeholder.metadata = (*entries)["metadata"];
-  placeholder.rights = platform::Bytes((*entries)["rights"].data().value_or(""));
-  placeholder.iconPath = optionalText(*entries, "iconPath");
-  return placeholder;
+template <class Codec>
+void fields(Codec& codec, typename Codec::template Of<AppRecord>& app) {
+  codec.text("name", app.name);
+  codec.text("version", app.version);
+  codec.text("container", app.container);
+  codec.text("bundle", app.bundle);
+  codec.text("applicationType", app.applicationType);
+  codec.flag("isPlaceholder", app.isPlaceholder);
+  codec.flag("systemBundle", app.systemBundle);
+  codec.flag("launchProhibited", app.launchProhibited);
+  codec.number("installType", app.installType);
+  codec.number("staticUsage", app.staticUsage);
+  codec.number("placeholderSum", app.filesSum);
+  codec.number("homeOrder", app.homeOrder);
+  codec.record("progress", app.progress);
+}
+
+/// Without its kind and its list of promises.
+template <class Codec>
+void fields(Codec& codec, typename Codec::template Of<CoordinatorRecord>& coordinator) REQUIRES(recordsGuard) {
+  codec.always("creator", coordinator.creator);
+  codec.number("responsibleClient", coordinator.responsibleClient);
+  codec.record("options", coordinator.options);
+  codec.record("placeholder", coordinator.placeholder);
+  codec.record("appAsset", coordinator.appAsset);
+  codec.record("userData", coordinator.userData);
 }
 
 /// Nothing if any element is not an identifier.
@@ -126,112 +179,73 @@ std::optional<std::vector<std::string>> identifiers(const platform::Array& array
 }  // namespace
 
 Value valueOfApp(const AppRecord& app) {
-  auto value = Value::makeDictionary();
-  auto& entries = *value.dictionary();
-  entries.set("name", app.name);
-  setText(entries, "version", app.version);
-  entries.set("container", app.container);
-  entries.set("bundle", app.bundle);
-  entries.set("applicationType", app.applicationType);
-  setFlag(entries, "isPlaceholder", app.isPlaceholder);
-  setFlag(entries, "systemBundle", app.systemBundle);
-  setFlag(entries, "launchProhibited", app.launchProhibited);
-  setNumber(entries, "installType", app.installType);
-  setNumber(entries, "staticUsage", app.staticUsage);
-  setNumber(entries, "placeholderSum", app.filesSum);
-  setNumber(entries, "homeOrder", app.homeOrder);
-  if (app.progress) {
-    auto progress = Value::makeDictionary();
-    progress.dictionary()->set("state", app.progress->state);
-    progress.dictionary()->set("phase", app.progress->phase);
-    setFlag(*progress.dictionary(), "paused", app.progress->paused);
-    progress.dictionary()->set("fraction", app.progress->fraction);
-    entries.set("progress", progress);
-  }
-  return value;
+  Writer writer;
+  fields(writer, app);
+  return std::move(writer.written);
 }
 
 std::optional<AppRecord> appOfValue(const std::string& id, const Value& value) {
-  const auto* entries = value.dictionary();
-  if (!entries || text(*entries, "container").empty()) return std::nullopt;
+  if (!value.dictionary()) return std::nullopt;
   AppRecord app;
   app.id = id;
-  app.name = text(*entries, "name");
-  app.version = optionalText(*entries, "version");
-  app.container = text(*entries, "container");
-  app.bundle = text(*entries, "bundle");
-  app.applicationType = text(*entries, "applicationType");
-  app.isPlaceholder = flag(*entries, "isPlaceholder");
-  app.systemBundle = flag(*entries, "systemBundle");
-  app.launchProhibited = flag(*entries, "launchProhibited");
-  app.installType = number(*entries, "installType");
-  app.staticUsage = number(*entries, "staticUsage");
-  app.filesSum = number(*entries, "placeholderSum");
-  app.homeOrder = number(*entries, "homeOrder");
-  if (const auto* progress = (*entries)["progress"].dictionary()) {
-    app.progress = InstallProgressRecord{number(*progress, "state"), number(*progress, "phase"),
-                                         flag(*progress, "paused"), (*progress)["fraction"].real().value_or(0)};
-  }
+  Reader reader(*value.dictionary());
+  fields(reader, app);
+  if (app.container.empty()) return std::nullopt;
   return app;
 }
 
 Value valueOfCoordinator(const CoordinatorRecord& coordinator) {
-  auto value = Value::makeDictionary();
-  auto& entries = *value.dictionary();
-  entries.set("kind", static_cast<std::uint64_t>(coordinator.kind));
-  entries.set("creator", coordinator.creator);
-  setNumber(entries, "responsibleClient", coordinator.responsibleClient);
-  if (coordinator.options) entries.set("options", valueOfOptions(*coordinator.options));
-  if (coordinator.placeholder) entries.set("placeholder", valueOfPlaceholder(*coordinator.placeholder));
-  if (coordinator.appAsset) entries.set("appAsset", valueOfPromise(*coordinator.appAsset));
-  if (coordinator.userData) entries.set("userData", valueOfPromise(*coordinator.userData));
-  if (coordinator.hasInitialZDRAssetPromises) {
-    auto promises = Value::makeArray();
-    for (const auto& promise : coordinator.initialZDRAssetPromises) promises.array()->append(valueOfPromise(*promise));
-    entries.set("initialZDRAssetPromises", promises);
-  }
-  return value;
+  Writer writer;
+  writer.always("kind", static_cast<std::uint64_t>(coordinator.kind));
+  fields(writer, coordinator);
+  if (!coordinator.hasInitialZDRAssetPromises) return std::move(writer.written);
+  auto promises = Value::makeArray();
+  for (const auto& each : coordinator.initialZDRAssetPromises) promises.array()->append(Writer::valueOf(*each));
+  writer.value("initialZDRAssetPromises", promises);
+  return std::move(writer.written);
 }
 
 std::optional<CoordinatorRecord> coordinatorOfValue(const std::string& app, const Value& value) {
   using Kind = platform::RVCoordinatorKind;
-  const auto* entries = value.dictionary();
-  if (!entries) return std::nullopt;
-  auto kind = number(*entries, "kind");
+  if (!value.dictionary()) return std::nullopt;
+  Reader reader(*value.dictionary());
+  std::uint64_t kind = 0;
+  reader.number("kind", kind);
   if (kind == 0 || kind > static_cast<std::uint64_t>(Kind::RVRestoringDemotedAppInstallCoordinator))
     return std::nullopt;
   CoordinatorRecord coordinator;
   coordinator.app = app;
   coordinator.kind = static_cast<Kind>(kind);
-  coordinator.creator = number(*entries, "creator");
-  coordinator.responsibleClient = number(*entries, "responsibleClient");
-  coordinator.options = optionsOfValue((*entries)["options"]);
-  coordinator.placeholder = placeholderOfValue(app, (*entries)["placeholder"]);
-  coordinator.appAsset = promiseOfValue((*entries)["appAsset"]);
-  coordinator.userData = promiseOfValue((*entries)["userData"]);
-  if (const auto* promises = (*entries)["initialZDRAssetPromises"].array()) {
-    coordinator.hasInitialZDRAssetPromises = true;
-    for (const auto& each : *promises) {
-      if (auto promise = promiseOfValue(each)) coordinator.initialZDRAssetPromises.push_back(std::move(promise));
-    }
+  fields(reader, coordinator);
+  if (coordinator.placeholder) coordinator.placeholder->app = app;
+  const auto* promises = reader.entries["initialZDRAssetPromises"].array();
+  coordinator.hasInitialZDRAssetPromises = promises;
+  for (std::size_t i = 0; promises && i < promises->size(); ++i) {
+    if (auto each = Reader::promiseOf((*promises)[i])) coordinator.initialZDRAssetPromises.push_back(std::move(each));
   }
   return coordinator;
 }
 
 Value valueOfOutcome(const OutcomeRecord& outcome) {
-  auto value = Value::makeDictionary();
-  value.dictionary()->set("outcome", nameOfOutcome(outcome.outcome));
-  value.dictionary()->set("reason", outcome.reason);
-  setNumber(*value.dictionary(), "homeOrder", outcome.homeOrder);
-  return value;
+  Writer writer;
+  writer.text("outcome", std::string(nameOfOutcome(outcome.outcome)));
+  writer.text("reason", outcome.reason);
+  writer.number("homeOrder", outcome.homeOrder);
+  return std::move(writer.written);
 }
 
 std::optional<OutcomeRecord> outcomeOfValue(const Value& value) {
-  const auto* entries = value.dictionary();
-  if (!entries) return std::nullopt;
-  auto outcome = outcomeOfName(text(*entries, "outcome"));
-  if (!outcome) return std::nullopt;
-  return OutcomeRecord{*outcome, text(*entries, "reason"), number(*entries, "homeOrder")};
+  if (!value.dictionary()) return std::nullopt;
+  Reader reader(*value.dictionary());
+  std::string name;
+  OutcomeRecord outcome;
+  reader.text("outcome", name);
+  reader.text("reason", outcome.reason);
+  reader.number("homeOrder", outcome.homeOrder);
+  auto known = outcomeOfName(name);
+  if (!known) return std::nullopt;
+  outcome.outcome = *known;
+  return outcome;
 }
 
 Value valueOfLayout(const HomeLayout& layout) {

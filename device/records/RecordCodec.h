@@ -4,6 +4,7 @@
 
 #include "device/records/AppRecords.h"
 #include "device/records/CoordinatorRecord.h"
+#include "platform/ThreadSafety.h"
 #include "platform/Value.h"
 
 namespace device {

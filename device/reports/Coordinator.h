@@ -7,6 +7,7 @@
 #include "device/records/CoordinatorRecord.h"
 #include "device/records/RecordsGuard.h"
 #include "platform/RVAppInstallCoordinator.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -15,7 +15,7 @@ class CoordinatorReports::InstallObserver final : public platform::RVAppInstallO
     auto release = [this] {
       _observers.removeIf(_delegate, [this](const Registration& each) { return each.number == _number; });
     };
-    _boundary.call({"InstallCoordination", "releaseAppInstallObserver"}, nullptr, {}, release);
+    _boundary.call({{"InstallCoordination", "releaseAppInstallObserver"}}, nullptr, {}, release);
     release();
     _boundary.forgetObject(static_cast<platform::RVAppInstallObserver*>(this));
   }
@@ -53,28 +53,28 @@ void CoordinatorReports::post(const CoordinatorRef& coordinator, std::function<v
 
 void CoordinatorReports::promiseDidBeginFulfillment(const CoordinatorRef& coordinator, std::uint64_t promise) {
   post(coordinator, [this, coordinator, promise](Delegate& observer) {
-    _boundary.enter({"AppsClient", "promiseDidBeginFulfillmentWithIdentifier", coordinator->app},
+    _boundary.enter({{"AppsClient", "promiseDidBeginFulfillmentWithIdentifier"}, coordinator->app},
                     {{"identifier", promise}}, [&] { observer.promiseDidBeginFulfillmentWithIdentifier(promise); });
   });
 }
 
 void CoordinatorReports::didInstallPlaceholder(const CoordinatorRef& coordinator) {
   post(coordinator, [this, coordinator](Delegate& observer) {
-    _boundary.enter({"AppsClient", "coordinatorDidInstallPlaceholder", coordinator->app},
+    _boundary.enter({{"AppsClient", "coordinatorDidInstallPlaceholder"}, coordinator->app},
                     {{"coordinator", coordinator}}, [&] { observer.coordinatorDidInstallPlaceholder(coordinator); });
   });
 }
 
 void CoordinatorReports::didComplete(const CoordinatorRef& coordinator) {
   post(coordinator, [this, coordinator](Delegate& observer) {
-    _boundary.enter({"AppsClient", "coordinatorDidCompleteSuccessfully", coordinator->app},
+    _boundary.enter({{"AppsClient", "coordinatorDidCompleteSuccessfully"}, coordinator->app},
                     {{"coordinator", coordinator}}, [&] { observer.coordinatorDidCompleteSuccessfully(coordinator); });
   });
 }
 
 void CoordinatorReports::shouldPrioritize(const CoordinatorRef& coordinator) {
   post(coordinator, [this, coordinator](Delegate& observer) {
-    _boundary.enter({"AppsClient", "coordinatorShouldPrioritize", coordinator->app}, {{"coordinator", coordinator}},
+    _boundary.enter({{"AppsClient", "coordinatorShouldPrioritize"}, coordinator->app}, {{"coordinator", coordinator}},
                     [&] { observer.coordinatorShouldPrioritize(coordinator); });
   });
 }
@@ -82,7 +82,7 @@ void CoordinatorReports::shouldPrioritize(const CoordinatorRef& coordinator) {
 void CoordinatorReports::cancelled(const CoordinatorRef& coordinator, const platform::ErrorRef& reason,
                                    platform::RVClientIdentifier client) {
   post(coordinator, [this, coordinator, reason, client](Delegate& observer) {
-    _boundary.enter({"AppsClient", "coordinatorCanceledWithReason", coordinator->app},
+    _boundary.enter({{"AppsClient", "coordinatorCanceledWithReason"}, coordinator->app},
                     {{"coordinator", coordinator}, {"reason", reason}, {"client", client}},
                     [&] { observer.coordinatorCanceledWithReason(coordinator, reason, client); });
   });

@@ -13,6 +13,7 @@
 #include "device/records/AppRecords.h"
 #include "device/reports/Coordinator.h"
 #include "platform/RVAppInstallCoordinator.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -6,6 +6,7 @@
 #include "device/reports/Coordinator.h"
 #include "device/reports/CoordinatorReports.h"
 #include "device/reports/RegistryReports.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

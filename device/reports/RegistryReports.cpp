@@ -55,7 +55,7 @@ void RegistryReports::report(Observer& observer) {
     if (!_boundary.hasJournal()) return platform::Value();
     return _boundary.showsWhole() ? journalValue(_boundary, proxies) : journalValue(_boundary, identifiers(proxies));
   };
-  _boundary.enter({"AppsClient", "applicationInstallsArePrioritized"},
+  _boundary.enter({{"AppsClient", "applicationInstallsArePrioritized"}},
                   {{"prioritized", shown(_prioritized)},
                    {"paused", shown(_paused)},
                    CallArgument::object("observer", "observer", wholeObject(&observer))},
@@ -74,7 +74,7 @@ void RegistryReports::installCancelled(platform::OBApplicationProxyRef app) {
   _events.post(Lane::registry, [this, app = std::move(app)] {
     Proxies cancelled{app};
     _observers.deliver([&](Observer& each, const auto&) {
-      _boundary.enter({"AppsClient", "applicationInstallsDidCancel", app->applicationIdentifier.value_or("")},
+      _boundary.enter({{"AppsClient", "applicationInstallsDidCancel"}, app->applicationIdentifier.value_or("")},
                       {{"applications", identifiers(cancelled)}},
                       [&] { each.applicationInstallsDidCancel(cancelled); });
     });

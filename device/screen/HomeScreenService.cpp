@@ -22,7 +22,7 @@ constexpr int notStored = 5;
 }  // namespace
 
 platform::HomeScreen::Port HomeScreenService::PNSPanelloBlockableServerPort() {
-  return _boundary.call({className, "PNSPanelloBlockableServerPort"}, nullptr, {}, [] { return serverPort; });
+  return _boundary.call({{className, "PNSPanelloBlockableServerPort"}}, nullptr, {}, [] { return serverPort; });
 }
 
 int HomeScreenService::PNGetFlattenedIconState(Port port, int form, void** buffer, std::size_t* length) {
@@ -44,7 +44,7 @@ int HomeScreenService::PNGetFlattenedIconState(Port port, int form, void** buffe
     *length = bytes->size();
     return 0;
   };
-  return _boundary.call({className, "PNGetFlattenedIconState"}, nullptr, {{"port", port}, {"form", form}}, flattened,
+  return _boundary.call({{className, "PNGetFlattenedIconState"}}, nullptr, {{"port", port}, {"form", form}}, flattened,
                         notStored);
 }
 
@@ -57,7 +57,7 @@ int HomeScreenService::PNSetIconState(Port port, platform::BytesView layout) {
     AppRecords::Lock lock(_records);
     return _records.commit(std::move(changes)) ? 0 : notStored;
   };
-  return _boundary.call({className, "PNSetIconState"}, nullptr,
+  return _boundary.call({{className, "PNSetIconState"}}, nullptr,
                         {{"port", port}, {"layout", CallArgument::BytesCount{layout.size()}}}, set, notStored);
 }
 

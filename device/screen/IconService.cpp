@@ -1,11 +1,9 @@
 #include "device/screen/IconService.h"
 
-#include <charconv>
 #include <optional>
 #include <string>
 #include <vector>
 
-#include "device/records/Settings.h"
 #include "device/screen/IconImage.h"
 #include "plist/PropertyList.h"
 
@@ -52,12 +50,12 @@ class PNGDestination final : public platform::QGImageDestination {
   ~PNGDestination() override { _boundary.forgetObject(static_cast<platform::QGImageDestination*>(this)); }
 
   void QGImageDestinationAddImage(const std::shared_ptr<const platform::GYImage>& image) override {
-    _boundary.call({"QGImageDestination", "QGImageDestinationAddImage"}, nullptr, {{"image", image}},
+    _boundary.call({{"QGImageDestination", "QGImageDestinationAddImage"}}, nullptr, {{"image", image}},
                    [&] { _images.push_back(std::dynamic_pointer_cast<const IconImage>(image)); });
   }
 
   bool QGImageDestinationFinalize() override {
-    return _boundary.call({"QGImageDestination", "QGImageDestinationFinalize"}, nullptr, {}, [&] {
+    return _boundary.call({{"QGImageDestination", "QGImageDestinationFinalize"}}, nullptr, {}, [&] {
       // A PNG holds one image, no more and no less.
       return _images.size() == 1 && _images[0] && _images[0]->encodePNG(_data);
     });
@@ -73,15 +71,12 @@ class PNGDestination final : public platform::QGImageDestination {
 
 int IconService::iconSize() {
   AppRecords::Lock lock(_records);
-  auto text = settingOf(_records.state(), "icon-size");
-  int size = 0;
-  std::from_chars(text.data(), text.data() + text.size(), size);
-  return size;
+  return _records.state().settings.iconSize;
 }
 
 std::shared_ptr<const platform::KBURL> IconService::KBURLCreateWithFileSystemPath(std::string_view path,
                                                                                   bool isDirectory) {
-  return _boundary.call({className, "KBURLCreateWithFileSystemPath"}, nullptr,
+  return _boundary.call({{className, "KBURLCreateWithFileSystemPath"}}, nullptr,
                         {{"path", path}, {"isDirectory", isDirectory}},
                         [&]() -> std::shared_ptr<const platform::KBURL> {
                           if (path.empty() || path[0] != '/') return nullptr;
@@ -91,7 +86,7 @@ std::shared_ptr<const platform::KBURL> IconService::KBURLCreateWithFileSystemPat
 
 std::shared_ptr<const platform::KBBundle> IconService::KBBundleCreate(
     const std::shared_ptr<const platform::KBURL>& url) {
-  return _boundary.call({className, "KBBundleCreate"}, nullptr, {{"url", url}},
+  return _boundary.call({{className, "KBBundleCreate"}}, nullptr, {{"url", url}},
                         [&]() -> std::shared_ptr<const platform::KBBundle> {
                           auto ours = std::dynamic_pointer_cast<const LocalURL>(url);
                           bool isDirectory = false;
@@ -102,7 +97,7 @@ std::shared_ptr<const platform::KBBundle> IconService::KBBundleCreate(
 
 std::shared_ptr<const platform::GYImage> IconService::GYCreateDeviceAppropriateHomeScreenIconImageFromBundle(
     const std::shared_ptr<const platform::KBBundle>& bundle) {
-  return _boundary.call({className, "GYCreateDeviceAppropriateHomeScreenIconImageFromBundle"}, nullptr,
+  return _boundary.call({{className, "GYCreateDeviceAppropriateHomeScreenIconImageFromBundle"}}, nullptr,
                         {{"bundle", bundle}}, [&]() -> std::shared_ptr<const platform::GYImage> {
                           auto ours = std::dynamic_pointer_cast<const LocalBundle>(bundle);
                           auto icon = ours ? readIcon(_files, ours->directory) : std::nullopt;
@@ -113,7 +108,7 @@ std::shared_ptr<const platform::GYImage> IconService::GYCreateDeviceAppropriateH
 std::unique_ptr<platform::QGImageDestination> PNGEncoder::QGImageDestinationCreateWithData(platform::Bytes& data,
                                                                                            std::string_view type,
                                                                                            std::size_t count) {
-  return _boundary.call({"ImageEncoder", "QGImageDestinationCreateWithData"}, nullptr,
+  return _boundary.call({{"ImageEncoder", "QGImageDestinationCreateWithData"}}, nullptr,
                         {{"type", type}, {"count", count}}, [&]() -> std::unique_ptr<platform::QGImageDestination> {
                           if (type != "public.png" || count != 1) return nullptr;
                           return std::make_unique<PNGDestination>(_boundary, data);

@@ -1,24 +1,20 @@
 #pragma once
 
-#include <functional>
-#include <string>
-#include <string_view>
+#include <memory>
+#include <utility>
 
 #include "device/boundary/Boundary.h"
+#include "device/records/Settings.h"
 #include "platform/BackupService.h"
 
 namespace device {
 
-/// The backup service, from the device's settings:
-/// - "backup-placeholders": "wanted" or "declined". Not set: wanted, unless there is an error.
-/// - "backup-error": the error that comes with the answer, `CODE` or `CODE:TEXT`, in the domain "BackupService". A text
-///   that begins with no number is code 1.
+/// The backup service, from the device's settings at each call: whether it wants placeholders, and whether it reports
+/// an error, of the domain "BackupService". If only the error was set, it wants none.
 class BackupServiceLocal final : public platform::BackupService {
  public:
-  /// Empty for a setting that nobody has set. Asked at every call.
-  using Setting = std::function<std::string(std::string_view key)>;
-
-  BackupServiceLocal(Boundary& boundary, Setting setting) : _boundary(boundary), _setting(std::move(setting)) {}
+  BackupServiceLocal(Boundary& boundary, CurrentSettings settings)
+      : _boundary(boundary), _settings(std::move(settings)) {}
 
   /// The manager must not outlive the service.
   std::shared_ptr<platform::CLManager> makeBackupManager() override;
@@ -27,7 +23,7 @@ class BackupServiceLocal final : public platform::BackupService {
   class Manager;
 
   Boundary& _boundary;
-  const Setting _setting;
+  const CurrentSettings _settings;
 };
 
 }  // namespace device

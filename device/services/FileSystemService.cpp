@@ -13,6 +13,8 @@ using platform::ErrorRef;
 using platform::FileAttributes;
 using platform::Value;
 
+static constexpr const char* className = "FileSystem";
+
 static bool isQuestion(std::string_view operation) {
   return operation == "removeItem" || operation == "readFile" || operation == "attributesOfItem";
 }
@@ -29,75 +31,76 @@ void FileSystemService::tell(const char* operation, std::string_view path, const
 }
 
 template <class Body>
-auto FileSystemService::run(const char* operation, std::string_view path, ErrorRef* error, CallArguments arguments,
-                            Body&& body) {
+auto FileSystemService::run(const InjectionPoint& point, std::string_view path, ErrorRef* error,
+                            CallArguments arguments, Body&& body) {
   // The reason is needed here even if the caller does not want it.
   ErrorRef reason;
-  Crossing crossing{"FileSystem", operation};
+  Crossing crossing{point};
   crossing.answersBytes = true;
   auto result = _boundary.call(crossing, &reason, arguments, [&] { return body(&reason); });
-  if (!result) tell(operation, path, reason, isQuestion(operation));
+  if (!result) tell(point.operation(), path, reason, isQuestion(point.operation()));
   platform::setError(error, std::move(reason));
   return result;
 }
 
 bool FileSystemService::removeItem(std::string_view path, ErrorRef* error) {
-  return run("removeItem", path, error, {{"path", path}},
+  return run({className, "removeItem"}, path, error, {{"path", path}},
              [&](ErrorRef* reason) { return _files.removeItem(path, reason); });
 }
 
 bool FileSystemService::createDirectory(std::string_view path, bool withIntermediateDirectories,
                                         const Value& attributes, ErrorRef* error) {
   return run(
-      "createDirectory", path, error,
+      {className, "createDirectory"}, path, error,
       {{"path", path}, {"withIntermediateDirectories", withIntermediateDirectories}, {"attributes", attributes}},
       [&](ErrorRef* reason) { return _files.createDirectory(path, withIntermediateDirectories, attributes, reason); });
 }
 
 bool FileSystemService::moveItem(std::string_view from, std::string_view to, ErrorRef* error) {
-  return run("moveItem", from, error, {{"from", from}, {"to", to}},
+  return run({className, "moveItem"}, from, error, {{"from", from}, {"to", to}},
              [&](ErrorRef* reason) { return _files.moveItem(from, to, reason); });
 }
 
 bool FileSystemService::copyItem(std::string_view from, std::string_view to, ErrorRef* error) {
-  return run("copyItem", from, error, {{"from", from}, {"to", to}},
+  return run({className, "copyItem"}, from, error, {{"from", from}, {"to", to}},
              [&](ErrorRef* reason) { return _files.copyItem(from, to, reason); });
 }
 
 bool FileSystemService::fileExists(std::string_view path, bool* isDirectory) {
   if (isDirectory) *isDirectory = false;
-  return _boundary.call({"FileSystem", "fileExists"}, nullptr, {{"path", path}},
+  return _boundary.call({{className, "fileExists"}}, nullptr, {{"path", path}},
                         [&] { return _files.fileExists(path, isDirectory); });
 }
 
 std::optional<FileAttributes> FileSystemService::attributesOfItem(std::string_view path, ErrorRef* error) {
-  return run("attributesOfItem", path, error, {{"path", path}},
+  return run({className, "attributesOfItem"}, path, error, {{"path", path}},
              [&](ErrorRef* reason) { return _files.attributesOfItem(path, reason); });
 }
 
 bool FileSystemService::createFile(std::string_view path, BytesView contents, const Value& attributes) {
-  return run("createFile", path, nullptr,
+  return run({className, "createFile"}, path, nullptr,
              {{"path", path}, {"contents", CallArgument::BytesCount{contents.size()}}, {"attributes", attributes}},
              [&](ErrorRef* reason) { return _files.putFile(path, contents, attributes, reason); });
 }
 
 std::optional<Bytes> FileSystemService::readFile(std::string_view path, ErrorRef* error) {
-  auto bytes =
-      run("readFile", path, error, {{"path", path}}, [&](ErrorRef* reason) { return _files.readFile(path, reason); });
+  auto bytes = run({className, "readFile"}, path, error, {{"path", path}},
+                   [&](ErrorRef* reason) { return _files.readFile(path, reason); });
   if (bytes) LastRead::ofThisThread() = {std::string(path), bytes->size()};
   return bytes;
 }
 
 bool FileSystemService::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error,
                                         platform::Durability durability) {
-  return run("writeAtomically", path, error, {{"path", path}, {"contents", CallArgument::BytesCount{contents.size()}}},
+  return run({className, "writeAtomically"}, path, error,
+             {{"path", path}, {"contents", CallArgument::BytesCount{contents.size()}}},
              [&](ErrorRef* reason) { return _files.writeAtomically(path, contents, reason, durability); });
 }
 
 int FileSystemService::utimes(std::string_view path, int& errorNumber) {
   int number = 0;
   int status = _boundary.call(
-      {"FileSystem", "utimes"}, nullptr, {{"path", path}}, [&] { return _files.utimes(path, number); }, -1);
+      {{className, "utimes"}}, nullptr, {{"path", path}}, [&] { return _files.utimes(path, number); }, -1);
   if (status == 0) return status;
   errorNumber = number ? number : EIO;
   tell("utimes", path, fileError(errorNumber, path), false);

@@ -37,7 +37,7 @@ class FileSystemService final : public platform::FileSystem {
  private:
   /// Runs one operation. `body` takes the error out-parameter of the file tree.
   template <class Body>
-  auto run(const char* operation, std::string_view path, platform::ErrorRef* error, CallArguments arguments,
+  auto run(const InjectionPoint& point, std::string_view path, platform::ErrorRef* error, CallArguments arguments,
            Body&& body);
   void tell(const char* operation, std::string_view path, const platform::ErrorRef& error, bool mayBeMissing) const;
 

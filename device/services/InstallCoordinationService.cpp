@@ -26,7 +26,7 @@ std::shared_ptr<platform::RVAppInstallCoordinator> InstallCoordinationService::c
     bool* created, ErrorRef* error) {
   bool isNew = false;
   auto coordinator =
-      _boundary.call({className, "coordinatorForAppWithBundleID", bundleID}, error,
+      _boundary.call({{className, "coordinatorForAppWithBundleID"}, bundleID}, error,
                      {{"kind", nameOfKind(kind)},
                       {"bundleID", bundleID},
                       {"clientID", clientID},
@@ -41,7 +41,7 @@ std::shared_ptr<platform::RVAppInstallCoordinator> InstallCoordinationService::c
 void InstallCoordinationService::uninstallAppWithBundleID(std::string_view bundleID, bool requestUserConfirmation,
                                                           std::function<void(ErrorRef)> completion) {
   ErrorRef failure, outcome;
-  _boundary.call({className, "uninstallAppWithBundleID", bundleID}, &failure,
+  _boundary.call({{className, "uninstallAppWithBundleID"}, bundleID}, &failure,
                  {{"bundleID", bundleID}, {"requestUserConfirmation", requestUserConfirmation}}, [&] {
                    _engine.uninstall(bundleID, &outcome);
                    return true;
@@ -51,14 +51,14 @@ void InstallCoordinationService::uninstallAppWithBundleID(std::string_view bundl
   // The completion waits for the caller's next call, like everything that this call causes.
   EventQueue::InsideCall inside;
   _events.post(Lane::coordination, [this, app = std::string(bundleID), completion = std::move(completion), outcome] {
-    _boundary.enter({"AppsClient", "uninstallCompletion", app}, {{"error", outcome}}, [&] { completion(outcome); });
+    _boundary.enter({{"AppsClient", "uninstallCompletion"}, app}, {{"error", outcome}}, [&] { completion(outcome); });
   });
 }
 
 std::shared_ptr<platform::RVPromisedTransferToPath> InstallCoordinationService::makePromisedTransferToPath(
     std::string_view name, RVClientIdentifier client, std::string_view transferPath, std::uint64_t diskSpaceNeeded) {
   return _boundary.call(
-      {className, "makePromisedTransferToPath", appOfPromise(name)}, nullptr,
+      {{className, "makePromisedTransferToPath"}, appOfPromise(name)}, nullptr,
       {{"name", name}, {"client", client}, {"transferPath", transferPath}, {"diskSpaceNeeded", diskSpaceNeeded}},
       [&]() -> std::shared_ptr<platform::RVPromisedTransferToPath> {
         return std::make_shared<LocalTransferPromise>(
@@ -68,7 +68,7 @@ std::shared_ptr<platform::RVPromisedTransferToPath> InstallCoordinationService::
 
 std::shared_ptr<platform::RVPromisedTransferToPath> InstallCoordinationService::makePromisedTransferToPathWithoutPath(
     std::string_view name, RVClientIdentifier client, std::uint64_t diskSpaceNeeded) {
-  return _boundary.call({className, "makePromisedTransferToPathWithoutPath", appOfPromise(name)}, nullptr,
+  return _boundary.call({{className, "makePromisedTransferToPathWithoutPath"}, appOfPromise(name)}, nullptr,
                         {{"name", name}, {"client", client}, {"diskSpaceNeeded", diskSpaceNeeded}},
                         [&]() -> std::shared_ptr<platform::RVPromisedTransferToPath> {
                           return std::make_shared<LocalTransferPromise>(
@@ -78,7 +78,7 @@ std::shared_ptr<platform::RVPromisedTransferToPath> InstallCoordinationService::
 
 std::shared_ptr<platform::RVPromisedOutOfBandTransfer> InstallCoordinationService::makePromisedOutOfBandTransfer(
     std::string_view name, RVClientIdentifier client, std::uint64_t diskSpaceNeeded) {
-  return _boundary.call({className, "makePromisedOutOfBandTransfer", appOfPromise(name)}, nullptr,
+  return _boundary.call({{className, "makePromisedOutOfBandTransfer"}, appOfPromise(name)}, nullptr,
                         {{"name", name}, {"client", client}, {"diskSpaceNeeded", diskSpaceNeeded}},
                         [&]() -> std::shared_ptr<platform::RVPromisedOutOfBandTransfer> {
                           return std::make_shared<LocalOutOfBandPromise>(
@@ -91,7 +91,7 @@ std::shared_ptr<platform::RVPlaceholder> InstallCoordinationService::makeAppPlac
                                                                                         std::uint64_t installType,
                                                                                         RVClientIdentifier client) {
   return _boundary.call(
-      {className, "makeAppPlaceholder", bundleID}, nullptr,
+      {{className, "makeAppPlaceholder"}, bundleID}, nullptr,
       {{"bundleName", bundleName}, {"bundleID", bundleID}, {"installType", installType}, {"client", client}},
       [&]() -> std::shared_ptr<platform::RVPlaceholder> {
         if (!isAppIdentifier(bundleID)) return nullptr;
@@ -105,7 +105,7 @@ std::shared_ptr<platform::RVPlaceholder> InstallCoordinationService::makeAppPlac
 }
 
 std::shared_ptr<platform::RVPlaceholderAttributes> InstallCoordinationService::makePlaceholderAttributes() {
-  return _boundary.call({className, "makePlaceholderAttributes"}, nullptr, {},
+  return _boundary.call({{className, "makePlaceholderAttributes"}}, nullptr, {},
                         [&]() -> std::shared_ptr<platform::RVPlaceholderAttributes> {
                           return std::make_shared<LocalPlaceholderAttributes>(_boundary, platform::Value());
                         });
@@ -113,7 +113,7 @@ std::shared_ptr<platform::RVPlaceholderAttributes> InstallCoordinationService::m
 
 std::shared_ptr<platform::RVPlaceholderAttributes>
 InstallCoordinationService::makePlaceholderAttributesWithInfoPlistDictionary(const platform::Value& manifest) {
-  return _boundary.call({className, "makePlaceholderAttributesWithInfoPlistDictionary"}, nullptr,
+  return _boundary.call({{className, "makePlaceholderAttributesWithInfoPlistDictionary"}}, nullptr,
                         {{"manifest", manifest}}, [&]() -> std::shared_ptr<platform::RVPlaceholderAttributes> {
                           return std::make_shared<LocalPlaceholderAttributes>(_boundary, manifest);
                         });
@@ -125,14 +125,14 @@ std::unique_ptr<platform::RVAppInstallObserver> InstallCoordinationService::make
   std::vector<std::string> numbers;
   for (auto client : clients) numbers.push_back(std::to_string(client));
   auto alive = delegate.lock();
-  return _boundary.call({className, "makeAppInstallObserver"}, nullptr,
+  return _boundary.call({{className, "makeAppInstallObserver"}}, nullptr,
                         {{"machServiceName", machServiceName}, {"clients", numbers}, {"delegate", alive}},
                         [&] { return _reports.makeObserver(clients, delegate); });
 }
 
 ErrorRef InstallCoordinationService::RVCreateUserPresentableError(std::int64_t code, std::int64_t second,
                                                                   const ErrorRef& underlying) {
-  return _boundary.call({className, "RVCreateUserPresentableError"}, nullptr,
+  return _boundary.call({{className, "RVCreateUserPresentableError"}}, nullptr,
                         {{"code", code}, {"second", second}, {"underlying", underlying}}, [&] {
                           return platform::makeError("RVUserPresentableError", code,
                                                      underlying ? underlying->description() : std::string(),

@@ -11,7 +11,7 @@ using Lock = AppRecords::Lock;
 }  // namespace
 
 platform::Value InstallerService::CorvaneLookupUninstalled() {
-  return _boundary.call({className, "CorvaneLookupUninstalled"}, nullptr, {}, [&] {
+  return _boundary.call({{className, "CorvaneLookupUninstalled"}}, nullptr, {}, [&] {
     auto result = platform::Value::makeDictionary();
     Lock lock(_records);
     for (const auto& [app, facts] : _records.state().uninstalled) result.dictionary()->set(app, facts);
@@ -21,7 +21,7 @@ platform::Value InstallerService::CorvaneLookupUninstalled() {
 
 int InstallerService::CorvaneClearUninstalled(const std::vector<std::string>& bundleIdentifiers) {
   return _boundary.call(
-      {className, "CorvaneClearUninstalled"}, nullptr, {{"bundleIdentifiers", bundleIdentifiers}},
+      {{className, "CorvaneClearUninstalled"}}, nullptr, {{"bundleIdentifiers", bundleIdentifiers}},
       [&] {
         ChangeSet changes;
         for (const auto& app : bundleIdentifiers) changes.removeUninstalled(app);
@@ -32,7 +32,7 @@ int InstallerService::CorvaneClearUninstalled(const std::vector<std::string>& bu
 }
 
 std::shared_ptr<platform::CVStoreMetadata> InstallerService::makeStoreMetadata(const platform::Value& dictionary) {
-  return _boundary.call({className, "makeStoreMetadata"}, nullptr, {{"dictionary", dictionary}},
+  return _boundary.call({{className, "makeStoreMetadata"}}, nullptr, {{"dictionary", dictionary}},
                         [&]() -> std::shared_ptr<platform::CVStoreMetadata> {
                           if (!dictionary.dictionary()) return nullptr;
                           return std::make_shared<LocalStoreMetadata>(dictionary);
@@ -40,7 +40,7 @@ std::shared_ptr<platform::CVStoreMetadata> InstallerService::makeStoreMetadata(c
 }
 
 std::shared_ptr<platform::CVInstallOptions> InstallerService::makeInstallOptions() {
-  return _boundary.call({className, "makeInstallOptions"}, nullptr, {},
+  return _boundary.call({{className, "makeInstallOptions"}}, nullptr, {},
                         [&]() -> std::shared_ptr<platform::CVInstallOptions> {
                           return std::make_shared<LocalInstallOptions>(_boundary);
                         });

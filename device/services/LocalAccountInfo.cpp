@@ -7,17 +7,17 @@
 namespace device {
 
 void LocalAccountInfo::setVantorID(std::optional<std::string> identifier) {
-  _boundary.call({"TSMutableAccountInfo", "setVantorID"}, nullptr, {{"identifier", identifier}},
+  _boundary.call({{"TSMutableAccountInfo", "setVantorID"}}, nullptr, {{"identifier", identifier}},
                  [&] { _vantorID = std::move(identifier); });
 }
 
 void LocalAccountInfo::setDSID(platform::Value number) {
-  _boundary.call({"TSMutableAccountInfo", "setDSID"}, nullptr, {{"number", number}},
+  _boundary.call({{"TSMutableAccountInfo", "setDSID"}}, nullptr, {{"number", number}},
                  [&] { _dsid = std::move(number); });
 }
 
 void LocalAccountInfo::setAltDSID(std::optional<std::string> identifier) {
-  _boundary.call({"TSMutableAccountInfo", "setAltDSID"}, nullptr, {{"identifier", identifier}},
+  _boundary.call({{"TSMutableAccountInfo", "setAltDSID"}}, nullptr, {{"identifier", identifier}},
                  [&] { _altDSID = std::move(identifier); });
 }
 

@@ -16,26 +16,26 @@ LocalProcess::LocalProcess(Boundary& boundary, FileTree& files, std::string main
 }
 
 std::string LocalProcess::mainBundleIdentifier() {
-  return _boundary.call({"Process", "mainBundleIdentifier"}, nullptr, {}, [&] { return _mainBundleIdentifier; });
+  return _boundary.call({{"Process", "mainBundleIdentifier"}}, nullptr, {}, [&] { return _mainBundleIdentifier; });
 }
 
 std::string LocalProcess::temporaryDirectory() {
-  return _boundary.call({"Process", "temporaryDirectory"}, nullptr, {},
+  return _boundary.call({{"Process", "temporaryDirectory"}}, nullptr, {},
                         [] { return std::string(temporaryDirectoryPath); });
 }
 
 std::string LocalProcess::textOfErrorNumber(int errorNumber) {
-  return _boundary.call({"Process", "textOfErrorNumber"}, nullptr, {{"errorNumber", errorNumber}},
+  return _boundary.call({{"Process", "textOfErrorNumber"}}, nullptr, {{"errorNumber", errorNumber}},
                         [&] { return device::textOfErrorNumber(errorNumber); });
 }
 
 void LocalProcess::deallocateMemory(void* buffer, std::size_t length) {
-  _boundary.call({"Process", "deallocateMemory"}, nullptr, {{"length", length}}, [] {});
+  _boundary.call({{"Process", "deallocateMemory"}}, nullptr, {{"length", length}}, [] {});
   std::free(buffer);  // even where a fault is injected: nobody else has it any more
 }
 
 Value LocalProcess::infoDictionaryOfBundleAtPath(std::string_view path) {
-  return _boundary.call({"Process", "infoDictionaryOfBundleAtPath"}, nullptr, {{"path", path}}, [&] {
+  return _boundary.call({{"Process", "infoDictionaryOfBundleAtPath"}}, nullptr, {{"path", path}}, [&] {
     auto bytes = _files.readFile(std::string(path) + "/Info.plist");
     Value info = bytes ? plist::read(std::move(*bytes)) : Value();
     return info.dictionary() ? std::move(info) : Value();

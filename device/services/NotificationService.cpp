@@ -10,14 +10,15 @@ using platform::KBNotificationCallback;
 using platform::KBNotificationSuspensionBehavior;
 
 /// Callbacks are plain functions; the journal names the one that has a known name.
-static const char* operationOfCallback(std::string_view name) {
-  return name == platform::startupNotificationName ? "_handleTSDStartupCompletedNotification"
-                                                   : "KBNotificationCallback";
+static InjectionPoint pointOfCallback(std::string_view name) {
+  return name == platform::startupNotificationName
+             ? InjectionPoint("AppsClient", "_handleTSDStartupCompletedNotification")
+             : InjectionPoint("AppsClient", "KBNotificationCallback");
 }
 
 std::uint32_t NotificationService::notify_register_check(std::string_view name, int& token) {
   return _boundary.call(
-      {"NotificationCenter", "notify_register_check"}, nullptr, {{"name", name}},
+      {{"NotificationCenter", "notify_register_check"}}, nullptr, {{"name", name}},
       [&]() -> std::uint32_t {
         if (name.empty()) return invalidName;
         platform::Mutex::Lock lock(_mutex);
@@ -30,7 +31,7 @@ std::uint32_t NotificationService::notify_register_check(std::string_view name, 
 
 std::uint32_t NotificationService::notify_set_state(int token, std::uint64_t state) {
   return _boundary.call(
-      {"NotificationCenter", "notify_set_state"}, nullptr, {{"token", token}, {"state", state}},
+      {{"NotificationCenter", "notify_set_state"}}, nullptr, {{"token", token}, {"state", state}},
       [&]() -> std::uint32_t {
         platform::Mutex::Lock change(_changeMutex);
         std::string name;
@@ -48,7 +49,7 @@ std::uint32_t NotificationService::notify_set_state(int token, std::uint64_t sta
 
 std::uint32_t NotificationService::notify_post(std::string_view name) {
   return _boundary.call(
-      {"NotificationCenter", "notify_post"}, nullptr, {{"name", name}},
+      {{"NotificationCenter", "notify_post"}}, nullptr, {{"name", name}},
       [&]() -> std::uint32_t {
         if (name.empty()) return invalidName;
         post(name);
@@ -64,7 +65,7 @@ void NotificationService::post(std::string_view name) {
 void NotificationService::deliver(const std::string& name) {
   _observers.deliverIf([&](const Registration& registration) { return registration.name == name; },
                        [&](void* observer, const Registration& registration) {
-                         _boundary.enter({"AppsClient", operationOfCallback(name)}, {{"name", name}},
+                         _boundary.enter({pointOfCallback(name)}, {{"name", name}},
                                          [&] { registration.callback(*this, observer, name, nullptr, {}); });
                        });
 }
@@ -72,7 +73,7 @@ void NotificationService::deliver(const std::string& name) {
 void NotificationService::KBNotificationCenterAddObserver(std::weak_ptr<void> observer, KBNotificationCallback callback,
                                                           std::string_view name, const void*,
                                                           KBNotificationSuspensionBehavior suspension) {
-  _boundary.call({"NotificationCenter", "KBNotificationCenterAddObserver"}, nullptr,
+  _boundary.call({{"NotificationCenter", "KBNotificationCenterAddObserver"}}, nullptr,
                  {CallArgument::object("observer", "observer", observer.lock().get()),
                   {"name", name},
                   {"suspension", static_cast<int>(suspension)}},
@@ -82,7 +83,7 @@ void NotificationService::KBNotificationCenterAddObserver(std::weak_ptr<void> ob
 }
 
 void NotificationService::KBNotificationCenterRemoveObserver(const void* observer, std::string_view name) {
-  _boundary.call({"NotificationCenter", "KBNotificationCenterRemoveObserver"}, nullptr,
+  _boundary.call({{"NotificationCenter", "KBNotificationCenterRemoveObserver"}}, nullptr,
                  {CallArgument::object("observer", "observer", observer), {"name", name}},
                  [&] { _observers.removeIf(observer, [&](const Registration& known) { return known.name == name; }); });
   _boundary.forgetObject(observer);

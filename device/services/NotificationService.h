@@ -11,6 +11,7 @@
 #include "device/events/ObserverList.h"
 #include "platform/Mutex.h"
 #include "platform/NotificationCenter.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -16,7 +16,7 @@ Value PropertyListService::propertyListWithData(Bytes bytes, ErrorRef* error) {
   const std::size_t size = bytes.size();
   // The reason is wanted here also when the caller does not want it.
   ErrorRef reason;
-  Value value = _boundary.call({"PropertyListSerialization", "propertyListWithData"}, &reason,
+  Value value = _boundary.call({{"PropertyListSerialization", "propertyListWithData"}}, &reason,
                                {{"bytes", CallArgument::BytesCount{size}}},
                                [&] { return plist::read(std::move(bytes), &reason); });
   if (value.isAbsent() && _unreadable && !Boundary::isDeclined(reason)) {
@@ -31,7 +31,7 @@ Value PropertyListService::propertyListWithData(Bytes bytes, ErrorRef* error) {
 std::optional<Bytes> PropertyListService::dataWithPropertyList(const Value& value, PropertyListFormat format,
                                                                ErrorRef* error) {
   bool isXML = format == PropertyListFormat::xml;
-  Crossing crossing{"PropertyListSerialization", "dataWithPropertyList"};
+  Crossing crossing{{"PropertyListSerialization", "dataWithPropertyList"}};
   crossing.answersBytes = true;
   return _boundary.call(crossing, error, {{"value", value}, {"format", isXML ? "xml" : "binary"}},
                         [&] { return isXML ? plist::writeXML(value, error) : plist::writeBinary(value, error); });

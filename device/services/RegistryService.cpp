@@ -17,17 +17,17 @@ using Lock = AppRecords::Lock;
 
 void RegistryService::addObserver(std::weak_ptr<platform::OBApplicationWorkspaceObserverProtocol> observer) {
   auto alive = observer.lock();
-  _boundary.call({className, "addObserver"}, nullptr, {{"observer", alive}}, [&] { _reports.addObserver(observer); });
+  _boundary.call({{className, "addObserver"}}, nullptr, {{"observer", alive}}, [&] { _reports.addObserver(observer); });
 }
 
 void RegistryService::removeObserver(const platform::OBApplicationWorkspaceObserverProtocol* observer) {
-  _boundary.call({className, "removeObserver"}, nullptr,
+  _boundary.call({{className, "removeObserver"}}, nullptr,
                  {CallArgument::object("observer", "observer", wholeObject(observer))},
                  [&] { _reports.removeObserver(observer); });
 }
 
 bool RegistryService::applicationIsInstalled(std::string_view bundleIdentifier) {
-  return _boundary.call({className, "applicationIsInstalled", bundleIdentifier}, nullptr,
+  return _boundary.call({{className, "applicationIsInstalled"}, bundleIdentifier}, nullptr,
                         {{"bundleIdentifier", bundleIdentifier}}, [&] {
                           Lock lock(_records);
                           const auto* app = _records.state().app(bundleIdentifier);
@@ -37,7 +37,7 @@ bool RegistryService::applicationIsInstalled(std::string_view bundleIdentifier) 
 
 void RegistryService::enumerateBundlesOfType(
     std::uint64_t type, const std::function<void(const platform::OBBundleProxyRef& bundle, bool& stop)>& block) {
-  auto bundles = _boundary.call({className, "enumerateBundlesOfType"}, nullptr, {{"type", type}}, [&] {
+  auto bundles = _boundary.call({{className, "enumerateBundlesOfType"}}, nullptr, {{"type", type}}, [&] {
     std::vector<platform::OBBundleProxyRef> listed;
     Lock lock(_records);
     for (const auto& [id, app] : _records.state().apps) {
@@ -57,14 +57,14 @@ void RegistryService::enumerateBundlesOfType(
 }
 
 bool RegistryService::uninstallApplication(std::string_view bundleIdentifier) {
-  return _boundary.call({className, "uninstallApplication", bundleIdentifier}, nullptr,
+  return _boundary.call({{className, "uninstallApplication"}, bundleIdentifier}, nullptr,
                         {{"bundleIdentifier", bundleIdentifier}},
                         [&] { return _engine.uninstall(bundleIdentifier, nullptr); });
 }
 
 platform::OBApplicationProxyRef RegistryService::applicationProxyForIdentifier(std::string_view bundleIdentifier,
                                                                                bool placeholder) {
-  return _boundary.call({className, "applicationProxyForIdentifier", bundleIdentifier}, nullptr,
+  return _boundary.call({{className, "applicationProxyForIdentifier"}, bundleIdentifier}, nullptr,
                         {{"bundleIdentifier", bundleIdentifier}, {"placeholder", placeholder}},
                         [&]() -> platform::OBApplicationProxyRef {
                           Lock lock(_records);

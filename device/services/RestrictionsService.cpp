@@ -2,18 +2,17 @@
 
 namespace device {
 
-static std::string_view keyOfRestriction(std::string_view setting) {
-  if (setting == platform::DPFeatureAppInstallationAllowed) return "app-installation";
-  if (setting == platform::DPFeatureAppRemovalAllowed) return "app-removal";
-  return {};
-}
+static int numberOf(bool isAllowed) { return isAllowed ? 1 : 2; }
 
 int RestrictionsService::effectiveBoolValueForSetting(std::string_view setting) {
-  return _boundary.call({"DPProfileConnection", "effectiveBoolValueForSetting"}, nullptr, {{"setting", setting}}, [&] {
-    auto key = keyOfRestriction(setting);
-    auto value = key.empty() ? std::string() : _setting(key);
-    return value == "forbidden" ? 2 : value == "allowed" ? 1 : 0;
-  });
+  return _boundary.call({{"DPProfileConnection", "effectiveBoolValueForSetting"}}, nullptr, {{"setting", setting}},
+                        [&] {
+                          auto settings = _settings();
+                          if (setting == platform::DPFeatureAppInstallationAllowed)
+                            return numberOf(settings.allowsInstallation);
+                          if (setting == platform::DPFeatureAppRemovalAllowed) return numberOf(settings.allowsRemoval);
+                          return 0;
+                        });
 }
 
 }  // namespace device

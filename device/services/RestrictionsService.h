@@ -1,28 +1,26 @@
 #pragma once
 
-#include <functional>
-#include <string>
 #include <string_view>
+#include <utility>
 
 #include "device/boundary/Boundary.h"
+#include "device/records/Settings.h"
 #include "platform/DPProfileConnection.h"
 
 namespace device {
 
-/// The device's restrictions, from its settings "app-installation" and "app-removal".
+/// The device's restrictions, from its settings at each call.
 class RestrictionsService final : public platform::DPProfileConnection {
  public:
-  /// Empty for a setting that nobody has set.
-  using Setting = std::function<std::string(std::string_view key)>;
+  RestrictionsService(Boundary& boundary, CurrentSettings settings)
+      : _boundary(boundary), _settings(std::move(settings)) {}
 
-  RestrictionsService(Boundary& boundary, Setting setting) : _boundary(boundary), _setting(std::move(setting)) {}
-
-  /// 2 for "forbidden", 1 for "allowed", 0 for a restriction that is not set or not known.
+  /// 2 for what is forbidden, 1 for what is allowed, 0 for a restriction that is not known.
   int effectiveBoolValueForSetting(std::string_view setting) override;
 
  private:
   Boundary& _boundary;
-  const Setting _setting;
+  const CurrentSettings _settings;
 };
 
 }  // namespace device

@@ -32,11 +32,15 @@ class SystemLogService::Handle final : public LogHandle {
   const std::string _category;
 };
 
-const char* SystemLogService::nameOfLevel(LogLevel level) { return level == LogLevel::error ? "error" : "default"; }
+static InjectionPoint pointOfLevel(LogLevel level) {
+  return level == LogLevel::error ? InjectionPoint("log", "error") : InjectionPoint("log", "default");
+}
+
+const char* SystemLogService::nameOfLevel(LogLevel level) { return pointOfLevel(level).operation(); }
 
 std::shared_ptr<LogHandle> SystemLogService::createHandle(std::string_view subsystem, std::string_view category) {
   return _boundary.call(
-      {"SystemLog", "createHandle"}, nullptr, {{"subsystem", subsystem}, {"category", category}},
+      {{"SystemLog", "createHandle"}}, nullptr, {{"subsystem", subsystem}, {"category", category}},
       [&] { return makeHandle(std::string(category)); }, [&] { return makeHandle(std::string()); });
 }
 
@@ -47,7 +51,7 @@ std::shared_ptr<LogHandle> SystemLogService::makeHandle(std::string category) {
 void SystemLogService::write(LogLevel level, const std::string& category, std::string_view message) {
   std::string cut;
   if (message.size() > longestMessage) message = cut = shortened(message);
-  Crossing crossing{"log", nameOfLevel(level)};
+  Crossing crossing{pointOfLevel(level)};
   crossing.isMessage = true;
   _boundary.call(crossing, nullptr, {{"category", category}, {"text", message}}, [&] {
     if (!_listener) return;

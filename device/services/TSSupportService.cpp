@@ -14,7 +14,7 @@ platform::LogHandle& TSSupportService::TSGetLogCategory(int category) {
 }
 
 std::shared_ptr<platform::TSMutableAccountInfo> TSSupportService::makeAccountInfo() {
-  return _boundary.call({"TSSupport", "makeAccountInfo"}, nullptr, {},
+  return _boundary.call({{"TSSupport", "makeAccountInfo"}}, nullptr, {},
                         [&]() -> std::shared_ptr<platform::TSMutableAccountInfo> {
                           return std::make_shared<LocalAccountInfo>(_boundary);
                         });

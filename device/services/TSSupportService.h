@@ -7,6 +7,7 @@
 #include "device/services/SystemLogService.h"
 #include "platform/Mutex.h"
 #include "platform/TSSupport.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

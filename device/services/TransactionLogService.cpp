@@ -7,14 +7,16 @@ namespace device {
 using platform::LogHandle;
 using platform::LogLevel;
 
-static Crossing crossingOf(const char* operation, std::string_view bundleID) {
-  Crossing crossing{"InstallTransactionLog", operation, bundleID};
+static constexpr const char* className = "InstallTransactionLog";
+
+static Crossing crossingOf(const InjectionPoint& point, std::string_view bundleID) {
+  Crossing crossing{point, bundleID};
   crossing.isMessage = true;
   return crossing;
 }
 
 void TransactionLogService::initializeWithLog(std::shared_ptr<LogHandle> log) {
-  _boundary.call({"InstallTransactionLog", "initializeWithLog"}, nullptr, {{"log", log}}, [&] {
+  _boundary.call({{className, "initializeWithLog"}}, nullptr, {{"log", log}}, [&] {
     platform::Mutex::Lock lock(_mutex);
     _log = std::move(log);
   });
@@ -39,7 +41,7 @@ void TransactionLogService::write(const std::string& record, bool success, std::
 void TransactionLogService::logStep(int step, int party, int phase, bool success, std::string_view bundleID,
                                     std::string_view description) {
   _boundary.call(
-      crossingOf("logStep", bundleID), nullptr,
+      crossingOf({className, "logStep"}, bundleID), nullptr,
       {{"step", step}, {"party", party}, {"phase", phase}, {"success", success}, {"description", description}}, [&] {
         write("step " + std::to_string(step) + " party " + std::to_string(party) + " phase " + std::to_string(phase),
               success, bundleID, description);
@@ -48,7 +50,7 @@ void TransactionLogService::logStep(int step, int party, int phase, bool success
 
 void TransactionLogService::logScenario(std::string_view scenario, int step, bool success, std::string_view bundleID,
                                         std::string_view description) {
-  _boundary.call(crossingOf("logScenario", bundleID), nullptr,
+  _boundary.call(crossingOf({className, "logScenario"}, bundleID), nullptr,
                  {{"scenario", scenario}, {"step", step}, {"success", success}, {"description", description}}, [&] {
                    write("scenario \"" + std::string(scenario) + "\" step " + std::to_string(step), success, bundleID,
                          description);

@@ -6,6 +6,7 @@
 #include "device/boundary/Boundary.h"
 #include "platform/InstallTransactionLog.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -14,6 +14,7 @@
 #include "device/store/RecordList.h"
 #include "device/store/Store.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 #include "plist/PropertyList.h"
 
 namespace device {

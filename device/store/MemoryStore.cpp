@@ -1,6 +1,7 @@
 #include "device/store/RecordList.h"
 #include "device/store/Store.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -46,12 +46,14 @@ class Daemon {
 
  private:
   template <class Body>
-  auto enter(const char* operation, device::CallArguments arguments, Body&& body, std::string_view app = {}) {
-    return _device.boundary().enter({"AppsClient", operation, app}, arguments, body);
+  auto enter(const device::InjectionPoint& point, device::CallArguments arguments, Body&& body,
+             std::string_view app = {}) {
+    return _device.boundary().enter({point, app}, arguments, body);
   }
   template <class Body>
-  auto enterFallible(const char* operation, platform::ErrorRef* error, device::CallArguments arguments, Body&& body) {
-    return _device.boundary().enter({"AppsClient", operation}, error, arguments, body);
+  auto enterFallible(const device::InjectionPoint& point, platform::ErrorRef* error, device::CallArguments arguments,
+                     Body&& body) {
+    return _device.boundary().enter({point}, error, arguments, body);
   }
 
   device::LocalDevice& _device;

@@ -28,7 +28,6 @@ DeviceSession::DeviceSession(const CommandContext& context, const Setup& setup) 
 DeviceSession::~DeviceSession() {
   unloadPlugin();
   _device->events().stop();
-  tellRepeatedFailures();
   for (const auto& rule : _device->boundary().idleRules())
     _context.console.message("--inject " + rule.text + ": its turn never came");
   if (_log && _log->failed()) _context.console.message(_context.options.log + ": not every line could be written");
@@ -51,33 +50,10 @@ void DeviceSession::settle() {
   if (!_complaint.empty()) throw CommandError("not everything could be done: " + _complaint);
 }
 
-void DeviceSession::complain(std::string_view operation, std::string_view path, std::string_view reason) {
-  const std::string text = std::string(path) + ": " + std::string(operation) + " failed: " + std::string(reason);
+void DeviceSession::complain(const std::string& text) {
+  _context.console.message(text);
   platform::Mutex::Lock lock(_mutex);
-  // The plug-in copies icons alone, and installs an app without one all the same.
-  const bool isIcon = operation == "copyItem";
-  auto [failures, isFirst] = _failures.try_emplace(isIcon ? std::string(operation)
-                                                          : std::string(operation) + " failed: " + std::string(reason));
-  if (isFirst) failures->second.first = text;
-  ++failures->second.count;
-  if (isIcon) return;
-  if (isFirst) _context.console.message(text);
   if (_complaint.empty()) _complaint = text;
-}
-
-void DeviceSession::tellRepeatedFailures() {
-  platform::Mutex::Lock lock(_mutex);
-  for (const auto& [what, failures] : _failures) {
-    if (what == "copyItem") {
-      _context.console.message(std::to_string(failures.count) +
-                               (failures.count == 1 ? " icon could not be copied, and its placeholder has none: "
-                                                    : " icons could not be copied, and their placeholders have none; "
-                                                      "the first: ") +
-                               failures.first);
-    } else if (failures.count > 1) {
-      _context.console.message(what + ": " + std::to_string(failures.count) + " times in all");
-    }
-  }
 }
 
 device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
@@ -92,7 +68,7 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
     };
   }
   options.fileFailed = [this](std::string_view operation, std::string_view path, std::string_view reason) {
-    complain(operation, path, reason);
+    complain(std::string(path) + ": " + std::string(operation) + " failed: " + std::string(reason));
   };
   options.recovers = setup.use != DeviceUse::copy || !DeviceLock::holderOf(setup.folder);
   KeptRun* kept = setup.use == DeviceUse::kept ? &*_context.kept : nullptr;
@@ -123,10 +99,24 @@ platform::TSClient& DeviceSession::loadPlugin(const StopSignal& stop, CountdownC
   const auto& services = _device->platform();
   _clock.emplace(services.clock, stop, std::move(tick));
   _platform.emplace(platform::Platform{
-      services.process, *_clock, services.fileSystem, services.propertyLists, services.systemLog, services.support,
-      services.deviceService, services.installCoordination, services.workspace, services.installer, services.backup,
-      services.restrictions, services.homeScreen, services.iconRenderer, services.imageEncoder, services.transactionLog,
-      services.notifications});
+      .process = services.process,
+      .clock = *_clock,
+      .fileSystem = services.fileSystem,
+      .propertyLists = services.propertyLists,
+      .systemLog = services.systemLog,
+      .support = services.support,
+      .deviceService = services.deviceService,
+      .installCoordination = services.installCoordination,
+      .workspace = services.workspace,
+      .installer = services.installer,
+      .backup = services.backup,
+      .restrictions = services.restrictions,
+      .homeScreen = services.homeScreen,
+      .iconRenderer = services.iconRenderer,
+      .imageEncoder = services.imageEncoder,
+      .transactionLog = services.transactionLog,
+      .notifications = services.notifications,
+  });
   return makeClient(*_platform);
 }
 

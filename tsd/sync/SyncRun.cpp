@@ -223,8 +223,17 @@ void SyncRun::showOutcomes(bool always) {
 void SyncRun::fillReport() {
   showOutcomes(true);
   _report.todo = _todo;
-  const SyncFacts facts{_parts.session.device(), _parts.queue, _parts.verdicts, _wanted, _todo, _before, _assets,
-                        _reportedReasons,        whyBroken()};
+  const SyncFacts facts{
+      .device = _parts.session.device(),
+      .queue = _parts.queue,
+      .verdicts = _parts.verdicts,
+      .wanted = _wanted,
+      .todo = _todo,
+      .before = _before,
+      .assets = _assets,
+      .reportedReasons = _reportedReasons,
+      .broken = whyBroken(),
+  };
   const SyncOutcomes outcomes(facts);
   _report.apps = outcomes.all();
   _report.removed = outcomes.removed();
