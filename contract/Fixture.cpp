@@ -31,12 +31,12 @@ bool InsideCall::isOpen() { return callsOfThisThread > 0; }
 
 void Notes::add(std::string line) {
   EXPECT_FALSE(InsideCall::isOpen()) << line << ": called back before the call had returned";
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   _lines.push_back(std::move(line));
 }
 
 Lines Notes::take() {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   return std::exchange(_lines, {});
 }
 
@@ -156,15 +156,15 @@ std::string Fixture::stateOf(const std::string& app) {
 
 void Fixture::expectRemovalToWait(const std::function<void(const std::function<void()>& callback)>& arrange,
                                   const std::function<void()>& remove) {
-  std::mutex mutex;
-  std::condition_variable changed;
+  platform::Mutex mutex;
+  platform::Condition changed;
   bool entered = false, mayEnd = false;
   std::atomic<bool> ended = false;
   arrange([&] {
-    std::unique_lock lock(mutex);
+    platform::Mutex::Lock lock(mutex);
     entered = true;
-    changed.notify_all();
-    changed.wait(lock, [&] { return mayEnd; });
+    changed.notifyAll();
+    changed.wait(mutex, [&] { return mayEnd; });
     // A removal that does not wait returns by now.
     for (int i = 0; i < 1000; ++i) std::this_thread::yield();
     ended = true;
@@ -173,8 +173,8 @@ void Fixture::expectRemovalToWait(const std::function<void(const std::function<v
   registry().applicationIsInstalled(maps);
   std::thread delivery([&] { host().deliver(); });
   {
-    std::unique_lock lock(mutex);
-    changed.wait(lock, [&] { return entered; });
+    platform::Mutex::Lock lock(mutex);
+    changed.wait(mutex, [&] { return entered; });
   }
   std::promise<void> removing;
   std::thread removal([&] {
@@ -184,9 +184,9 @@ void Fixture::expectRemovalToWait(const std::function<void(const std::function<v
   });
   removing.get_future().wait();
   {
-    std::lock_guard lock(mutex);
+    platform::Mutex::Lock lock(mutex);
     mayEnd = true;
-    changed.notify_all();
+    changed.notifyAll();
   }
   removal.join();
   delivery.join();

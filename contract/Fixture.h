@@ -3,15 +3,15 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
-#include <condition_variable>
 #include <functional>
 #include <memory>
-#include <mutex>
 #include <string>
 #include <vector>
 
 #include "contract/Host.h"
+#include "platform/Condition.h"
 #include "platform/InstallCoordination.h"
+#include "platform/Mutex.h"
 #include "platform/OBApplicationWorkspace.h"
 
 namespace contract {
@@ -41,8 +41,8 @@ class Notes {
   Lines take();
 
  private:
-  std::mutex _mutex;
-  Lines _lines;  // guarded by _mutex
+  platform::Mutex _mutex;
+  Lines _lines APPSYNC_GUARDED_BY(_mutex);
 };
 
 /// Marks that this thread is inside a call of a service, where nothing may call back.

@@ -155,27 +155,26 @@ TEST_P(ServicesContract, TheRemovalOfANotificationObserverWaitsForItsCallback) {
 
 TEST_P(ServicesContract, TheClockWaitsForTheConditionOrTheDeadline) {
   auto& clock = platform().clock;
-  std::mutex mutex;
-  std::condition_variable changed;
-  std::unique_lock lock(mutex);
+  platform::Mutex mutex;
+  platform::Condition changed;
+  platform::Mutex::Lock lock(mutex);
   auto begin = clock.now();
-  EXPECT_TRUE(clock.waitUntil(lock, changed, begin, [] { return true; })) << "true already, deadline or not";
+  EXPECT_TRUE(clock.waitUntil(mutex, changed, begin, [] { return true; })) << "true already, deadline or not";
   auto deadline = clock.now() + std::chrono::milliseconds(20);
-  EXPECT_FALSE(clock.waitUntil(lock, changed, deadline, [] { return false; }));
-  EXPECT_TRUE(lock.owns_lock());
+  EXPECT_FALSE(clock.waitUntil(mutex, changed, deadline, [] { return false; }));
   EXPECT_GE(clock.now(), deadline);
   // What is delivered meanwhile may make it true.
   auto observer = std::make_shared<RecordingObserver>();
   bool reported = false;
   observer->then = [&] {
-    std::lock_guard inside(mutex);
+    platform::Mutex::Lock inside(mutex);
     reported = true;
-    changed.notify_all();
+    changed.notifyAll();
   };
   lock.unlock();
   registry().addObserver(observer);
   lock.lock();
-  EXPECT_TRUE(clock.waitUntil(lock, changed, clock.now() + std::chrono::seconds(10), [&] { return reported; }));
+  EXPECT_TRUE(clock.waitUntil(mutex, changed, clock.now() + std::chrono::seconds(10), [&] { return reported; }));
   lock.unlock();
   registry().removeObserver(observer.get());
 }

@@ -9,7 +9,7 @@ set(share_folder ${CMAKE_INSTALL_DATADIR}/applicationsync)
 install(TARGETS ApplicationSync LIBRARY DESTINATION ${plugin_folder} COMPONENT library)
 
 # The interfaces and the value types. What only the plug-in and the codec are written with stays behind.
-set(private_headers Arena Condition Message Mutex SerialQueue ThreadSafety ValueBuilder WaitGroup DateText)
+set(private_headers Arena Message SerialQueue ThreadSafety ValueBuilder WaitGroup DateText)
 list(TRANSFORM private_headers APPEND "\\.h$")
 list(JOIN private_headers "|" private_headers)
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/platform DESTINATION ${header_folder} COMPONENT development

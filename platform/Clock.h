@@ -1,9 +1,10 @@
 #pragma once
 
 #include <chrono>
-#include <condition_variable>
 #include <functional>
-#include <mutex>
+
+#include "platform/Condition.h"
+#include "platform/Mutex.h"
 
 namespace platform {
 
@@ -22,10 +23,10 @@ class Clock {
   virtual Instant now() = 0;
 
   /// Waits until `satisfied` answers true or the deadline has passed; answers what `satisfied` last said.
-  /// `lock` is held on entry and on return and whenever `satisfied` runs, and is let go in between; whoever
+  /// `mutex` is held on entry and on return and whenever `satisfied` runs, and is released in between; whoever
   /// makes the condition true notifies `changed`. No other guard may be held by the caller.
-  virtual bool waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
-                         const std::function<bool()>& satisfied) = 0;
+  virtual bool waitUntil(Mutex& mutex, Condition& changed, Instant deadline, const std::function<bool()>& satisfied)
+      APPSYNC_REQUIRES(mutex) = 0;
 };
 
 }  // namespace platform

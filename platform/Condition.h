@@ -2,10 +2,8 @@
 
 #include <chrono>
 #include <condition_variable>
-#include <functional>
 #include <mutex>
 
-#include "platform/Clock.h"
 #include "platform/Mutex.h"
 
 namespace platform {
@@ -22,20 +20,22 @@ class Condition {
   void notifyAll() { _changed.notify_all(); }
 
   template <class Satisfied>
-  void wait(Mutex& mutex, Satisfied&& satisfied) REQUIRES(mutex) {
+  void wait(Mutex& mutex, Satisfied&& satisfied) APPSYNC_REQUIRES(mutex) {
     Waiting waiting(mutex);
     _changed.wait(waiting.lock, satisfied);
   }
 
-  /// As the clock waits: answers what `satisfied` last said.
-  bool waitUntil(Mutex& mutex, Clock& clock, Clock::Instant deadline, const std::function<bool()>& satisfied)
-      REQUIRES(mutex) {
+  /// On the machine's own clock, whose time is real; whoever waits for a device waits on its `Clock`. Answers what
+  /// `satisfied` last said.
+  template <class Satisfied>
+  bool waitUntil(Mutex& mutex, std::chrono::time_point<std::chrono::steady_clock, std::chrono::nanoseconds> deadline,
+                 Satisfied&& satisfied) APPSYNC_REQUIRES(mutex) {
     Waiting waiting(mutex);
-    return clock.waitUntil(waiting.lock, _changed, deadline, satisfied);
+    return _changed.wait_until(waiting.lock, deadline, satisfied);
   }
 
   /// Until somebody notifies or the time is over on the machine's own clock; it may also end for no reason at all.
-  void waitFor(Mutex& mutex, std::chrono::nanoseconds time) REQUIRES(mutex) {
+  void waitFor(Mutex& mutex, std::chrono::nanoseconds time) APPSYNC_REQUIRES(mutex) {
     Waiting waiting(mutex);
     _changed.wait_for(waiting.lock, time);
   }

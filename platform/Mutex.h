@@ -2,33 +2,33 @@
 
 #include <mutex>
 
-#include "platform/ThreadSafety.h"
+#include "platform/ThreadAttributes.h"
 
 namespace platform {
 
 class Condition;
 
 /// A mutex that clang's analysis knows. For short blocks; never held while another component is called back.
-class CAPABILITY("mutex") Mutex {
+class APPSYNC_CAPABILITY("mutex") Mutex {
  public:
-  void lock() ACQUIRE() { _mutex.lock(); }
-  void unlock() RELEASE() { _mutex.unlock(); }
+  void lock() APPSYNC_ACQUIRE() { _mutex.lock(); }
+  void unlock() APPSYNC_RELEASE() { _mutex.unlock(); }
 
   /// Holds the mutex for a scope, which may let it go for a while.
-  class SCOPED_CAPABILITY Lock {
+  class APPSYNC_SCOPED_CAPABILITY Lock {
    public:
-    explicit Lock(Mutex& mutex) ACQUIRE(mutex) : _mutex(mutex) { _mutex.lock(); }
-    ~Lock() RELEASE() {
+    explicit Lock(Mutex& mutex) APPSYNC_ACQUIRE(mutex) : _mutex(mutex) { _mutex.lock(); }
+    ~Lock() APPSYNC_RELEASE() {
       if (_held) _mutex.unlock();
     }
     Lock(const Lock&) = delete;
     Lock& operator=(const Lock&) = delete;
 
-    void unlock() RELEASE() {
+    void unlock() APPSYNC_RELEASE() {
       _held = false;
       _mutex.unlock();
     }
-    void lock() ACQUIRE() {
+    void lock() APPSYNC_ACQUIRE() {
       _mutex.lock();
       _held = true;
     }

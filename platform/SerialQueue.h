@@ -1,10 +1,10 @@
 #pragma once
 
 #include <atomic>
-#include <mutex>
 #include <string>
 #include <thread>
 
+#include "platform/Mutex.h"
 #include "platform/ThreadSafety.h"
 
 namespace platform {
@@ -41,7 +41,7 @@ class CAPABILITY("queue") SerialQueue {
   void leave() RELEASE();
 
   const std::string _label;
-  std::mutex _mutex;
+  Mutex _mutex;
   std::atomic<std::thread::id> _running;
 };
 

@@ -21,7 +21,7 @@ void WaitGroup::leave() {
 
 bool WaitGroup::wait(Clock& clock, Clock::Instant deadline) {
   Mutex::Lock lock(_mutex);
-  return _changed.waitUntil(_mutex, clock, deadline, [this]() REQUIRES(_mutex) { return _entered == 0; });
+  return clock.waitUntil(_mutex, _changed, deadline, [this]() REQUIRES(_mutex) { return _entered == 0; });
 }
 
 void Semaphore::signal() {
@@ -32,7 +32,7 @@ void Semaphore::signal() {
 
 bool Semaphore::wait(Clock& clock, Clock::Instant deadline) {
   Mutex::Lock lock(_mutex);
-  if (!_changed.waitUntil(_mutex, clock, deadline, [this]() REQUIRES(_mutex) { return _count > 0; })) return false;
+  if (!clock.waitUntil(_mutex, _changed, deadline, [this]() REQUIRES(_mutex) { return _count > 0; })) return false;
   --_count;
   return true;
 }

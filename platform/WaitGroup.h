@@ -5,6 +5,7 @@
 #include "platform/Clock.h"
 #include "platform/Condition.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace platform {
 

@@ -1,15 +1,15 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
-#include <condition_variable>
 #include <future>
-#include <mutex>
 #include <thread>
 
 #include "device/boundary/Boundary.h"
 #include "device/events/EventQueue.h"
 #include "device/events/ObserverList.h"
 #include "device/services/NotificationService.h"
+#include "platform/Condition.h"
+#include "platform/Mutex.h"
 
 namespace {
 
@@ -26,20 +26,20 @@ TEST(ManualEventQueue, letsTimePassOnlyWhenNothingElseHappens) {
   auto queue = makeManualEventQueue();
   auto& clock = queue->clock();
   auto start = clock.now();
-  std::mutex mutex;
-  std::condition_variable changed;
-  std::unique_lock lock(mutex);
+  platform::Mutex mutex;
+  platform::Condition changed;
+  platform::Mutex::Lock lock(mutex);
   int events = 0;
   auto event = [&] {
-    std::lock_guard inside(mutex);  // free while an event runs
+    platform::Mutex::Lock inside(mutex);  // free while an event runs
     ++events;
   };
   for (int i = 0; i < 3; ++i) queue->post(Lane::registry, event);
-  EXPECT_TRUE(clock.waitUntil(lock, changed, start + 5min, [&] { return events == 2; }));
+  EXPECT_TRUE(clock.waitUntil(mutex, changed, start + 5min, [&] { return events == 2; }));
   EXPECT_EQ(clock.now(), start);
-  EXPECT_FALSE(clock.waitUntil(lock, changed, start, [] { return false; }));
+  EXPECT_FALSE(clock.waitUntil(mutex, changed, start, [] { return false; }));
   EXPECT_EQ(events, 2) << "no time, no events";
-  EXPECT_FALSE(clock.waitUntil(lock, changed, start + 5min, [] { return false; }));
+  EXPECT_FALSE(clock.waitUntil(mutex, changed, start + 5min, [] { return false; }));
   EXPECT_EQ(events, 3);
   EXPECT_EQ(clock.now(), start + 5min);
   lock.unlock();
@@ -49,8 +49,8 @@ TEST(ManualEventQueue, letsTimePassOnlyWhenNothingElseHappens) {
   queue->post(Lane::registry, [&] {
     queue->post(Lane::registry, [&] { order += "r"; });
     queue->post(Lane::coordination, [&] { order += "c"; });
-    std::unique_lock inside(mutex);
-    EXPECT_FALSE(clock.waitUntil(inside, changed, clock.now() + 1s, [] { return false; }));
+    platform::Mutex::Lock inside(mutex);
+    EXPECT_FALSE(clock.waitUntil(mutex, changed, clock.now() + 1s, [] { return false; }));
     order += "w";
   });
   queue->deliverAll();
@@ -97,15 +97,15 @@ TEST(HeldEvents, areLetGoByTheNextCallButNotByAMessage) {
 TEST(ThreadedEventQueue, holdsBackWhatACallCaused) {
   auto queue = makeThreadedEventQueue();
   Boundary boundary;
-  std::mutex mutex;
-  std::condition_variable changed;
+  platform::Mutex mutex;
+  platform::Condition changed;
   std::string order;
   auto event = [&](const char* text) {
     return [&, text] {
-      std::lock_guard lock(mutex);
+      platform::Mutex::Lock lock(mutex);
       order += text;
       order += currentThreadName()[0];
-      changed.notify_all();
+      changed.notifyAll();
     };
   };
   postInCall(boundary, *queue, Lane::coordination, event("held "));
@@ -113,9 +113,9 @@ TEST(ThreadedEventQueue, holdsBackWhatACallCaused) {
   std::thread([&] { queue->post(Lane::coordination, [&] { passed.set_value(); }); }).join();
   passed.get_future().wait();
   {
-    std::unique_lock lock(mutex);
+    platform::Mutex::Lock lock(mutex);
     EXPECT_EQ(order, "") << "an event posted later on the same lane went first";
-    EXPECT_TRUE(queue->clock().waitUntil(lock, changed, queue->clock().now() + 1min, [&] { return !order.empty(); }));
+    EXPECT_TRUE(queue->clock().waitUntil(mutex, changed, queue->clock().now() + 1min, [&] { return !order.empty(); }));
   }
   postInCall(boundary, *queue, Lane::registry, event(" then "));
   queue->drain();
@@ -233,16 +233,16 @@ TEST(ManualEventQueue, servesSeveralThreads) {
   std::vector<std::thread> threads;
   for (int i = 0; i < 4; ++i) {
     threads.emplace_back([&, i] {
-      std::mutex mutex;
-      std::condition_variable changed;
+      platform::Mutex mutex;
+      platform::Condition changed;
       for (int n = 0; n < 100; ++n) {
         queue->post(Lane::registry, [&] {
           EXPECT_FALSE(inRegistry.exchange(true)) << "two events of one lane at once";
           ++ran;
           inRegistry = false;
         });
-        std::unique_lock lock(mutex);
-        if (i % 2) queue->clock().waitUntil(lock, changed, queue->clock().now() + 1s, [&] { return n % 3 == 0; });
+        platform::Mutex::Lock lock(mutex);
+        if (i % 2) queue->clock().waitUntil(mutex, changed, queue->clock().now() + 1s, [&] { return n % 3 == 0; });
       }
       queue->drain();
     });

@@ -42,28 +42,28 @@ const Bytes& iconImage() {
 }
 
 void DaemonTransfers::prioritizeAsset(const TSAssetRef& asset, std::function<void(ErrorRef)> completion) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   _prioritized.push_back(asset->identifier());
   _completions.push_back(std::move(completion));
 }
 
 void DaemonTransfers::cancelAssetTransferForFailedAsset(const TSAssetRef& asset) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   _cancelled.push_back(asset->identifier());
 }
 
 std::vector<std::string> DaemonTransfers::prioritized() const {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   return _prioritized;
 }
 
 bool DaemonTransfers::wasCancelled(const std::string& identifier) const {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   return std::count(_cancelled.begin(), _cancelled.end(), identifier) != 0;
 }
 
 void DaemonTransfers::forget() {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   _prioritized.clear();
   _cancelled.clear();
 }
@@ -71,7 +71,7 @@ void DaemonTransfers::forget() {
 bool DaemonTransfers::complete() {
   std::vector<std::function<void(ErrorRef)>> completions;
   {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     completions.swap(_completions);
   }
   for (auto& completion : completions) completion(nullptr);

@@ -3,15 +3,16 @@
 #include <fstream>
 #include <functional>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "device/LocalDevice.h"
+#include "platform/Mutex.h"
 #include "platform/TSClient.h"
 #include "platform/TSDeviceService.h"
+#include "platform/ThreadSafety.h"
 #include "tests/SampleContent.h"
 #include "tests/SharedParts.h"
 #include "tsd/daemon/Daemon.h"
@@ -64,10 +65,10 @@ class DaemonTransfers final : public platform::TSDeviceService {
 
  private:
   device::LocalDevice* _device = nullptr;
-  mutable std::mutex _mutex;
-  std::vector<std::string> _prioritized;
-  std::vector<std::string> _cancelled;
-  std::vector<std::function<void(ErrorRef)>> _completions;
+  mutable platform::Mutex _mutex;
+  std::vector<std::string> _prioritized GUARDED_BY(_mutex);
+  std::vector<std::string> _cancelled GUARDED_BY(_mutex);
+  std::vector<std::function<void(ErrorRef)>> _completions GUARDED_BY(_mutex);
 };
 
 /// The plug-in, loaded from its library, on a device in memory, with a daemon around it that calls it and writes down

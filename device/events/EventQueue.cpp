@@ -3,6 +3,7 @@
 #include <utility>
 
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

@@ -1,6 +1,5 @@
 #include <algorithm>
 #include <array>
-#include <condition_variable>
 #include <deque>
 #include <optional>
 #include <utility>
@@ -8,6 +7,7 @@
 #include "device/events/EventQueue.h"
 #include "platform/Condition.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 
@@ -116,15 +116,15 @@ class HandDrivenQueue final : public ManualEventQueue {
       return _queue._now;
     }
 
-    bool waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable&, Instant deadline,
-                   const std::function<bool()>& satisfied) override {
+    bool waitUntil(platform::Mutex& mutex, platform::Condition&, Instant deadline,
+                   const std::function<bool()>& satisfied) override REQUIRES(mutex) {
       release();
       Waiting waiting(_queue);
       while (!satisfied()) {
         if (now() >= deadline) return false;
-        lock.unlock();
+        mutex.unlock();
         _queue.proceed(deadline);
-        lock.lock();
+        mutex.lock();
       }
       return true;
     }

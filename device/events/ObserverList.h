@@ -10,6 +10,7 @@
 
 #include "platform/Condition.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 

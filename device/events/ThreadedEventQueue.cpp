@@ -1,5 +1,4 @@
 #include <array>
-#include <condition_variable>
 #include <deque>
 #include <thread>
 #include <utility>
@@ -7,6 +6,7 @@
 #include "device/events/EventQueue.h"
 #include "platform/Condition.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace device {
 
@@ -19,10 +19,10 @@ class SystemClock final : public platform::Clock {
  public:
   Instant now() override { return std::chrono::steady_clock::now(); }
 
-  bool waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
-                 const std::function<bool()>& satisfied) override {
+  bool waitUntil(platform::Mutex& mutex, platform::Condition& changed, Instant deadline,
+                 const std::function<bool()>& satisfied) override REQUIRES(mutex) {
     EventQueue::release();
-    return changed.wait_until(lock, deadline, satisfied);
+    return changed.waitUntil(mutex, deadline, satisfied);
   }
 };
 

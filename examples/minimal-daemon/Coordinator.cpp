@@ -13,7 +13,7 @@ bool Coordinator::mayChange(bool possible, const char* problem, ErrorRef* error)
 }
 
 bool Coordinator::end(ErrorRef failure) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   if (_hasEnded) return false;
   _hasEnded = true;
   _failure = std::move(failure);
@@ -21,27 +21,27 @@ bool Coordinator::end(ErrorRef failure) {
 }
 
 std::weak_ptr<platform::RVAppInstallObserverDelegate> Coordinator::observer() {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   return _observer;
 }
 
 std::shared_ptr<FilePromise> Coordinator::package() {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   return _package;
 }
 
 ErrorRef Coordinator::error() {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   return _failure;
 }
 
 void Coordinator::setObserver(std::weak_ptr<platform::RVAppInstallObserverDelegate> observer) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   _observer = std::move(observer);
 }
 
 std::shared_ptr<platform::RVPromisedTransferToPath> Coordinator::appAssetPromiseWithError(ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   platform::setError(error, _package ? nullptr : platform::makeError("TinyInstalls", 3, app + ": no package promised"));
   return _package;
 }
@@ -50,7 +50,7 @@ bool Coordinator::setAppAssetPromise(const std::shared_ptr<platform::RVPromisedT
                                      ErrorRef* error) {
   auto ours = std::dynamic_pointer_cast<FilePromise>(promise);
   {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     if (!mayChange(ours && !_package, "no promise, or a second one", error)) return false;
     _package = ours;
   }
@@ -67,9 +67,9 @@ bool Coordinator::setAppAssetPromise(const std::shared_ptr<platform::RVPromisedT
 
 bool Coordinator::setPlaceholderPromise(const std::shared_ptr<platform::RVPlaceholder>& placeholder, ErrorRef* error) {
   auto ours = std::dynamic_pointer_cast<Placeholder>(placeholder);
-  auto changing = _service.changing();
+  platform::Mutex::Lock changing(_service.changes());
   {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     bool isGood = ours && ours->app == app && !ours->isCancelled() && !_placeholder;
     if (!mayChange(isGood, "no placeholder of this app, or a second one", error)) return false;
     _placeholder = ours;
@@ -80,7 +80,7 @@ bool Coordinator::setPlaceholderPromise(const std::shared_ptr<platform::RVPlaceh
 
 bool Coordinator::setUserDataPromise(const std::shared_ptr<platform::RVPromisedOutOfBandTransfer>& promise,
                                      ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   if (!mayChange(promise != nullptr, "no promise", error)) return false;
   _userData = promise;
   return true;
@@ -88,14 +88,14 @@ bool Coordinator::setUserDataPromise(const std::shared_ptr<platform::RVPromisedO
 
 bool Coordinator::setInitialZDRAssetPromises(const std::vector<std::shared_ptr<platform::RVPromise>>&,
                                              ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   if (!mayChange(true, "", error)) return false;
   _hasInitialPromises = true;
   return true;
 }
 
 bool Coordinator::setInstallOptions(const std::shared_ptr<platform::CVInstallOptions>& options, ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   if (!mayChange(options != nullptr, "no options", error)) return false;
   _hasOptions = true;
   return true;
@@ -103,12 +103,12 @@ bool Coordinator::setInstallOptions(const std::shared_ptr<platform::CVInstallOpt
 
 Coordinator::Client Coordinator::appAssetPromiseResponsibleClientWithError(ErrorRef* error) {
   platform::setError(error, nullptr);
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   return _responsible;
 }
 
 bool Coordinator::setAppAssetPromiseResponsibleClient(Client client, ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   if (!mayChange(true, "", error)) return false;
   _responsible = client;
   return true;

@@ -1,12 +1,12 @@
 #pragma once
 
 #include <memory>
-#include <mutex>
 #include <string>
 
 #include "Placeholder.h"
 #include "Promise.h"
 #include "platform/InstallCoordination.h"
+#include "platform/Mutex.h"
 
 namespace tiny {
 
@@ -55,7 +55,7 @@ class Coordinator final : public platform::RVAppInstallCoordinator, public std::
  private:
   template <class Field>
   bool has(const Field& field) {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     return static_cast<bool>(field);
   }
   /// Success when `possible` and it has not ended; to be asked with _mutex held.
@@ -63,7 +63,7 @@ class Coordinator final : public platform::RVAppInstallCoordinator, public std::
 
   InstallService& _service;
   const Client _client;
-  std::mutex _mutex;
+  platform::Mutex _mutex;
   // Guarded by _mutex.
   std::weak_ptr<platform::RVAppInstallObserverDelegate> _observer;
   std::shared_ptr<FilePromise> _package;

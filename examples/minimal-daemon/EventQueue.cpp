@@ -5,20 +5,22 @@
 namespace tiny {
 
 void EventQueue::post(std::function<void()> event) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   _events.push_back(std::move(event));
 }
 
 bool EventQueue::deliverNext() {
-  std::lock_guard one(_delivering);
+  NoneRuns one(*this);
   std::function<void()> event;
   {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     if (_events.empty()) return false;
     event = std::move(_events.front());
     _events.pop_front();
   }
+  auto outer = _deliverer.exchange(std::this_thread::get_id());
   event();
+  _deliverer = outer;
   return true;
 }
 
@@ -27,15 +29,15 @@ void EventQueue::deliver() {
   }
 }
 
-bool EventQueue::waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
+bool EventQueue::waitUntil(platform::Mutex& mutex, platform::Condition& changed, Instant deadline,
                            const std::function<bool()>& satisfied) {
   // Another thread may post while this one sleeps, so it never sleeps for long.
   constexpr std::chrono::milliseconds nap(5);
   while (!satisfied() && now() < deadline) {
-    lock.unlock();
+    mutex.unlock();
     bool delivered = deliverNext();
-    lock.lock();
-    if (!delivered && !satisfied()) changed.wait_until(lock, std::min(deadline, now() + nap));
+    mutex.lock();
+    if (!delivered) changed.waitUntil(mutex, std::min<Instant>(deadline, now() + nap), satisfied);
   }
   return satisfied();
 }

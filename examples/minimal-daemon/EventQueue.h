@@ -1,11 +1,13 @@
 #pragma once
 
-#include <condition_variable>
+#include <atomic>
 #include <deque>
 #include <functional>
-#include <mutex>
+#include <optional>
+#include <thread>
 
 #include "platform/Clock.h"
+#include "platform/Mutex.h"
 
 namespace tiny {
 
@@ -17,18 +19,27 @@ class EventQueue final : public platform::Clock {
   /// Runs what was posted, and what that posts.
   void deliver();
 
-  /// Held while an event runs. Whoever takes it knows that no callback runs; an event may take it again.
-  std::recursive_mutex& delivering() { return _delivering; }
+  /// While it lives no callback runs, but for the one that made it.
+  class NoneRuns {
+   public:
+    explicit NoneRuns(EventQueue& queue) {
+      if (queue._deliverer != std::this_thread::get_id()) _lock.emplace(queue._delivering);
+    }
+
+   private:
+    std::optional<platform::Mutex::Lock> _lock;
+  };
 
   Instant now() override { return std::chrono::steady_clock::now(); }
-  bool waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
-                 const std::function<bool()>& satisfied) override;
+  bool waitUntil(platform::Mutex& mutex, platform::Condition& changed, Instant deadline,
+                 const std::function<bool()>& satisfied) override APPSYNC_REQUIRES(mutex);
 
  private:
   bool deliverNext();
 
-  std::recursive_mutex _delivering;
-  std::mutex _mutex;
+  platform::Mutex _delivering;
+  std::atomic<std::thread::id> _deliverer;  // the thread on which an event runs
+  platform::Mutex _mutex;
   std::deque<std::function<void()>> _events;  // guarded by _mutex
 };
 

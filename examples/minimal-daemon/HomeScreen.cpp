@@ -29,7 +29,7 @@ bool flatten(const Value& item, Value& order, bool mayBePage) {
 int HomeScreen::PNGetFlattenedIconState(Port, int, void** buffer, std::size_t* length) {
   *buffer = nullptr;
   *length = 0;
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   if (_order.array()->empty()) return 0;
   auto bytes = plist::writeXML(_order);
   if (!bytes) return 1;
@@ -47,7 +47,7 @@ int HomeScreen::PNSetIconState(Port, platform::BytesView layout) {
   for (const Value& page : *pages.array()) {
     if (!flatten(page, order, true)) return 1;
   }
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   _order = std::move(order);
   return 0;
 }

@@ -1,9 +1,9 @@
 #pragma once
 
-#include <mutex>
 #include <string>
 
 #include "platform/HomeScreen.h"
+#include "platform/Mutex.h"
 
 namespace tiny {
 
@@ -15,7 +15,7 @@ class HomeScreen final : public platform::HomeScreen {
   int PNSetIconState(Port port, platform::BytesView layout) override;
 
  private:
-  std::mutex _mutex;
+  platform::Mutex _mutex;
   platform::Value _order = platform::Value::makeArray();  // identifiers; guarded by _mutex
 };
 

@@ -34,11 +34,11 @@ class InstallService::ObserverHandle final : public platform::RVAppInstallObserv
       : _service(service), _registration(std::move(registration)) {}
   ~ObserverHandle() override {
     {
-      std::lock_guard lock(_service._mutex);
+      platform::Mutex::Lock lock(_service._mutex);
       auto& all = _service._registrations;
       all.erase(std::remove(all.begin(), all.end(), _registration), all.end());
     }
-    std::lock_guard noneRuns(_service._queue.delivering());
+    EventQueue::NoneRuns noneRuns(_service._queue);
   }
 
  private:
@@ -56,7 +56,7 @@ void InstallService::tell(const std::shared_ptr<Coordinator>& coordinator, std::
     if (auto observer = coordinator->observer().lock()) return callback(*observer);
     std::vector<std::shared_ptr<Delegate>> delegates;
     {
-      std::lock_guard lock(_mutex);
+      platform::Mutex::Lock lock(_mutex);
       for (const auto& each : _registrations) {
         bool isMeant = std::count(each->clients.begin(), each->clients.end(), coordinator->creatorIdentifier()) > 0;
         if (auto delegate = isMeant ? each->delegate.lock() : nullptr) delegates.push_back(delegate);
@@ -91,7 +91,7 @@ void InstallService::packageBegan(const std::shared_ptr<Coordinator>& coordinato
 }
 
 void InstallService::packageArrived(const std::shared_ptr<Coordinator>& coordinator) {
-  auto lock = changing();
+  platform::Mutex::Lock changing(_changes);
   if (auto known = _registry.find(coordinator->app)) {
     OBApplicationProxy shown = *known;
     shown.installProgressSync = platform::OBInstallProgress{active, installing};
@@ -130,7 +130,7 @@ ErrorRef InstallService::unpack(Coordinator& coordinator) {
 }
 
 void InstallService::install(const std::shared_ptr<Coordinator>& coordinator) {
-  auto lock = changing();
+  platform::Mutex::Lock changing(_changes);
   if (openCoordinator(coordinator->app) != coordinator) return;  // cancelled meanwhile
   ErrorRef failure = unpack(*coordinator);
   if (!coordinator->end(failure)) return;
@@ -141,13 +141,13 @@ void InstallService::install(const std::shared_ptr<Coordinator>& coordinator) {
 }
 
 std::shared_ptr<Coordinator> InstallService::openCoordinator(std::string_view app) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   auto open = _open.find(app);
   return open == _open.end() ? nullptr : open->second;
 }
 
 void InstallService::forget(const Coordinator& coordinator) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   auto open = _open.find(coordinator.app);
   if (open != _open.end() && open->second.get() == &coordinator) _open.erase(open);
 }
@@ -163,7 +163,7 @@ void InstallService::showNothingOfInstall(const std::string& app) {
 }
 
 bool InstallService::cancel(const std::shared_ptr<Coordinator>& coordinator, const ErrorRef& reason, Client client) {
-  auto lock = changing();
+  platform::Mutex::Lock changing(_changes);
   return endByCancelling(coordinator, reason, client);
 }
 
@@ -192,7 +192,7 @@ std::shared_ptr<platform::RVAppInstallCoordinator> InstallService::coordinatorFo
   };
   if (created) *created = false;
   platform::setError(error, nullptr);
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   auto open = _open.find(bundleID);
   if (open != _open.end()) {
     bool isMeant = kind == Kind::RVAppInstallCoordinator || kind == open->second->kind;
@@ -212,7 +212,7 @@ std::shared_ptr<platform::RVAppInstallCoordinator> InstallService::coordinatorFo
 
 bool InstallService::uninstall(std::string_view id) {
   std::string app(id);
-  auto lock = changing();
+  platform::Mutex::Lock changing(_changes);
   if (!_registry.find(app)) return false;
   if (auto coordinator = openCoordinator(app)) endByCancelling(coordinator, nullptr, 0);
   _registry.remove(app);
@@ -261,7 +261,7 @@ std::shared_ptr<platform::RVPlaceholderAttributes> InstallService::makePlacehold
 std::unique_ptr<platform::RVAppInstallObserver> InstallService::makeAppInstallObserver(
     std::string_view, const std::vector<Client>& clients, std::weak_ptr<Delegate> delegate) {
   auto registration = std::make_shared<Registration>(Registration{clients, std::move(delegate)});
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   _registrations.push_back(registration);
   return std::make_unique<ObserverHandle>(*this, std::move(registration));
 }

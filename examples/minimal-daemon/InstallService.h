@@ -2,7 +2,6 @@
 
 #include <functional>
 #include <map>
-#include <mutex>
 #include <string>
 #include <vector>
 
@@ -12,6 +11,7 @@
 #include "MemoryFiles.h"
 #include "Registry.h"
 #include "platform/InstallCoordination.h"
+#include "platform/Mutex.h"
 
 namespace tiny {
 
@@ -24,9 +24,9 @@ class InstallService final : public platform::InstallCoordination {
   InstallService(EventQueue& queue, MemoryFiles& files, Registry& registry, InstallerService& installer);
 
   /// Held over a change of an install and of what the registry shows of it, so that the two agree.
-  std::unique_lock<std::mutex> changing() { return std::unique_lock(_changes); }
+  platform::Mutex& changes() { return _changes; }
 
-  // What coordinators tell; of a placeholder while they hold `changing()`.
+  // What coordinators tell; of a placeholder while they hold `changes()`.
   void placeholderAttached(const std::shared_ptr<Coordinator>& coordinator, Placeholder& placeholder);
   void packageBegan(const std::shared_ptr<Coordinator>& coordinator);
   void packageArrived(const std::shared_ptr<Coordinator>& coordinator);
@@ -78,8 +78,8 @@ class InstallService final : public platform::InstallCoordination {
   MemoryFiles& _files;
   Registry& _registry;
   InstallerService& _installer;
-  std::mutex _changes;  // before _mutex
-  std::mutex _mutex;
+  platform::Mutex _changes;  // before _mutex
+  platform::Mutex _mutex;
   // Guarded by _mutex.
   std::map<std::string, std::shared_ptr<Coordinator>, std::less<>> _open;
   std::vector<std::shared_ptr<Registration>> _registrations;

@@ -1,10 +1,10 @@
 #pragma once
 
-#include <mutex>
 #include <string>
 #include <vector>
 
 #include "platform/Installer.h"
+#include "platform/Mutex.h"
 
 namespace tiny {
 
@@ -12,17 +12,17 @@ namespace tiny {
 class InstallerService final : public platform::Installer {
  public:
   void note(const std::string& app) {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     _uninstalled.dictionary()->set(app, platform::Value::makeDictionary());
   }
   void forget(const std::string& app) { CorvaneClearUninstalled({app}); }
 
   platform::Value CorvaneLookupUninstalled() override {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     return _uninstalled;
   }
   int CorvaneClearUninstalled(const std::vector<std::string>& bundleIdentifiers) override {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     for (const auto& app : bundleIdentifiers) _uninstalled.dictionary()->remove(app);
     return 0;
   }
@@ -42,7 +42,7 @@ class InstallerService final : public platform::Installer {
     std::string describe() const override { return "<install options>"; }
   };
 
-  std::mutex _mutex;
+  platform::Mutex _mutex;
   platform::Value _uninstalled = platform::Value::makeDictionary();  // guarded by _mutex
 };
 

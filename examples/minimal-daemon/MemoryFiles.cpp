@@ -44,7 +44,7 @@ int MemoryFiles::checkPlace(std::string_view path) const {
 }
 
 bool MemoryFiles::removeItem(std::string_view path, ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   auto found = _items.find(path);
   if (found == _items.end()) return answer(ENOENT, path, error);
   _items.erase(found);
@@ -56,7 +56,7 @@ bool MemoryFiles::removeItem(std::string_view path, ErrorRef* error) {
 
 bool MemoryFiles::createDirectory(std::string_view path, bool withIntermediateDirectories, const platform::Value&,
                                   ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   if (!isAbsolute(path)) return answer(EINVAL, path, error);
   if (const Item* there = find(path)) {
     return answer(there->isDirectory && withIntermediateDirectories ? 0 : EEXIST, path, error);
@@ -79,7 +79,7 @@ bool MemoryFiles::createDirectory(std::string_view path, bool withIntermediateDi
 }
 
 bool MemoryFiles::moveItem(std::string_view from, std::string_view to, ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   if (!find(from) || from.empty()) return answer(ENOENT, from, error);
   if (find(to)) return answer(EEXIST, to, error);
   if (isBelow(to, from)) return answer(EINVAL, to, error);
@@ -99,7 +99,7 @@ bool MemoryFiles::moveItem(std::string_view from, std::string_view to, ErrorRef*
 }
 
 bool MemoryFiles::copyItem(std::string_view from, std::string_view to, ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   const Item* source = find(from);
   if (!source) return answer(ENOENT, from, error);
   if (source->isDirectory) return answer(EISDIR, from, error);
@@ -107,14 +107,14 @@ bool MemoryFiles::copyItem(std::string_view from, std::string_view to, ErrorRef*
 }
 
 bool MemoryFiles::fileExists(std::string_view path, bool* isDirectory) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   const Item* item = find(path);
   if (item && isDirectory) *isDirectory = item->isDirectory;
   return item != nullptr;
 }
 
 std::optional<platform::FileAttributes> MemoryFiles::attributesOfItem(std::string_view path, ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   const Item* item = find(path);
   if (!answer(item ? 0 : ENOENT, path, error)) return std::nullopt;
   return platform::FileAttributes{item->isDirectory, item->contents.size()};
@@ -129,24 +129,24 @@ int MemoryFiles::write(std::string_view path, BytesView contents) {
 }
 
 bool MemoryFiles::createFile(std::string_view path, BytesView contents, const platform::Value&) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   return write(path, contents) == 0;
 }
 
 std::optional<platform::Bytes> MemoryFiles::readFile(std::string_view path, ErrorRef* error) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   const Item* item = find(path);
   if (!answer(!item ? ENOENT : item->isDirectory ? EISDIR : 0, path, error)) return std::nullopt;
   return item->contents;
 }
 
 bool MemoryFiles::writeAtomically(std::string_view path, BytesView contents, ErrorRef* error, platform::Durability) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   return answer(write(path, contents), path, error);
 }
 
 int MemoryFiles::utimes(std::string_view path, int& errorNumber) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   if (find(path)) return 0;  // items of this file system have no times
   errorNumber = ENOENT;
   return -1;

@@ -1,10 +1,10 @@
 #pragma once
 
 #include <map>
-#include <mutex>
 #include <string>
 
 #include "platform/FileSystem.h"
+#include "platform/Mutex.h"
 
 namespace tiny {
 
@@ -38,7 +38,7 @@ class MemoryFiles final : public platform::FileSystem {
   int checkPlace(std::string_view path) const;
   int write(std::string_view path, platform::BytesView contents);
 
-  std::mutex _mutex;
+  platform::Mutex _mutex;
   Items _items;  // guarded by _mutex
 };
 

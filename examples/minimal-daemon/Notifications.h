@@ -2,11 +2,11 @@
 
 #include <map>
 #include <memory>
-#include <mutex>
 #include <string>
 #include <vector>
 
 #include "EventQueue.h"
+#include "platform/Mutex.h"
 #include "platform/NotificationCenter.h"
 
 namespace tiny {
@@ -32,7 +32,7 @@ class Notifications final : public platform::NotificationCenter {
   };
 
   EventQueue& _queue;
-  std::mutex _mutex;
+  platform::Mutex _mutex;
   // Guarded by _mutex.
   std::vector<std::shared_ptr<const Registration>> _observers;
   std::vector<std::string> _names;  // a token is a place here

@@ -1,8 +1,8 @@
 #pragma once
 
-#include <mutex>
 #include <string>
 
+#include "platform/Mutex.h"
 #include "platform/RVPlaceholder.h"
 
 namespace tiny {
@@ -30,11 +30,11 @@ class Placeholder final : public platform::RVPlaceholder {
   const std::uint64_t installType;
 
   std::optional<std::string> version() {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     return _version;
   }
   bool isCancelled() {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     return _cancelled;
   }
 
@@ -47,20 +47,20 @@ class Placeholder final : public platform::RVPlaceholder {
   bool setPlaceholderAttributes(const std::shared_ptr<platform::RVPlaceholderAttributes>& attributes,
                                 platform::ErrorRef* error) override {
     if (!change(error)) return false;
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     if (auto ours = std::dynamic_pointer_cast<Attributes>(attributes)) _version = ours->version();
     return true;
   }
   bool setSinfData(platform::BytesView, platform::ErrorRef* error) override { return change(error); }
   bool setConfigurationCompleteWithError(platform::ErrorRef* error) override {
     if (!change(error)) return false;
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     _closed = true;
     return true;
   }
   bool cancelForReason(const platform::ErrorRef&, platform::RVClientIdentifier, platform::ErrorRef* error) override {
     platform::setError(error, nullptr);
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     _cancelled = true;
     return true;
   }
@@ -68,13 +68,13 @@ class Placeholder final : public platform::RVPlaceholder {
 
  private:
   bool change(platform::ErrorRef* error) {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     bool possible = !_closed && !_cancelled;
     platform::setError(error, possible ? nullptr : platform::makeError("TinyInstalls", 1, app + ": it is complete"));
     return possible;
   }
 
-  std::mutex _mutex;
+  platform::Mutex _mutex;
   // Guarded by _mutex.
   std::optional<std::string> _version;
   bool _closed = false;

@@ -1,9 +1,9 @@
 #pragma once
 
 #include <functional>
-#include <mutex>
 #include <string>
 
+#include "platform/Mutex.h"
 #include "platform/RVPromise.h"
 
 namespace tiny {
@@ -19,7 +19,7 @@ class Promise : public Interface {
   explicit Promise(std::string name) : _name(std::move(name)) {}
 
   void attach(Listener listener) {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     _listener = std::move(listener);
   }
 
@@ -28,7 +28,7 @@ class Promise : public Interface {
     if (complete) tell(PromiseEvent::completed, _complete);
   }
   bool isComplete() override {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     return _complete;
   }
   bool cancelForReason(const platform::ErrorRef&, platform::RVClientIdentifier, platform::ErrorRef* error) override {
@@ -39,14 +39,14 @@ class Promise : public Interface {
   std::string describe() const override { return "<promise " + _name + '>'; }
 
  protected:
-  std::mutex _mutex;
+  platform::Mutex _mutex;
 
  private:
   /// Each event happens once, and none after the promise was cancelled.
   void tell(PromiseEvent event, bool& happened) {
     Listener listener;
     {
-      std::lock_guard lock(_mutex);
+      platform::Mutex::Lock lock(_mutex);
       if (happened || _cancelled) return;
       happened = true;
       listener = _listener;
@@ -69,11 +69,11 @@ class FilePromise final : public Promise<platform::RVPromisedTransferToPath> {
   FilePromise(std::string name, std::string path) : Promise(std::move(name)), _path(std::move(path)) {}
 
   void setTransferPath(std::string_view path) override {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     _path = path;
   }
   std::string path() {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     return _path;
   }
 

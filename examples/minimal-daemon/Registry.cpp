@@ -8,19 +8,19 @@ using platform::OBApplicationProxy;
 using platform::OBApplicationProxyRef;
 
 OBApplicationProxyRef Registry::find(std::string_view app) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   auto found = _apps.find(app);
   return found == _apps.end() ? nullptr : found->second;
 }
 
 void Registry::put(OBApplicationProxy app) {
   app.appState = {app.isInstalled, app.isPlaceholder};
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   _apps.insert_or_assign(*app.applicationIdentifier, std::make_shared<const OBApplicationProxy>(app));
 }
 
 void Registry::remove(std::string_view app) {
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   auto found = _apps.find(app);
   if (found != _apps.end()) _apps.erase(found);
 }
@@ -30,7 +30,7 @@ void Registry::remove(std::string_view app) {
 void Registry::tell(const Observer* address, const Report& report) {
   std::shared_ptr<Observer> observer;
   {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     for (const auto& each : _observers) {
       if (each.address == address) observer = each.observer.lock();
     }
@@ -40,7 +40,7 @@ void Registry::tell(const Observer* address, const Report& report) {
 
 Registry::Report Registry::installsNow() {
   std::vector<OBApplicationProxyRef> running;
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   for (const auto& [id, app] : _apps) {
     if (app->installProgressSync) running.push_back(app);
   }
@@ -49,20 +49,20 @@ Registry::Report Registry::installsNow() {
 
 void Registry::reportInstalls() {
   Report report = installsNow();
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   for (const auto& each : _observers) _queue.post([this, address = each.address, report] { tell(address, report); });
 }
 
 void Registry::reportCancelled(OBApplicationProxyRef app) {
   Report report = [app](Observer& observer) { observer.applicationInstallsDidCancel({app}); };
-  std::lock_guard lock(_mutex);
+  platform::Mutex::Lock lock(_mutex);
   for (const auto& each : _observers) _queue.post([this, address = each.address, report] { tell(address, report); });
 }
 
 void Registry::addObserver(std::weak_ptr<Observer> observer) {
   const Observer* address = observer.lock().get();
   {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     _observers.push_back({address, std::move(observer)});
   }
   _queue.post([this, address] { tell(address, installsNow()); });
@@ -70,12 +70,12 @@ void Registry::addObserver(std::weak_ptr<Observer> observer) {
 
 void Registry::removeObserver(const Observer* observer) {
   {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     _observers.erase(std::remove_if(_observers.begin(), _observers.end(),
                                     [observer](const auto& each) { return each.address == observer; }),
                      _observers.end());
   }
-  std::lock_guard noneRuns(_queue.delivering());
+  EventQueue::NoneRuns noneRuns(_queue);
 }
 
 bool Registry::applicationIsInstalled(std::string_view bundleIdentifier) {
@@ -87,7 +87,7 @@ void Registry::enumerateBundlesOfType(
     std::uint64_t type, const std::function<void(const platform::OBBundleProxyRef& bundle, bool& stop)>& block) {
   if (type > 1) return;  // there are no system bundles here
   auto apps = [&] {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     return _apps;
   }();
   bool stop = false;

@@ -2,11 +2,11 @@
 
 #include <functional>
 #include <map>
-#include <mutex>
 #include <string>
 #include <vector>
 
 #include "EventQueue.h"
+#include "platform/Mutex.h"
 #include "platform/OBApplicationWorkspace.h"
 
 namespace tiny {
@@ -47,7 +47,7 @@ class Registry final : public platform::OBApplicationWorkspace {
 
   EventQueue& _queue;
   std::function<bool(std::string_view)> _uninstall;
-  std::mutex _mutex;
+  platform::Mutex _mutex;
   // Guarded by _mutex.
   std::map<std::string, platform::OBApplicationProxyRef, std::less<>> _apps;
   std::vector<Registration> _observers;

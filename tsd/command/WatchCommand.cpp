@@ -5,14 +5,15 @@
 #include <array>
 #include <chrono>
 #include <cmath>
-#include <condition_variable>
 #include <map>
-#include <mutex>
 #include <optional>
 #include <set>
 #include <string>
 #include <vector>
 
+#include "platform/Condition.h"
+#include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 #include "tsd/command/Commands.h"
 #include "tsd/daemon/DeviceView.h"
 #include "tsd/picture/HomePages.h"
@@ -86,20 +87,20 @@ class Pause {
   explicit Pause(StopSignal& stop) : _told(stop, [this] { end(); }) {}
   /// Whether to go on.
   bool wait(Clock::duration time) {
-    std::unique_lock lock(_mutex);
-    return !_changed.wait_for(lock, time, [this] { return _over; });
+    platform::Mutex::Lock lock(_mutex);
+    return !_changed.waitUntil(_mutex, Clock::now() + time, [this]() REQUIRES(_mutex) { return _over; });
   }
 
  private:
   void end() {
-    std::lock_guard lock(_mutex);
+    platform::Mutex::Lock lock(_mutex);
     _over = true;
-    _changed.notify_all();
+    _changed.notifyAll();
   }
 
-  std::mutex _mutex;
-  std::condition_variable _changed;
-  bool _over = false;  // guarded by _mutex
+  platform::Mutex _mutex;
+  platform::Condition _changed;
+  bool _over GUARDED_BY(_mutex) = false;
   StopSignal::Subscription _told;
 };
 

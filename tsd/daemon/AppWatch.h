@@ -9,6 +9,7 @@
 
 #include "device/LocalDevice.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace tsd {
 

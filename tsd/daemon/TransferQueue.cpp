@@ -83,8 +83,8 @@ void TransferQueue::start(const std::vector<platform::TSAssetRef>& assets) {
 bool TransferQueue::waitUntil(platform::Clock::Instant deadline) {
   Lock lock(_mutex);
   if (!_device) return true;
-  return _changed.waitUntil(_mutex, _device->events().clock(), deadline,
-                            [this]() REQUIRES(_mutex) { return _working == 0; });
+  return _device->events().clock().waitUntil(_mutex, _changed, deadline,
+                                             [this]() REQUIRES(_mutex) { return _working == 0; });
 }
 
 void TransferQueue::finish() {
@@ -149,7 +149,13 @@ void TransferQueue::work(std::size_t number) {
     _changed.wait(_mutex, [&]() REQUIRES(_mutex) { return _over || (_round != round && number <= _taking); });
     if (_over) return;
     round = _round;
-    const PackageTransfer::Way way{_setup.packagesFolder, *_device, *_daemon, _progress, _stop};
+    const PackageTransfer::Way way{
+        .packagesFolder = _setup.packagesFolder,
+        .device = *_device,
+        .daemon = *_daemon,
+        .progress = _progress,
+        .stop = _stop,
+    };
     lock.unlock();
     while (TransferRef transfer = takeNext()) {
       Result result = transfer->carry(way);

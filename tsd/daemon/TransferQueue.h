@@ -16,6 +16,7 @@
 #include "platform/Mutex.h"
 #include "platform/StringSet.h"
 #include "platform/TSDeviceService.h"
+#include "platform/ThreadSafety.h"
 #include "tsd/daemon/AssetReport.h"
 #include "tsd/daemon/PackageTransfer.h"
 

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 #include "tsd/history/AppStory.h"
 #include "tsd/history/Outcome.h"
 

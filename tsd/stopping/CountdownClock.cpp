@@ -12,7 +12,7 @@ void CountdownClock::runAheadTo(Instant instant) {
   }
 }
 
-bool CountdownClock::waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
+bool CountdownClock::waitUntil(platform::Mutex& mutex, platform::Condition& changed, Instant deadline,
                                const std::function<bool()>& satisfied) {
   // A stop request cannot wake a thread that waits for something else.
   constexpr auto lookInterval = std::chrono::milliseconds(100);
@@ -29,7 +29,7 @@ bool CountdownClock::waitUntil(std::unique_lock<std::mutex>& lock, std::conditio
     if (_tick && seconds != told) _tick(seconds);
     told = seconds;
     auto nextSecond = deadline - std::chrono::seconds(seconds - 1);
-    if (_clock.waitUntil(lock, changed, std::min<Instant>(nextSecond, now() + lookInterval), satisfied)) return true;
+    if (_clock.waitUntil(mutex, changed, std::min<Instant>(nextSecond, now() + lookInterval), satisfied)) return true;
   }
 }
 

@@ -4,6 +4,7 @@
 #include <functional>
 
 #include "platform/Clock.h"
+#include "platform/ThreadSafety.h"
 #include "tsd/stopping/StopSignal.h"
 
 namespace tsd {
@@ -20,8 +21,8 @@ class CountdownClock : public platform::Clock {
       : _clock(clock), _stop(stop), _tick(std::move(tick)) {}
 
   Instant now() override;
-  bool waitUntil(std::unique_lock<std::mutex>& lock, std::condition_variable& changed, Instant deadline,
-                 const std::function<bool()>& satisfied) override;
+  bool waitUntil(platform::Mutex& mutex, platform::Condition& changed, Instant deadline,
+                 const std::function<bool()>& satisfied) override REQUIRES(mutex);
 
  private:
   void runAheadTo(Instant instant);

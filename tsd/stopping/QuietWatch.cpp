@@ -28,8 +28,8 @@ QuietWatch::~QuietWatch() { _drain.join(); }
 
 bool QuietWatch::waitUntil(platform::Clock::Instant deadline) {
   Lock lock(_mutex);
-  _changed.waitUntil(_mutex, _events.clock(), deadline,
-                     [this]() REQUIRES(_mutex) { return _quiet || _stop.requested(); });
+  _events.clock().waitUntil(_mutex, _changed, deadline,
+                            [this]() REQUIRES(_mutex) { return _quiet || _stop.requested(); });
   return _quiet;
 }
 

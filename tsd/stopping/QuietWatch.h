@@ -6,6 +6,7 @@
 #include "platform/Clock.h"
 #include "platform/Condition.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 #include "tsd/stopping/StopSignal.h"
 
 namespace tsd {

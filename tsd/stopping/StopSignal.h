@@ -7,6 +7,7 @@
 
 #include "device/files/FileDescriptor.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 
 namespace tsd {
 

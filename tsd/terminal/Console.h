@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 #include "tsd/terminal/TerminalText.h"
 
 namespace tsd {

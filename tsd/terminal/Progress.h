@@ -9,6 +9,7 @@
 
 #include "platform/Condition.h"
 #include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 #include "tsd/CommonOptions.h"
 #include "tsd/terminal/Console.h"
 #include "tsd/terminal/ProgressDrawing.h"
