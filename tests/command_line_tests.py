@@ -78,7 +78,7 @@ COMMAND_LINES = [
     Row("help", DONE, r"Subcommands:(.|\n)*Exit codes:"),
     Row("help sync", DONE, r"tsd sync(.|\n)*--end-phase"),
     Row("help weather", USAGE, err=says("weather")),
-    Row("points", DONE, r"^transfer$(.|\n)*^writeAtomically$"),
+    Row("points", DONE, r"^cancelForReason +RV\w+::cancelForReason, RV(.|\n)*^transfer +each chunk(.|\n)*^writeAtomically +FileSystem::"),
     Row("set dev", DONE, r"^app-installation=allowed$(.|\n)*^icon-size=120$"),
     Row("home dev -o home.png", DONE, r"^home\.png: no apps\.$"),
     Row("home dev", DONE, r"^dev: no apps on the home screen\.$"),
@@ -181,6 +181,9 @@ class Shells(Folder):
             ("sync d a", "a folder"),
             ("sync d --log a", "a folder,a file"),
             ("sync --transfers ", ""),
+            ("sync d host --asset com.example.f", "com.example.ferrystead:"),
+            ("sync d host --asset com.example.ferrystead :", "com.example.ferrystead:isDownload=true"),
+            ("sync d host --asset com.example.ferrystead : stall , p", ""),
             ("nothing a", ""),
         ]
         os.mkdir("a folder")

@@ -23,6 +23,8 @@ struct OptionEntry {
   /// Whether it names an app of the device before it, or is a rule of injection.
   bool takesApp() const { return value == "APP"; }
   bool takesRule() const { return value == "RULE"; }
+  /// Whether it is an app of the host, the second argument, with one of the words behind it.
+  bool takesAsset() const { return value == "ASSET"; }
   bool takesFolder() const { return value == "DEVICE" || value == "HOST" || value == "FOLDER"; }
 };
 
@@ -37,6 +39,12 @@ struct ExitCodeEntry {
   std::string meaning;
 };
 
+/// A point of injection rules, and the calls that it stands for.
+struct PointEntry {
+  std::string name;
+  std::string calls;
+};
+
 /// Everything that the help texts say: manual pages and completions are made from it too.
 struct OptionTable {
   std::string program;
@@ -45,7 +53,18 @@ struct OptionTable {
   std::vector<ExitCodeEntry> exitCodes;
   std::vector<CommandEntry> commands;
   std::vector<std::string> points;   // of injection rules
+  std::vector<PointEntry> calls;     // what these stand for, and those that stand for several
   std::vector<std::string> actions;  // those that take something end with "="
+
+  /// What can be said of an app's asset.
+  std::vector<std::string> assetWords() const {
+    for (const auto& command : commands) {
+      for (const auto& option : command.options) {
+        if (option.takesAsset()) return option.words;
+      }
+    }
+    return {};
+  }
 };
 
 }  // namespace tsd

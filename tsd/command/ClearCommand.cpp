@@ -37,8 +37,8 @@ ExitCode runClear(const CommandContext& context, const DeviceOnlyOptions& option
     writeDocument(document);
     return ExitCode::done;
   }
-  for (const auto& id : removed) writeOutput("Removed the placeholder of " + printable(id) + "\n");
-  writeOutput("All sync data is cleared.\n");
+  for (const auto& id : removed) context.report("Removed the placeholder of " + printable(id) + "\n");
+  context.report("All sync data is cleared.\n");
   return ExitCode::done;
 }
 

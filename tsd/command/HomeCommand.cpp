@@ -88,7 +88,7 @@ ExitCode runHome(const CommandContext& context, const HomeOptions& options) {
   else if (options.file.empty())
     writeOutput(homeInText(home, name));
   else
-    writeOutput(printable(options.file) + ": " + (home.pages.empty() ? "no apps" : summaryOf(home)) + ".\n");
+    context.report(printable(options.file) + ": " + (home.pages.empty() ? "no apps" : summaryOf(home)) + ".\n");
   return ExitCode::done;
 }
 

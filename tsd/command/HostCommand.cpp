@@ -39,7 +39,7 @@ ExitCode makeNew(const CommandContext& context, const HostOptions& options) {
   if (context.options.json)
     writeDocument(startedDocument(context, options));
   else
-    writeOutput(noteLine("", options.host + ": a host without apps; 'tsd host add' puts some into it"));
+    context.report(noteLine("", options.host + ": a host without apps; 'tsd host add' puts some into it"));
   return ExitCode::done;
 }
 
@@ -70,7 +70,7 @@ ExitCode addApps(const CommandContext& context, const HostOptions& options) {
     if (addition.restores) text += ", also to the restore list";
     if (app.icon.empty() && app.artwork.empty()) text += "; it has no icon";
     if (app.metadata.empty()) text += "; it has no store metadata";
-    writeOutput(noteLine("", text));
+    context.report(noteLine("", text));
   }
   return ExitCode::done;
 }
@@ -84,7 +84,7 @@ ExitCode removeApps(const CommandContext& context, const HostOptions& options) {
     return ExitCode::done;
   }
   for (const auto& app : options.items)
-    writeOutput(noteLine("", app + ": removed" + (options.uninstall ? "; the next sync uninstalls it" : "")));
+    context.report(noteLine("", app + ": removed" + (options.uninstall ? "; the next sync uninstalls it" : "")));
   return ExitCode::done;
 }
 
@@ -133,7 +133,7 @@ ExitCode check(const CommandContext& context, const HostOptions& options) {
   sum += findings.empty()
              ? "a sync has nothing to stumble over"
              : counted(errors, "error") + ", " + counted(problems, "problem") + ", " + counted(notes, "note");
-  writeOutput(noteLine("", sum));
+  context.report(noteLine("", sum));
   return code;
 }
 

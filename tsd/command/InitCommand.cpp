@@ -14,7 +14,7 @@ ExitCode runInit(const CommandContext& context, const DeviceOnlyOptions& options
     document.dictionary()->set("result", "done");
     writeDocument(document);
   } else {
-    writeOutput(options.device + ": an empty device\n");
+    context.report(options.device + ": an empty device\n");
   }
   return ExitCode::done;
 }

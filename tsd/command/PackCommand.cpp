@@ -22,8 +22,8 @@ ExitCode runPack(const CommandContext& context, const PackOptions& options) {
     writeDocument(document);
     return ExitCode::done;
   }
-  writeOutput(noteLine("", options.file + ": " + app.id + (app.version.empty() ? "" : " " + app.version) + ", " +
-                               std::to_string(bytes) + " bytes"));
+  context.report(noteLine("", options.file + ": " + app.id + (app.version.empty() ? "" : " " + app.version) + ", " +
+                                  std::to_string(bytes) + " bytes"));
   return ExitCode::done;
 }
 

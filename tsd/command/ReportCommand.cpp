@@ -53,8 +53,8 @@ ExitCode runReport(const CommandContext& context, const ReportOptions& options) 
     document.dictionary()->set("run", subject.run.number);
     writeDocument(document);
   } else {
-    writeOutput(printable(options.file) + ": run " + std::to_string(subject.run.number) + ", " +
-                printable(subject.run.command) + ".\n");
+    context.report(printable(options.file) + ": run " + std::to_string(subject.run.number) + ", " +
+                   printable(subject.run.command) + ".\n");
   }
   return ExitCode::done;
 }

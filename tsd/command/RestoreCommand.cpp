@@ -141,7 +141,7 @@ ExitCode Restore::run() {
   if (_context.options.json)
     writeDocument(document(result));
   else
-    writeOutput(text(result));
+    _context.report(text(result), result);
   return result;
 }
 
@@ -262,7 +262,7 @@ std::string Restore::text(ExitCode code) const {
   const std::vector<AppOutcome> outcomes(_list.apps.begin(), _list.apps.end());
   std::string text;
   if (!_list.apps.empty()) {
-    Table table({{"APP"}, {"NAME", 12}, {"VERSION", 7}, {"STATE"}, {"OUTCOME"}});
+    Table table({{"APP", 12, true}, {"NAME", 6}, {"VERSION", 7}, {"STATE"}, {"OUTCOME"}});
     for (const auto& app : _list.apps) {
       table.add({app.id, app.name, app.version, app.state.empty() ? "missing" : app.state, wordsOf(app.outcome)});
     }

@@ -58,14 +58,14 @@ ExitCode runSample(const CommandContext& context, const SampleOptions& options) 
     writeDocument(document(context.options, host));
     return ExitCode::done;
   }
-  Table table({{"APP"}, {"NAME", 12}, {"VERSION"}, {"TODO"}});
+  Table table({{"APP", 12, true}, {"NAME", 6}, {"VERSION"}, {"TODO"}});
   for (const auto& entry : host.entries()) {
     table.add({entry.app.id, entry.app.name, entry.app.version, nameOfRole(entry.role)});
   }
   constexpr std::size_t shownEntries = 40;
-  if (host.entries().size() <= shownEntries) writeOutput(table.text());
-  writeOutput(options.host + ": a host folder with " + std::to_string(host.entries().size()) +
-              " apps in its todo list and " + std::to_string(host.restored().size()) + " in its restore list\n");
+  if (host.entries().size() <= shownEntries) context.report(table.text());
+  context.report(options.host + ": a host folder with " + std::to_string(host.entries().size()) +
+                 " apps in its todo list and " + std::to_string(host.restored().size()) + " in its restore list\n");
   return ExitCode::done;
 }
 

@@ -48,7 +48,9 @@ void rehearse(const std::vector<Setting>& settings) {
   device->events().stop();
 }
 
-ExitCode show(const CommandContext& context, device::LocalDevice& device, const std::vector<std::string>& keys) {
+/// `isAsked`: they were not changed, but asked for.
+ExitCode show(const CommandContext& context, device::LocalDevice& device, const std::vector<std::string>& keys,
+              bool isAsked) {
   auto values = platform::Value::makeDictionary();
   std::string text;
   for (const auto& key : keys) {
@@ -56,7 +58,10 @@ ExitCode show(const CommandContext& context, device::LocalDevice& device, const 
     text += key + "=" + device.setting(key) + "\n";
   }
   if (!context.options.json) {
-    writeOutput(text);
+    if (isAsked)
+      writeOutput(text);
+    else
+      context.report(text);
     return ExitCode::done;
   }
   auto document = startDocument(context.options.command);
@@ -71,7 +76,7 @@ ExitCode show(const CommandContext& context, device::LocalDevice& device, const 
 ExitCode runSet(const CommandContext& context, const SetOptions& options) {
   if (options.settings.empty()) {
     DeviceView view(context, options.device);
-    return show(context, view.device(), device::settingKeys());
+    return show(context, view.device(), device::settingKeys(), true);
   }
   auto settings = parse(options.settings);
   rehearse(settings);
@@ -79,7 +84,7 @@ ExitCode runSet(const CommandContext& context, const SetOptions& options) {
   tsd::apply(session.device(), settings);
   std::vector<std::string> keys;
   for (const auto& setting : settings) keys.push_back(setting.key);
-  return show(context, session.device(), keys);
+  return show(context, session.device(), keys, false);
 }
 
 }  // namespace tsd

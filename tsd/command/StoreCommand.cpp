@@ -57,8 +57,8 @@ ExitCode runStore(const CommandContext& context, const StoreOptions& options) {
     document.dictionary()->set("version", app ? app->version : "");
     writeDocument(document);
   } else {
-    writeOutput(printable(options.app) + ": the store has " + (options.finish ? "finished" : "started") +
-                " its install\n");
+    context.report(printable(options.app) + ": the store has " + (options.finish ? "finished" : "started") +
+                   " its install\n");
   }
   return ExitCode::done;
 }

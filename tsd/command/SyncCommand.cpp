@@ -29,8 +29,8 @@ void show(const CommandContext& context, const std::vector<SyncReport>& reports)
   }
   if (context.options.json) return writeDocument(document(context.options.command, reports));
   for (std::size_t run = 0; run < reports.size(); ++run) {
-    if (reports.size() > 1) writeOutput("Sync " + std::to_string(run + 1) + "\n");
-    writeOutput(reports[run].text());
+    if (reports.size() > 1) context.report("Sync " + std::to_string(run + 1) + "\n");
+    context.report(reports[run].text(), reports[run].code);
   }
 }
 

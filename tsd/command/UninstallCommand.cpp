@@ -18,7 +18,7 @@ ExitCode runUninstall(const CommandContext& context, const UninstallOptions& opt
     document.dictionary()->set("app", options.app);
     writeDocument(document);
   } else {
-    writeOutput(printable(options.app) + ": uninstalled by the person\n");
+    context.report(printable(options.app) + ": uninstalled by the person\n");
   }
   return ExitCode::done;
 }

@@ -55,6 +55,15 @@ void addCommonOptions(CLI::App* command, Invocation& invocation) {
       "--progress", [&common](const std::string& mode) { common.progress = progressModes.at(mode); },
       "How progress is shown: auto, plain, tty or none");
   takeOneOf(invocation, progress, {"auto", "plain", "tty", "none"})->option_text("MODE")->group(commonGroup);
+  command
+      ->add_flag_callback(
+          "-q,--quiet",
+          [&common] {
+            common.quiet = true;
+            common.progress = ProgressMode::none;
+          },
+          wrapped("No progress, and no report of what was done; what went wrong is told all the same"))
+      ->group(commonGroup);
   command->add_option("--log", common.log, "Write the system log to this file")
       ->option_text("FILE")
       ->group(commonGroup);
@@ -190,19 +199,18 @@ void addSync(CLI::App& program, Invocation& invocation) {
   auto* command = addCommand(program, invocation, "sync", "Sync a device with a host folder", runSync, options);
   addDevice(command, options->device);
   addHost(command, options->host);
-  command
-      ->add_option_function<std::vector<std::string>>(
-          "--asset",
-          [options](const std::vector<std::string>& texts) {
-            for (const auto& text : texts) addAssetReport(options->reports, text);
-          },
-          wrapped("What the daemon reports of an app's asset: APP:KEY=VALUE,... with the keys isDownload, isRestore "
-                  "(true or "
-                  "false), completedAssetParts (a number), path (relative, absolute, none, recorded or a text), or "
-                  "just stall: progress without an end (repeatable)"))
-      ->option_text("TEXT")
-      ->expected(1)
-      ->take_all();
+  auto* asset = command->add_option_function<std::vector<std::string>>(
+      "--asset",
+      [options](const std::vector<std::string>& texts) {
+        for (const auto& text : texts) addAssetReport(options->reports, text);
+      },
+      wrapped("What the daemon reports of an app's asset: APP:KEY=VALUE,... with the keys isDownload, isRestore (true or "
+              "false), completedAssetParts (a number), path (relative, absolute, none, recorded or a text), or "
+              "just stall: progress without an end (repeatable)"));
+  asset->option_text("ASSET")->expected(1)->take_all();
+  invocation.words[asset] = {
+      "isDownload=true", "isDownload=false", "isRestore=true", "isRestore=false", "completedAssetParts=",
+      "path=relative",   "path=absolute",    "path=none",      "path=recorded",   "stall"};
   auto* endPhase = command->add_option_function<std::string>(
       "--end-phase", [options](const std::string& text) { options->endPhase = text == "success"; },
       wrapped("How the transfer phase is reported to have ended, whatever happened"));
@@ -380,8 +388,9 @@ OptionEntry entryOf(const CLI::Option& option, const Invocation& invocation) {
 }
 
 OptionTable tableOf(const CLI::App& program, const Invocation& invocation) {
-  OptionTable table{program.get_name(), version, program.get_description(), exitCodes(), {}, {}, {}};
+  OptionTable table{program.get_name(), version, program.get_description(), exitCodes(), {}, {}, {}, {}};
   table.points = device::injectionPoints();
+  table.calls = pointEntries();
   table.actions = device::injectionActions();
   for (const auto* command : program.get_subcommands({})) {
     CommandEntry entry{command->get_name(), command->get_description(), {}};

@@ -59,6 +59,16 @@ _PROGRAM_answer() {
     folder) compopt -o filenames 2>/dev/null; mapfile -t COMPREPLY < <(compgen -d -- "$word") ;;
     words*) mapfile -t COMPREPLY < <(compgen -W "${1#words}" -- "$word") ;;
     app) mapfile -t COMPREPLY < <(compgen -W "$(_PROGRAM_apps "${words[2]-}")" -- "$word") ;;
+    asset*)
+      if [[ $word == *[:,]* ]]; then
+        local begin=${word##*[:,]}
+        mapfile -t COMPREPLY < <(compgen -P "${word%"$begin"}" -W "${1#asset}" -- "$begin")
+      else
+        local host=${words[3]-}
+        mapfile -t COMPREPLY < <(cd "${host/#\~/$HOME}/Packages" 2>/dev/null && compgen -S : -X '!*.pkg' -f -- "$word")
+        COMPREPLY=("${COMPREPLY[@]/%.pkg:/:}")
+      fi
+      ;;
     rule)
       if [[ $word == *=* ]]; then
         mapfile -t COMPREPLY < <(compgen -P "${word%%=*}=" -W "ACTIONS" -- "${word#*=}")
@@ -67,7 +77,7 @@ _PROGRAM_answer() {
       fi
       ;;
   esac
-  [[ ${COMPREPLY[*]-} != *= ]] || compopt -o nospace 2>/dev/null
+  [[ ${COMPREPLY[*]-} != *[=:] ]] || compopt -o nospace 2>/dev/null
   local current=${COMP_WORDS[COMP_CWORD]}
   [[ $current != [=:] ]] || current=
   local front=${word%"$current"}
@@ -98,7 +108,7 @@ std::string kindOf(const OptionEntry& option) {
   if (option.takesFolder()) return "folder";
   if (option.takesApp()) return "app";
   if (option.takesRule()) return "rule";
-  std::string words = "words";
+  std::string words = option.takesAsset() ? "asset" : "words";
   for (const auto& word : option.words) words += ' ' + word;
   return words;
 }

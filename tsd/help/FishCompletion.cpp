@@ -22,6 +22,7 @@ std::string valueOf(const OptionEntry& option) {
   if (option.takesFile()) return " -r -F";
   if (option.takesFolder()) return " -x -a '(__fish_complete_directories)'";
   if (option.takesRule()) return " -x -a '(__tsd_rules)'";
+  if (option.takesAsset()) return " -x -a '(__tsd_assets)'";
   return option.words.empty() ? " -x" : " -x -a " + listOf(option.words);
 }
 
@@ -49,7 +50,14 @@ std::string functionsOf(const OptionTable& table) {
   for (const auto& action : table.actions) text += (text.back() == '{' ? "" : ",") + action;
   text += "}\n  else\n    string join \\n --";
   for (const auto& point : table.points) text += ' ' + point + '=';
-  return text + "\n  end\nend\n";
+  text +=
+      "\n  end\nend\nfunction __tsd_assets\n  set -l words (commandline -opc)\n"
+      "  set -l front (string match -rg '^(.*[:,])' -- (commandline -ct))\n"
+      "  if test -n \"$front\"\n    string join \\n -- $front{";
+  for (const auto& word : table.assetWords()) text += (text.back() == '{' ? "" : ",") + word;
+  return text +
+         "}\n  else\n    for package in $words[4]/Packages/*.pkg\n"
+         "      string replace -r '.*/(.*)\\.pkg$' '$1:' -- $package\n    end\n  end\nend\n";
 }
 
 }  // namespace

@@ -1,6 +1,9 @@
 #include "tsd/help/HelpText.h"
 
 #include <algorithm>
+#include <map>
+
+#include "device/boundary/Injection.h"
 
 namespace tsd {
 
@@ -15,6 +18,39 @@ const std::vector<ExitCodeEntry>& exitCodes() {
       {ExitCode::busy, "the device is in use"},
   };
   return codes;
+}
+
+namespace {
+
+std::string callsOf(const device::InjectionPoint& point) {
+  const std::string operation(point.operation), service(point.service);
+  if (operation == "step") return "each single change of the device's files and of its store";
+  if (operation == "transfer") return "each chunk of a package on its way to the device";
+  if (service == "log") return "each message of the plug-in at the level " + operation;
+  if (service == "AppsClient") return "a call into the plug-in: " + service + "::" + operation;
+  return service + "::" + operation;
+}
+
+}  // namespace
+
+std::vector<PointEntry> pointEntries() {
+  std::map<std::string, std::vector<device::InjectionPoint>> operations;
+  for (const auto& point : device::injectionOperations()) operations[std::string(point.operation)].push_back(point);
+  std::vector<PointEntry> entries;
+  for (const auto& [operation, points] : operations) {
+    // The level of a message is not meant by its bare name.
+    std::string all;
+    for (const auto& point : points) {
+      if (point.service != "log") all += (all.empty() ? "" : ", ") + callsOf(point);
+      if (points.size() > 1)
+        entries.push_back({std::string(point.service) + '.' + operation, callsOf(point)});
+      else if (point.service == "log")
+        entries.push_back({"log." + operation, callsOf(point)});
+    }
+    if (!all.empty()) entries.push_back({operation, all});
+  }
+  std::sort(entries.begin(), entries.end(), [](auto& one, auto& other) { return one.name < other.name; });
+  return entries;
 }
 
 std::string wrapped(const std::string& text, std::size_t width) {

@@ -16,6 +16,7 @@ std::string quoted(const std::string& text, const char* special) {
 std::string actionOf(const OptionEntry& option) {
   if (option.takesApp()) return "_tsd_apps";
   if (option.takesRule()) return "_tsd_rules";
+  if (option.takesAsset()) return "_tsd_assets";
   if (option.takesFile()) return "_files";
   if (option.takesFolder()) return "_files -/";
   std::string words;
@@ -47,6 +48,15 @@ constexpr const char* frame = R"frame(
 _tsd_apps() {
   local device=${${(Q)words[2]}/#\~/$HOME}
   compadd -- ${(f)"$(tsd status --json -- $device 2>/dev/null | sed -n 's/^ *"id": "\([^"]*\)".*/\1/p')"}
+}
+
+_tsd_assets() {
+  if compset -P '*[:,]'; then
+    compadd -S '' -- ASSETS
+  else
+    local host=${${(Q)words[3]}/#\~/$HOME}
+    compadd -S : -- $host/Packages/*.pkg(N:t:r)
+  fi
 }
 
 _tsd_rules() {
@@ -87,7 +97,8 @@ std::string zshCompletion(const OptionTable& table) {
          "  case $state in\n    command) _describe command commands ;;\n"
          "    arguments)\n      case $words[1] in\n" +
          cases + "      esac\n      ;;\n  esac\n}\n" +
-         replaced(replaced(frame, "ACTIONS", table.actions), "POINTS", table.points);
+         replaced(replaced(replaced(frame, "ACTIONS", table.actions), "POINTS", table.points), "ASSETS",
+                  table.assetWords());
 }
 
 }  // namespace tsd

@@ -56,7 +56,7 @@ Value SyncReport::document(const std::string& command) const {
 std::string SyncReport::text() const {
   std::string text;
   if (!apps.empty()) {
-    Table table({{"APP"}, {"NAME", 12}, {"VERSION", 7}, {"OUTCOME"}});
+    Table table({{"APP", 12, true}, {"NAME", 6}, {"VERSION", 7}, {"OUTCOME"}});
     for (const auto& app : apps) table.add({app.id, app.name, app.version, wordsOf(app.outcome)});
     text += table.text();
     text += reasonsText(apps);

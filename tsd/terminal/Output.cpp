@@ -133,10 +133,12 @@ std::vector<std::size_t> Table::widths() const {
     total += widest;
   }
   const std::size_t width = lineWidth();
+  const bool isTerminal = ::isatty(STDOUT_FILENO) != 0;
   while (total > width) {
     std::size_t widest = _columns.size();
     for (std::size_t column = 0; column < _columns.size(); ++column) {
-      bool mayShrink = _columns[column].least && widths[column] > _columns[column].least;
+      bool mayShrink = _columns[column].least && widths[column] > _columns[column].least &&
+                       (isTerminal || !_columns[column].keepsEnd);
       if (mayShrink && (widest == _columns.size() || widths[column] > widths[widest])) widest = column;
     }
     if (widest == _columns.size()) break;
@@ -152,7 +154,7 @@ std::string Table::text() const {
   auto appendRow = [&](auto cell) {
     std::string line;
     for (std::size_t column = 0; column < columns.size(); ++column) {
-      line += fitted(cell(column), columns[column]) + "  ";
+      line += (_columns[column].keepsEnd ? fittedToEnd : fitted)(cell(column), columns[column]) + "  ";
     }
     line.erase(line.find_last_not_of(' ') + 1);
     text += line + "\n";

@@ -44,6 +44,7 @@ class Table {
   struct Column {
     std::string title;
     std::size_t least = 0;  // may be shortened to this width; 0: never
+    bool keepsEnd = false;  // its front is what goes, and only on a terminal: others look for the whole of it
   };
   explicit Table(std::vector<Column> columns) : _columns(std::move(columns)) {}
   void add(std::vector<std::string> cells) { _rows.push_back(std::move(cells)); }

@@ -71,6 +71,19 @@ std::string fitted(std::string_view text, std::size_t columns) {
   return result.append(columns - 1 - used, ' ');
 }
 
+std::string fittedToEnd(std::string_view text, std::size_t columns) {
+  std::string whole = printable(text);
+  std::size_t have = columnsOf(whole);
+  if (have <= columns || columns == 0) return fitted(whole, columns);
+  std::string_view rest = whole;
+  while (have > columns - 1) {
+    Character first(rest);
+    have -= first.columns;
+    rest.remove_prefix(first.bytes);
+  }
+  return fitted("…" + std::string(rest), columns);
+}
+
 void TerminalLine::add(std::string_view text, Colour colour) {
   static constexpr const char* codes[] = {"", "\x1b[2m", "\x1b[32m", "\x1b[33m", "\x1b[36m"};
   _columns += columnsOf(text);

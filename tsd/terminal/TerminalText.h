@@ -12,6 +12,8 @@ std::string printable(std::string_view text);
 std::size_t columnsOf(std::string_view text);
 /// `printable(text)` in exactly `columns` columns: padded with spaces, or cut with "…" at its end.
 std::string fitted(std::string_view text, std::size_t columns);
+/// The same, cut with "…" at its front: an identifier differs from others at its end.
+std::string fittedToEnd(std::string_view text, std::size_t columns);
 
 /// A line for a terminal, put together from parts, some of them in colour.
 class TerminalLine {
