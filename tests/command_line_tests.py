@@ -210,7 +210,12 @@ class Shells(Folder):
             run = subprocess.run(["zsh", "-fc", ask], capture_output=True, text=True, env=os.environ | {"HOME": os.getcwd()})
             self.assertEqual(run.stdout, "_tsd\n", run.stderr)
 
+    def actions(self):
+        """Of a rule, as the completion has them."""
+        return re.search(r"%%=\*\}=\" -W \"([^\"]*)\"", self.tsd("completion", "bash").stdout)[1].split()
+
     def test_manual_pages(self):
+        self.tsd("init", "dev")
         self.tsd("manual", "pages")
         help_text = self.tsd("--help").stdout.split("Subcommands:")[1].split("Exit codes")[0]
         names = re.findall(r"^  (\w+)", help_text, re.MULTILINE)
@@ -222,7 +227,15 @@ class Shells(Folder):
                 self.assertEqual((run.returncode, run.stderr), (0, ""))
                 shown = re.findall(r"^ +(?:-\w, ?)?(--[-\w]+)", run.stdout, re.MULTILINE)
                 command = page[4:-2]
-                if command:
+                if not command:
+                    # The text has its own list of what the program takes.
+                    settings = re.findall(r"^(\S+)=", self.tsd("set", "dev").stdout, re.MULTILINE)
+                    for heading, names in [("SETTINGS OF A DEVICE", settings), ("ACTIONS OF RULES", self.actions())]:
+                        section = re.search(rf"^{heading}\n((?:\s.*\n|\n)+)", run.stdout, re.MULTILINE)[1]
+                        self.assertEqual(re.findall(r"^ {7}([-\w]+=?)(?:  |$)", section, re.MULTILINE), names)
+                    for heading in ["ENVIRONMENT", "FILES", "EXAMPLES", "EXIT STATUS", "INJECTION RULES"]:
+                        self.assertIn(f"\n{heading}\n", run.stdout)
+                else:
                     known = re.findall(r"^  (?:-\w,)?(--[-\w]+)", self.tsd(command, "--help").stdout, re.MULTILINE)
                     self.assertEqual(sorted(shown), sorted(known))
 

@@ -204,9 +204,10 @@ void addSync(CLI::App& program, Invocation& invocation) {
       [options](const std::vector<std::string>& texts) {
         for (const auto& text : texts) addAssetReport(options->reports, text);
       },
-      wrapped("What the daemon reports of an app's asset: APP:KEY=VALUE,... with the keys isDownload, isRestore (true or "
-              "false), completedAssetParts (a number), path (relative, absolute, none, recorded or a text), or "
-              "just stall: progress without an end (repeatable)"));
+      wrapped(
+          "What the daemon reports of an app's asset: APP:KEY=VALUE,... with the keys isDownload, isRestore (true or "
+          "false), completedAssetParts (a number), path (relative, absolute, none, recorded or a text), or "
+          "just stall: progress without an end (repeatable)"));
   asset->option_text("ASSET")->expected(1)->take_all();
   invocation.words[asset] = {
       "isDownload=true", "isDownload=false", "isRestore=true", "isRestore=false", "completedAssetParts=",

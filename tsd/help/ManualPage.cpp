@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <cctype>
 
+#include "tsd/help/ManualText.h"
+
 namespace tsd {
 namespace {
 
@@ -71,6 +73,19 @@ std::string exitStatus(const OptionTable& table) {
   return text;
 }
 
+std::string itemsSection(const char* title, const std::vector<ManualItem>& items) {
+  std::string text = heading(title);
+  for (const auto& item : items) text += tagged(bold(item.tag), sentence(item.text));
+  return text;
+}
+
+std::string examplesSection(const std::string& command) {
+  auto examples = manualExamples(command);
+  std::string text = examples.empty() ? "" : heading("EXAMPLES");
+  for (const auto& example : examples) text += tagged(bold(example.line), sentence(example.text));
+  return text;
+}
+
 std::string pageName(const OptionTable& table, const CommandEntry& command) {
   return table.program + '-' + command.name;
 }
@@ -87,7 +102,10 @@ std::string manualPage(const OptionTable& table) {
     page += tagged(bold(command.name), sentence(command.description));
     pages += (pages.empty() ? "" : ",\n") + bold(pageName(table, command)) + "(1)";
   }
-  return page + exitStatus(table) + heading("SEE ALSO") + pages + '\n';
+  page += itemsSection("INJECTION RULES", manualOfRules()) + itemsSection("ACTIONS OF RULES", manualOfActions());
+  page += itemsSection("SETTINGS OF A DEVICE", manualOfSettings()) + exitStatus(table);
+  page += itemsSection("ENVIRONMENT", manualOfEnvironment()) + itemsSection("FILES", manualOfFiles());
+  return page + examplesSection("") + heading("SEE ALSO") + pages + '\n';
 }
 
 std::string manualPage(const OptionTable& table, const CommandEntry& command) {
@@ -100,7 +118,9 @@ std::string manualPage(const OptionTable& table, const CommandEntry& command) {
   page += section("ARGUMENTS", command, [](const OptionEntry& each) { return each.isArgument; });
   page += section("OPTIONS", command, [](const OptionEntry& each) { return !each.isArgument && !each.isCommon; });
   page += section("COMMON OPTIONS", command, [](const OptionEntry& each) { return each.isCommon; });
-  return page + exitStatus(table) + heading("SEE ALSO") + bold(table.program) + "(1)\n";
+  if (command.name == "set") page += itemsSection("SETTINGS", manualOfSettings());
+  return page + exitStatus(table) + examplesSection(command.name) + heading("SEE ALSO") + bold(table.program) +
+         "(1), for the rules of injection, the settings, the files and the environment\n";
 }
 
 }  // namespace tsd
