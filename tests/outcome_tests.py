@@ -127,6 +127,36 @@ class Explanations(Folder):
         self.document("restore", "dev", "host", "--progress", "none")
         self.assertIn("none is: restore 1 left it so", self.tsd("status", "dev").stdout)
 
+    def test_what_costs_an_icon_alone_is_counted(self):
+        for app in self.make(3):
+            os.remove(f"host/{app}/AppIcon.png")
+            os.remove(f"host/{app}/HarluneArtwork")
+        run = self.tsd("sync", "dev", "host", "--progress", "none")
+        self.assertRegex(run.stderr, says("3 icons could not be copied, and their placeholders have none; the first: "))
+        self.tsd("init", "other")
+        run = self.tsd("sync", "other", "host", "--progress", "none", "--inject", "writeAtomically@4+=fail",
+                       code=SOME_FAILED)
+        self.assertEqual(len(re.findall("writeAtomically failed", run.stderr)), 2)
+        self.assertRegex(run.stderr, r": \d+ times in all\n")
+
+    def test_a_report_says_what_the_sync_said(self):
+        self.make(3)
+        said = self.tsd("sync", "dev", "host", "--progress", "none", "--inject", "writeAtomically@4+=fail", code=SOME_FAILED)
+        counts = re.search(r": (\d of 3 apps in order[^.]*)\.", said.stdout)[1]
+        self.assertIn("unrecorded", counts)
+        self.assertIn(f": {counts}.", self.tsd("report", "dev", "-o", "-").stdout)
+
+    def test_quiet_is_for_what_went_well(self):
+        self.make(2)
+        for line in [("sync", "dev", "host"), ("set", "dev", "icon-size=60"), ("host", "check", "host"), ("backup", "dev"),
+                     ("home", "dev", "-o", "home.png"), ("init", "other")]:
+            run = self.tsd(*line, "--quiet")
+            self.assertEqual((run.stdout, run.stderr), ("", ""), line)
+        self.assertIn("icon-size=60", self.tsd("set", "dev", "-q").stdout)
+        run = self.tsd("sync", "other", "host", "-q", "--inject", "setPlaceholderPromise@1=fail", code=SOME_FAILED)
+        self.assertEqual(run.stdout, "")
+        self.assertRegex(run.stderr, says("Sync not complete after "))
+
     def test_what_was_meant(self):
         self.make(2)
         table = [("statsu dev", USAGE, "did you mean 'status'?"), ("set dev icn-size=120", USAGE, "did you mean 'icon-size'?"),

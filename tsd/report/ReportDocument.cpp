@@ -110,6 +110,12 @@ class Reading {
       _story.hear(record);
       journal.hear(record);
     });
+    // The journal may have reached its size limit, and knows nothing of what is on the device's disk.
+    for (const auto& told : outcomesIn(run)) {
+      App& app = apps[told.id];
+      if (app.outcome != told.outcome && !told.reason.empty()) app.rule = told.reason;
+      app.outcome = told.outcome;
+    }
   }
 
   ReportJournal journal;
