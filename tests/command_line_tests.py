@@ -181,15 +181,16 @@ class Shells(Folder):
             ("sync d a", "a folder"),
             ("sync d --log a", "a folder,a file"),
             ("sync --transfers ", ""),
-            ("sync d host --asset com.example.f", "com.example.ferrystead:"),
-            ("sync d host --asset com.example.ferrystead :", "com.example.ferrystead:isDownload=true"),
-            ("sync d host --asset com.example.ferrystead : stall , p", ""),
+            ("sync dev host --asset com.example.f", "com.example.ferrystead:"),
+            ("sync dev host --asset com.example.ferrystead : st", "stall"),
             ("nothing a", ""),
         ]
         os.mkdir("a folder")
         pathlib.Path("a file").touch()
         self.tsd("init", "dev")
         self.tsd("store", "dev", "com.example.a")
+        os.makedirs("host/Packages")
+        pathlib.Path("host/Packages/com.example.ferrystead.pkg").touch()
         pathlib.Path("completion").write_text(self.tsd("completion", "bash").stdout)
         ask = """source completion; COMP_WORDS=(tsd "$@"); COMP_CWORD=$#; _tsd; IFS=,; echo "${COMPREPLY[*]}" """
         path = {"PATH": f"{pathlib.Path(tsd_folder.TSD).parent}:{os.environ['PATH']}"}
@@ -231,8 +232,8 @@ class Shells(Folder):
                     # The text has its own list of what the program takes.
                     settings = re.findall(r"^(\S+)=", self.tsd("set", "dev").stdout, re.MULTILINE)
                     for heading, names in [("SETTINGS OF A DEVICE", settings), ("ACTIONS OF RULES", self.actions())]:
-                        section = re.search(rf"^{heading}\n((?:\s.*\n|\n)+)", run.stdout, re.MULTILINE)[1]
-                        self.assertEqual(re.findall(r"^ {7}([-\w]+=?)(?:  |$)", section, re.MULTILINE), names)
+                        section = re.search(rf"^{heading}\n((?: .*\n|\n)+)", run.stdout, re.MULTILINE)[1]
+                        self.assertEqual(re.findall(r"^ {7}([-\w]+=?)(?: |$)", section, re.MULTILINE), names)
                     for heading in ["ENVIRONMENT", "FILES", "EXAMPLES", "EXIT STATUS", "INJECTION RULES"]:
                         self.assertIn(f"\n{heading}\n", run.stdout)
                 else:

@@ -15,7 +15,7 @@ struct CommonOptions {
   std::string command;                 // the subcommand's name
   std::vector<std::string> arguments;  // what followed the subcommand's name
   bool json = false;                   // one JSON document on standard output
-  bool quiet = false;  // no progress, and no report of a command that does something
+  bool quiet = false;                  // no progress, and no report of a command that does something
   ProgressMode progress = ProgressMode::automatic;
   std::string log;     // file for the system log; empty: none
   std::string calls;   // file for the call journal; empty: none

@@ -10,7 +10,7 @@ ExitCode runPoints(const CommandContext&, const OptionTable& table, const Points
   std::size_t width = 0;
   for (const auto& point : table.calls) width = std::max(width, columnsOf(point.name));
   std::string text;
-  for (const auto& point : table.calls) text += wrappedLine(fitted(point.name, width) + "  ", point.calls);
+  for (const auto& point : table.calls) text += noteLine(fitted(point.name, width) + "  ", point.calls);
   writeOutput(text);
   return ExitCode::done;
 }
