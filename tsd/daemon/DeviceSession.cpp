@@ -28,6 +28,7 @@ DeviceSession::DeviceSession(const CommandContext& context, const Setup& setup) 
 DeviceSession::~DeviceSession() {
   unloadPlugin();
   _device->events().stop();
+  tellRepeatedFailures();
   for (const auto& rule : _device->boundary().idleRules())
     _context.console.message("--inject " + rule.text + ": its turn never came");
   if (_log && _log->failed()) _context.console.message(_context.options.log + ": not every line could be written");
@@ -50,10 +51,33 @@ void DeviceSession::settle() {
   if (!_complaint.empty()) throw CommandError("not everything could be done: " + _complaint);
 }
 
-void DeviceSession::complain(const std::string& text) {
-  _context.console.message(text);
+void DeviceSession::complain(std::string_view operation, std::string_view path, std::string_view reason) {
+  const std::string text = std::string(path) + ": " + std::string(operation) + " failed: " + std::string(reason);
   platform::Mutex::Lock lock(_mutex);
+  // The plug-in copies icons alone, and installs an app without one all the same.
+  const bool isIcon = operation == "copyItem";
+  auto [failures, isFirst] = _failures.try_emplace(isIcon ? std::string(operation)
+                                                          : std::string(operation) + " failed: " + std::string(reason));
+  if (isFirst) failures->second.first = text;
+  ++failures->second.count;
+  if (isIcon) return;
+  if (isFirst) _context.console.message(text);
   if (_complaint.empty()) _complaint = text;
+}
+
+void DeviceSession::tellRepeatedFailures() {
+  platform::Mutex::Lock lock(_mutex);
+  for (const auto& [what, failures] : _failures) {
+    if (what == "copyItem") {
+      _context.console.message(std::to_string(failures.count) +
+                               (failures.count == 1 ? " icon could not be copied, and its placeholder has none: "
+                                                    : " icons could not be copied, and their placeholders have none; "
+                                                      "the first: ") +
+                               failures.first);
+    } else if (failures.count > 1) {
+      _context.console.message(what + ": " + std::to_string(failures.count) + " times in all");
+    }
+  }
 }
 
 device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
@@ -68,7 +92,7 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
     };
   }
   options.fileFailed = [this](std::string_view operation, std::string_view path, std::string_view reason) {
-    complain(std::string(path) + ": " + std::string(operation) + " failed: " + std::string(reason));
+    complain(operation, path, reason);
   };
   options.recovers = setup.use != DeviceUse::copy || !DeviceLock::holderOf(setup.folder);
   KeptRun* kept = setup.use == DeviceUse::kept ? &*_context.kept : nullptr;

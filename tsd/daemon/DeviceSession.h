@@ -1,10 +1,13 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "device/LocalDevice.h"
 #include "platform/DeviceNames.h"
@@ -64,8 +67,10 @@ class DeviceSession {
  private:
   platform::TSClient& makeClient(const platform::Platform& platform);
   device::DeviceOptions deviceOptions(const Setup& setup);
-  /// From any thread.
-  void complain(const std::string& text);
+  /// A file operation of the plug-in has failed. One of a kind is told at once, and how many there were at the end;
+  /// what costs an icon alone is only counted. From any thread.
+  void complain(std::string_view operation, std::string_view path, std::string_view reason);
+  void tellRepeatedFailures();
 
   const CommandContext& _context;
   std::optional<PluginLoader> _loader;
@@ -74,6 +79,11 @@ class DeviceSession {
   std::optional<LineFile> _calls;
   std::optional<TraceFile> _trace;
   platform::Mutex _mutex;
+  struct Failures {
+    std::string first;
+    std::size_t count = 0;
+  };
+  std::map<std::string, Failures> _failures GUARDED_BY(_mutex);  // by what they have in common
   std::string _complaint
       GUARDED_BY(_mutex);  // the first one. Outlives the device, which may still complain while it is destroyed
   std::unique_ptr<device::LocalDevice> _device;
