@@ -93,12 +93,6 @@ std::string parseAction(std::string_view text, InjectionRule& rule) {
 
 }  // namespace
 
-std::vector<InjectionPoint> injectionOperations() {
-  std::vector<InjectionPoint> operations;
-  for (const auto& point : points) operations.push_back({point.operation, point.service});
-  return operations;
-}
-
 std::vector<std::string> injectionPoints() {
   std::vector<std::string> names;
   for (std::size_t i = 0; i < std::size(points); ++i) {

@@ -51,13 +51,6 @@ struct InjectionRule {
   static std::optional<InjectionRule> parse(std::string_view text, platform::ErrorRef* error = nullptr);
 };
 
-/// An operation that a rule can name.
-struct InjectionPoint {
-  std::string_view operation;
-  std::string_view service;  // its class, "log" for a message's level, empty for a point that is no call
-};
-/// All of them, sorted by operation, then by service.
-std::vector<InjectionPoint> injectionOperations();
 /// Every point, sorted, with its class where one name serves several.
 std::vector<std::string> injectionPoints();
 /// Every action; one that takes something ends with "=".

@@ -12,7 +12,8 @@ class InjectionPoint {
  public:
   struct Name {
     std::string_view operation;
-    std::string_view service;  // empty for what is no call: "step", "transfer"
+    std::string_view
+        service;  // "log" of a message, whose level is the operation; empty for what is no call: "step", "transfer"
 
     friend constexpr bool operator==(const Name& one, const Name& other) = default;
     friend constexpr bool operator<(const Name& one, const Name& other) {

@@ -22,7 +22,7 @@ const std::vector<ExitCodeEntry>& exitCodes() {
 
 namespace {
 
-std::string callsOf(const device::InjectionPoint& point) {
+std::string callsOf(const device::InjectionPoint::Name& point) {
   const std::string operation(point.operation), service(point.service);
   if (operation == "step") return "each single change of the device's files and of its store";
   if (operation == "transfer") return "each chunk of a package on its way to the device";
@@ -34,8 +34,8 @@ std::string callsOf(const device::InjectionPoint& point) {
 }  // namespace
 
 std::vector<PointEntry> pointEntries() {
-  std::map<std::string, std::vector<device::InjectionPoint>> operations;
-  for (const auto& point : device::injectionOperations()) operations[std::string(point.operation)].push_back(point);
+  std::map<std::string, std::vector<device::InjectionPoint::Name>> operations;
+  for (const auto& point : device::InjectionPoint::table) operations[std::string(point.operation)].push_back(point);
   std::vector<PointEntry> entries;
   for (const auto& [operation, points] : operations) {
     // The level of a message is not meant by its bare name.
