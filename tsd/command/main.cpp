@@ -17,6 +17,7 @@
 #include "tsd/CommandError.h"
 #include "tsd/OptionTable.h"
 #include "tsd/command/Commands.h"
+#include "tsd/daemon/InjectionRules.h"
 #include "tsd/help/HelpText.h"
 #include "tsd/terminal/Output.h"
 #include "tsd/terminal/Suggestion.h"
@@ -484,24 +485,6 @@ void addCommands(CLI::App& program, Invocation& invocation) {
                   std::make_shared<PointsOptions>());
   addManual(program, invocation);
   addHelp(program, invocation);
-}
-
-/// For a text that is not a rule: the point that was most likely meant, unless the text names a point.
-std::string pointMeantBy(const std::string& rule) {
-  std::string point = rule.substr(0, rule.find_first_of(":@="));
-  if (device::isInjectionPoint(point)) return {};
-  return didYouMean(point, device::injectionPoints());
-}
-
-std::vector<device::InjectionRule> parseRules(const std::vector<std::string>& texts) {
-  std::vector<device::InjectionRule> rules;
-  for (const auto& text : texts) {
-    platform::ErrorRef error;
-    auto rule = device::InjectionRule::parse(text, &error);
-    if (!rule) throw CommandError(ExitCode::usage, "--inject: " + textOf(error) + pointMeantBy(text));
-    rules.push_back(std::move(*rule));
-  }
-  return rules;
 }
 
 /// Runs what was asked for; every failure ends here, as a message and, when asked for, a document.
