@@ -6,7 +6,6 @@
 #include <string>
 #include <string_view>
 #include <type_traits>
-#include <utility>
 #include <vector>
 
 #include "device/boundary/ObjectFacts.h"
@@ -84,7 +83,7 @@ platform::Value journalValueOfContent(Names& names, const std::shared_ptr<T>& ob
   if constexpr (requires { factsOf(*object); }) {
     if (names.showsWhole()) {
       platform::Value facts = factsOf(*object);
-      facts.dictionary()->set("object", std::move(name));
+      facts.dictionary()->set("object", name);
       return facts;
     }
   }

@@ -3,7 +3,7 @@
 #include <atomic>
 #include <deque>
 #include <functional>
-#include <optional>
+#include <memory>
 #include <thread>
 
 #include "platform/Clock.h"
@@ -23,11 +23,12 @@ class EventQueue final : public platform::Clock {
   class NoneRuns {
    public:
     explicit NoneRuns(EventQueue& queue) {
-      if (queue._deliverer != std::this_thread::get_id()) _lock.emplace(queue._delivering);
+      if (queue._deliverer != std::this_thread::get_id())
+        _lock = std::make_unique<platform::Mutex::Lock>(queue._delivering);
     }
 
    private:
-    std::optional<platform::Mutex::Lock> _lock;
+    std::unique_ptr<platform::Mutex::Lock> _lock;
   };
 
   Instant now() override { return std::chrono::steady_clock::now(); }

@@ -77,7 +77,8 @@ void Rehearsal::run(std::vector<TodoEntry> todo) {
   }
   // All of it goes to memory. What a plan looks at, lists and icons, is never that large.
   constexpr std::uint64_t largestFile = std::uint64_t{64} << 20;
-  FileConduit(_session.files(), _context.console, {.fileBytes = largestFile}).pushStaging(_options.host);
+  FileConduit(_session.files(), _context.console, FileConduit::Limits{.fileBytes = largestFile})
+      .pushStaging(_options.host);
   Daemon daemon(_session.device(), _session.loadPlugin());
   daemon.postStartupNotification();
   _opening = openSync(daemon);

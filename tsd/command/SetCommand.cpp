@@ -26,17 +26,13 @@ std::vector<Setting> parse(const std::vector<std::string>& texts) {
   return settings;
 }
 
-const std::vector<std::string> keys{"app-installation",     "app-removal",  "icon-size",
-                                    "backup-placeholders",  "backup-error", "device-service-prioritize",
-                                    "device-service-cancel"};
-
 void apply(device::LocalDevice& device, const std::vector<Setting>& settings) {
   for (const auto& setting : settings) {
     platform::ErrorRef error;
     if (device.set(setting.key, setting.value, &error)) continue;
     bool unknown = error && error->code() == static_cast<std::int64_t>(device::LocalDeviceError::unknownSetting);
     throw CommandError(unknown ? ExitCode::usage : ExitCode::failed,
-                       textOf(error) + (unknown ? didYouMean(setting.key, keys) : ""));
+                       textOf(error) + (unknown ? didYouMean(setting.key, device::settingKeys()) : ""));
   }
 }
 
