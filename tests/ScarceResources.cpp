@@ -1,7 +1,8 @@
 /// Loaded before a program: the threads and the memory that it cannot have. `SCARCE_THREADS=3` lets the third thread
 /// fail to start, and all after it; `SCARCE_MEMORY=3` does the same with allocations, `SCARCE_MEMORY=3!` with the third
-/// alone. `SCARCE_COUNT=FILE` writes the number of allocations when the program ends. What libraries allocate before
-/// `main` does not count: some of them end the process then.
+/// alone; `SCARCE_LARGEST=3` lets every allocation of more than three bytes fail. `SCARCE_COUNT=FILE` writes the number
+/// of allocations when the program ends. What libraries allocate before `main` does not count: some of them end the
+/// process then.
 
 #include <dlfcn.h>
 #include <fcntl.h>
@@ -33,19 +34,23 @@ static unsigned long numberIn(const char* name, bool* once) {
   return number;
 }
 
-static bool failsAllocation() {
+static bool failsAllocation(std::size_t size) {
   if (!begun) return false;
-  static bool once = false;
+  static bool once = false, ignored = false;
   static const unsigned long limit = numberIn("SCARCE_MEMORY", &once);
+  static const unsigned long largest = numberIn("SCARCE_LARGEST", &ignored);
   unsigned long number = ++allocations;
-  if (limit == 0 || number < limit || (once && number > limit)) return false;
+  bool isTooLarge = largest != 0 && size > largest;
+  if (!isTooLarge && (limit == 0 || number < limit || (once && number > limit))) return false;
   errno = ENOMEM;
   return true;
 }
 
-void* malloc(std::size_t size) { return failsAllocation() ? nullptr : __libc_malloc(size); }
-void* calloc(std::size_t count, std::size_t size) { return failsAllocation() ? nullptr : __libc_calloc(count, size); }
-void* realloc(void* block, std::size_t size) { return failsAllocation() ? nullptr : __libc_realloc(block, size); }
+void* malloc(std::size_t size) { return failsAllocation(size) ? nullptr : __libc_malloc(size); }
+void* calloc(std::size_t count, std::size_t size) {
+  return failsAllocation(count * size) ? nullptr : __libc_calloc(count, size);
+}
+void* realloc(void* block, std::size_t size) { return failsAllocation(size) ? nullptr : __libc_realloc(block, size); }
 
 using Main = int (*)(int, char**, char**);
 using Start = int (*)(Main, int, char**, void (*)(), void (*)(), void (*)(), void*);

@@ -5,8 +5,10 @@ signal; what it could not do, the same command does afterwards.
 usage: scarcity_tests.py TSD LIBRARY [unittest arguments], the library being that of ScarceResources.cpp
 """
 
+import json
 import os
 import pathlib
+import plistlib
 import resource
 import shutil
 import signal
@@ -15,7 +17,8 @@ import sys
 import unittest
 
 import tsd_folder
-from tsd_folder import DONE, FAILED, SOME_FAILED
+from hostile_host import zipped
+from tsd_folder import DEADLINE, DONE, FAILED, SOME_FAILED
 
 SCARCE = None
 ALL_INSTALLED = {"installed"}
@@ -43,9 +46,10 @@ class Scarcity(tsd_folder.Folder):
 
     def check_ends(self, run, told=True):
         """It ended of its own will, and, unless all went well, said why."""
-        self.assertIn(run.returncode, (DONE, FAILED, SOME_FAILED), run.stderr)
+        self.assertIn(run.returncode, (DONE, FAILED, SOME_FAILED, DEADLINE), run.stderr)
         if told and run.returncode != DONE:
-            self.assertRegex(run.stderr, r"(?m)^tsd: .")
+            # A library without memory may end the program itself.
+            self.assertRegex(run.stderr, r"(?m)^tsd: .|^Fatal .*[Mm]emory")
 
     def check_recovers(self, *arguments):
         self.tsd(*arguments)
@@ -69,17 +73,35 @@ class Scarcity(tsd_folder.Folder):
         self.renew()
         self.check_recovers("sync", "dev", "host")
 
-    def test_memory_on_the_way(self):
-        # A sample of the allocations while a device is opened.
-        self.run_short("status", "dev", SCARCE_COUNT="count")
-        total = int(pathlib.Path("count").read_text()) // 2
-        self.assertGreater(total, 1000)
-        for command in (("status", "dev"), ("sync", "dev", "host", "--progress", "none")):
-            for number in [*range(1, 20), *range(20, total, total // 30)]:
-                with self.subTest(" ".join(command), allocation=number):
-                    self.renew()
-                    run = self.run_short(*command, SCARCE_MEMORY=f"{number}!")
-                    self.check_ends(run, told=False)
+    def test_memory(self):
+        # A sample of the allocations of each command, which fail alone or with all that come after them.
+        for command in (("status", "dev"), ("sync", "dev", "host", "--progress", "none"),
+                        ("restore", "dev", "host", "--progress", "none")):
+            self.renew()
+            self.run_short(*command, SCARCE_COUNT="count")
+            total = int(pathlib.Path("count").read_text())
+            self.assertGreater(total, 1000)
+            for number in [*range(1, 10), *range(10, total, total // 25)]:
+                for once in ("!", ""):
+                    with self.subTest(" ".join(command), allocation=number, once=once):
+                        self.renew()
+                        run = self.run_short(*command, SCARCE_MEMORY=f"{number}{once}")
+                        self.check_ends(run, told=not once)
+            self.tsd(*command)
+            if command[0] == "sync":
+                self.check_recovers(*command)
+
+    def test_one_app_that_needs_too_much(self):
+        app, *neighbours = self.apps
+        # Read, it takes more than twenty times its size.
+        manifest = plistlib.dumps({"KBBundleIdentifier": app, "more": [1] * 150_000}, fmt=plistlib.FMT_BINARY)
+        pathlib.Path("host/Packages", app + ".pkg").write_bytes(zipped(app, manifest=manifest))
+        run = self.run_short("sync", "dev", "host", "--progress", "none", "--json", SCARCE_LARGEST="1000000")
+        self.assertEqual(run.returncode, SOME_FAILED, run.stderr)
+        outcomes = {each["id"]: (each["outcome"], each["reason"]) for each in json.loads(run.stdout)["apps"]}
+        self.assertEqual([outcomes[each] for each in neighbours], [("INSTALLED", "")] * 2)
+        self.assertRegex(": ".join(outcomes[app]), rf"\AFAILED: .*{app}.pkg.*: out of memory")
+        self.check_recovers("sync", "dev", "host")
 
     def test_a_file_that_may_not_grow(self):
         def limited():

@@ -1,5 +1,8 @@
 #include "device/events/EventQueue.h"
 
+#include <pthread.h>
+
+#include <new>
 #include <utility>
 
 #include "platform/Mutex.h"
@@ -59,8 +62,17 @@ struct EventQueue::HeldEvents {
 };
 
 EventQueue::HeldEvents& EventQueue::heldEvents() {
-  thread_local HeldEvents held;
-  return held;
+  // Not an object of the thread's, for which the C library ends a process that has no memory left.
+  static const pthread_key_t key = [] {
+    pthread_key_t made{};
+    if (pthread_key_create(&made, [](void* held) { delete static_cast<HeldEvents*>(held); }) != 0)
+      throw std::bad_alloc();
+    return made;
+  }();
+  if (auto* held = static_cast<HeldEvents*>(pthread_getspecific(key))) return *held;
+  auto made = std::make_unique<HeldEvents>();
+  if (pthread_setspecific(key, made.get()) != 0) throw std::bad_alloc();
+  return *made.release();
 }
 
 EventQueue::EventQueue() : _door(std::make_shared<Door>(this)) {}

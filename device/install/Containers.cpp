@@ -16,7 +16,7 @@ constexpr std::string_view iconName = "Icon.png";
 
 /// Drawn anew for each container, so that no name is ever used twice. The source is slow: every bit of it is used.
 std::string drawName() {
-  static thread_local std::random_device source;
+  std::random_device source;
   constexpr char digits[] = "0123456789ABCDEF";
   std::string name;
   std::uint32_t drawn = 0;

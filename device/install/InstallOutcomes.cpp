@@ -49,9 +49,12 @@ bool recordInstalled(const InstallParts& parts, const CoordinatorRef& coordinato
   if (!parts.records.commit(std::move(changes), error)) return false;
   // From here on nothing can fail: the old files go when nobody can find them any more, and whoever is told finds the
   // coordinator ended and the new app there.
-  abandoned.become(std::move(superfluous));
-  if (coordinator) parts.open.close(*coordinator);
-  parts.reports.installed(coordinator, app);
+  const auto tell = [&]() REQUIRES(recordsGuard) noexcept {
+    abandoned.become(std::move(superfluous));
+    if (coordinator) parts.open.close(*coordinator);
+    parts.reports.installed(coordinator, app);
+  };
+  tell();
   return true;
 }
 

@@ -1,5 +1,8 @@
 #include "device/install/PackageInstall.h"
 
+#include <cerrno>
+#include <new>
+
 #include "device/DeviceErrors.h"
 #include "device/install/AppIdentifier.h"
 #include "device/install/CoordinationError.h"
@@ -37,8 +40,9 @@ AppRecord recordOf(const UnpackedPackage& package, const std::string& container)
 std::optional<AppRecord> PackageInstall::unpack(ErrorRef* error) {
   auto container = _parts.containers.makeFresh(error);
   if (!container) return std::nullopt;
+  AbandonedContainer abandoned(_parts.containers, *container);
   auto app = unpackInto(*container, error);
-  if (!app) _parts.containers.remove(*container);
+  if (app) abandoned.become("");
   return app;
 }
 
@@ -72,9 +76,17 @@ std::optional<AppRecord> PackageInstall::unpackInto(const std::string& container
 bool PackageInstall::run(ErrorRef* error) {
   setError(error, nullptr);
   ErrorRef reason;
-  auto app = unpack(&reason);
-  auto id = app ? app->id : _request.app;
-  if (!app || !record(std::move(*app), &reason)) {
+  auto id = _request.app;
+  bool installed = false;
+  try {
+    auto app = unpack(&reason);
+    if (app) id = app->id;
+    installed = app && record(std::move(*app), &reason);
+  } catch (const std::bad_alloc&) {
+    // A package that needs more memory than there is, which the next one may not.
+    reason = platform::makeError("Package", ENOMEM, "package \"" + _request.packagePath + "\": out of memory");
+  }
+  if (!installed) {
     if (!_request.app.empty()) fail(id, reason);
     return device::fail(error, reason);
   }

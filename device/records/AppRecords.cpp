@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <iterator>
+#include <new>
 
 #include "device/DeviceErrors.h"
 #include "device/records/RecordCodec.h"
@@ -225,19 +226,28 @@ bool AppRecords::commit(ChangeSet&& changes, platform::ErrorRef* error) { return
 bool AppRecords::write(ChangeSet&& changes, platform::ErrorRef* error) { return keep(&Store::write, changes, error); }
 
 bool AppRecords::keep(Keep keep, const ChangeSet& changes, platform::ErrorRef* error) {
-  std::vector<StoreRecord> records;
-  records.reserve(_later.size() + 2 * changes._steps.size());  // records are costly to move
-  records.insert(records.end(), _later.begin(), _later.end());
-  for (const auto& step : changes._steps) step.encode(_state, records);
   platform::ErrorRef reason;
-  const bool kept = (_store.*keep)(records, &reason);
+  bool kept = false;
+  try {
+    std::vector<StoreRecord> records;
+    records.reserve(_later.size() + 2 * changes._steps.size());  // records are costly to move
+    records.insert(records.end(), _later.begin(), _later.end());
+    for (const auto& step : changes._steps) step.encode(_state, records);
+    kept = (_store.*keep)(records, &reason);
+  } catch (const std::bad_alloc&) {
+    reason = localDeviceError(LocalDeviceError::failed, "out of memory");
+  }
   platform::setError(error, reason);
   if (!kept && _refused) _refused(reason);
   if (!kept) return false;
-  _later.clear();
-  for (const auto& step : changes._steps) {
-    if (step.apply) step.apply(_state);
-  }
+  // A process that cannot take over what it has stored must not go on with what it had before.
+  const auto takeOver = [&]() REQUIRES(recordsGuard) noexcept {
+    _later.clear();
+    for (const auto& step : changes._steps) {
+      if (step.apply) step.apply(_state);
+    }
+  };
+  takeOver();
   return true;
 }
 

@@ -86,7 +86,7 @@ bool FileSystemService::createFile(std::string_view path, BytesView contents, co
 std::optional<Bytes> FileSystemService::readFile(std::string_view path, ErrorRef* error) {
   auto bytes = run({className, "readFile"}, path, error, {{"path", path}},
                    [&](ErrorRef* reason) { return _files.readFile(path, reason); });
-  if (bytes) LastRead::ofThisThread() = {std::string(path), bytes->size()};
+  if (bytes) LastRead::ofThisThread().set(path, bytes->size());
   return bytes;
 }
 

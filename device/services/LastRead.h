@@ -1,20 +1,34 @@
 #pragma once
 
+#include <algorithm>
+#include <array>
 #include <cstddef>
-#include <string>
 #include <string_view>
 
 namespace device {
 
 /// The file that this thread read last for the plug-in: what it then hands to the property-list codec came from there.
-struct LastRead {
-  std::string path;
-  std::size_t size = 0;
-
+/// In a fixed place, as a thread that has no memory left for an object with an end ends the process.
+class LastRead {
+ public:
   static LastRead& ofThisThread() {
-    static thread_local LastRead last;
+    static constinit thread_local LastRead last;
     return last;
   }
+
+  /// A longer path than any file system takes is cut.
+  void set(std::string_view path, std::size_t size) {
+    _length = std::min(path.size(), _path.size());
+    std::copy_n(path.begin(), _length, _path.begin());
+    _size = size;
+  }
+  std::string_view path() const { return {_path.data(), _length}; }
+  std::size_t size() const { return _size; }
+
+ private:
+  std::array<char, 4096> _path{};
+  std::size_t _length = 0;
+  std::size_t _size = 0;
 };
 
 }  // namespace device

@@ -1,5 +1,6 @@
 #include "device/services/PropertyListService.h"
 
+#include <string>
 #include <utility>
 
 #include "device/services/LastRead.h"
@@ -21,7 +22,7 @@ Value PropertyListService::propertyListWithData(Bytes bytes, ErrorRef* error) {
                                [&] { return plist::read(std::move(bytes), &reason); });
   if (value.isAbsent() && _unreadable && !Boundary::isDeclined(reason)) {
     const LastRead& file = LastRead::ofThisThread();
-    _unreadable(file.size == size ? file.path : file.path + ", in it",
+    _unreadable(std::string(file.path()) + (file.size() == size ? "" : ", in it"),
                 reason ? std::string_view(reason->description()) : "no reason given");
   }
   platform::setError(error, std::move(reason));

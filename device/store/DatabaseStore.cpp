@@ -172,8 +172,13 @@ class DatabaseStore final : public Store {
       if (!put(changes[i], values[i])) return fail(error);
     }
     if (!transaction.commit()) return fail(error);
-    for (const auto& change : changes) _records.apply(change);
+    remember(changes);
     return true;
+  }
+
+  /// What is stored cannot be taken back: without the memory for it the process ends here.
+  void remember(const std::vector<StoreRecord>& changes) noexcept REQUIRES(_mutex) {
+    for (const auto& change : changes) _records.apply(change);
   }
 
   bool fail(ErrorRef* error, std::string_view text = {}) const REQUIRES(_mutex) {

@@ -17,6 +17,7 @@
 #include "tsd/CommandError.h"
 #include "tsd/OptionTable.h"
 #include "tsd/command/Commands.h"
+#include "tsd/command/LastWords.h"
 #include "tsd/daemon/InjectionRules.h"
 #include "tsd/help/HelpText.h"
 #include "tsd/terminal/Output.h"
@@ -559,13 +560,6 @@ ExitCode run(int count, char** arguments) {
   return ExitCode::usage;
 }
 
-/// For what happens where nothing can be allocated any more.
-void sayWithoutMemory(const char* text) {
-  std::fputs("tsd: ", stderr);
-  std::fputs(text, stderr);
-  std::fputs("\n", stderr);
-}
-
 }  // namespace
 }  // namespace tsd
 
@@ -573,6 +567,7 @@ int main(int count, char** arguments) {
   // A reader that goes away must not end a sync in the middle, nor a file that may not grow: that is a full disk.
   std::signal(SIGPIPE, SIG_IGN);
   std::signal(SIGXFSZ, SIG_IGN);
+  tsd::endWithMessageWithoutMemory();
   try {
     return static_cast<int>(tsd::run(count, arguments));
   } catch (const std::bad_alloc&) {
