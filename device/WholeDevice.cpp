@@ -25,6 +25,7 @@
 #include "device/services/TSSupportService.h"
 #include "device/services/TransactionLogService.h"
 #include "platform/DeviceNames.h"
+#include "platform/DevicePaths.h"
 
 namespace device {
 
@@ -74,7 +75,10 @@ class WholeDevice final : public LocalDevice {
         _installer(_records, _boundary),
         _backup(_boundary, [this] { return settings(); }),
         _restrictions(_boundary, [this] { return settings(); }),
-        _homeScreen(_records, _boundary),
+        _homeScreen(_records, _boundary,
+                    [failed = options.fileFailed](const std::string& reason) {
+                      if (failed) failed("setting the icon layout", platform::iconLayoutPath, reason);
+                    }),
         _iconRenderer(_records, *_files, _boundary),
         _imageEncoder(_boundary),
         _transactionLog(_boundary),

@@ -174,7 +174,7 @@ class Hosts(Folder):
             (lambda: [pathlib.Path(f"host/{app}", name).write_text("no PNG") for name in ["AppIcon.png", "HarluneArtwork"]],
              DONE, "note", app, 0, "no icon"),
             (lambda: write("host/PanelloIconState.plist", [[app], [3]]), DONE, "note", "PanelloIconState.plist", 8,
-             "something in it is no text"),
+             "entry 2 is no page of identifiers"),
             (lambda: write(f"host/{RESTORED}", {app: {}}), SOME_FAILED, "problem", RESTORED, 5, "it is passed over"),
             (lambda: pathlib.Path(f"host/{RESTORED}").write_text("?"), FAILED, "error", RESTORED, 0, "neither an XML"),
             (lambda: write(f"host/{DEMOTED}", {"AutomaticDowngrades": ["com.example.x"]}), DONE, "note", DEMOTED, 5,

@@ -24,7 +24,7 @@ import unittest
 import zipfile
 
 TSD = None
-DONE, SOME_FAILED = 0, 3
+DONE, FAILED, SOME_FAILED = 0, 1, 3
 NOBODY = 65534
 SECRET = b"what nobody but its owner may see"
 
@@ -118,6 +118,28 @@ FOLDERS = [
     Row("twins", lambda folder, package: (folder / "INFO.PLIST").touch()),
     Row("setuid", entry(lambda path: (path.touch(), path.chmod(0o6777)))),
 ]
+
+
+def list_of(value, name=""):
+    """The property list of an app's file, or of the host's."""
+    content = value if isinstance(value, bytes) else plistlib.dumps(value, fmt=plistlib.FMT_BINARY)
+    return lambda folder, package: (folder / name).write_bytes(content)
+
+
+GARBAGE = b"bplist00 garbage, and no list at all, of some length"
+MANIFEST, METADATA, LAYOUT = "Info.plist", "HarluneMetadata.plist", "../PanelloIconState.plist"
+# Lists that the plug-in passes over in silence.
+LISTS = [
+    *[Row(f"{name} of {value!r}", list_of(value, name), f"{pathlib.Path(name).name}: {doing} failed: {reason}")
+      for name, doing, values in (
+          (MANIFEST, "reading the property list", {GARBAGE: r"byte \d+: ", b"": "an empty", ("x",): "it is not a dict"}),
+          (METADATA, "reading the property list", {GARBAGE: r"byte \d+: ", b"": "an empty", "x": "it is not a dict"}),
+          (LAYOUT, "setting the icon layout", {GARBAGE: r"byte \d+: ", "x": "it is not an array",
+                                               ("a", 7): "entry 2 is no identifier", ("a", ""): "entry 2 is no identifier",
+                                               (("a",), "b"): "entry 2 is no page", ((), (1,)): "entry 2 is no page"}),
+          (LAYOUT, "reading the property list", {b"": "an empty document"}))
+      for value, reason in values.items()],
+]
 FOR_ROOT = [Row("a device", entry(make_device), "/x: not pushed: a device")]
 FOR_NOBODY = [
     Row("an unreadable folder", entry(lambda path: path.mkdir(0)), "/x: not pushed: Permission denied"),
@@ -201,6 +223,8 @@ PACKAGES = [
     Row("setuid", package(file("A.app/s", b"#!", 0o106755))),
     Row("cut", package(file("A.app/c"), then=lambda archive: archive[:-30]), reason="not a zip archive"),
     Row("a tape archive", tar_with_links, reason="not a zip archive"),
+    Row("a garbage manifest", package(manifest=GARBAGE), reason=r"A.app/Info.plist.*byte \d+: "),
+    Row("a manifest that is none", package(manifest=plistlib.dumps(["x"])), reason="A.app/Info.plist.* not a dictionary"),
     Row("of another app", lambda folder, path: path.write_bytes(zipped("com.example.other")), reason="com.example.other"),
     Row("bytes for a name", package(file("A.app/bytes"), then=lambda all: all.replace(b"bytes", b"\xff\xfe\x80\xc0 "))),
 ]
@@ -273,6 +297,9 @@ class Hosts(unittest.TestCase):
     def test_folders(self):
         self.check(FOLDERS)
 
+    def test_lists(self):
+        self.check(LISTS)
+
     def test_packages(self):
         # Bombs are cut short by a limit that the process has, as nobody has the time for the device's own.
         self.run_as = {"preexec_fn": lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (4 << 20, 4 << 20))}
@@ -309,6 +336,30 @@ class Hosts(unittest.TestCase):
         self.use("restore")
         status = json.loads(self.tsd("status", "dev", "--json").stdout)
         self.assertEqual({each["id"] for each in status["apps"] if each["state"]} - {"com.example.deep"}, set(apps))
+
+
+    def test_demoted_lists(self):
+        automatic = '"AutomaticDowngrades"'
+        for value, reason in ((GARBAGE, r"byte \d+: "), (b"", "an empty document"), (["x"], "it is not a dictionary"),
+                              ({"AutomaticDowngrades": self.apps[0]}, f"{automatic} is not an array"),
+                              ({"AutomaticDowngrades": [self.apps[0], 7]}, f"{automatic}: entry 2 is no identifier")):
+            with self.subTest(value):
+                self.prepare()
+                list_of(value, "com.vantor.Cellarum.DemotedApps.plist")(pathlib.Path("host/Restore"), None)
+                report, said = self.use("restore")
+                self.assertRegex(said, rf"DemotedApps.plist: reading the property list failed: {reason}")
+                self.assertEqual({each["outcome"] for each in report["apps"]}, {"PLACED"})
+
+    def test_metadata_on_a_device(self):
+        self.prepare()
+        self.use("sync")
+        path = next(pathlib.Path("dev/fs/var/containers").rglob("HarluneMetadata.plist"))
+        for value, reason in ((GARBAGE, r"byte \d+: "), (["x"], "it is not a dictionary")):
+            list_of(value, path.name)(path.parent, None)
+            for command, codes in ((("backup", "dev"), [FAILED]), (("query", "dev", "accounts"), [DONE])):
+                with self.subTest(value, command=command):
+                    said = os.fsdecode(self.tsd(*command, codes=codes).stderr)
+                    self.assertRegex(said, rf"{path.name}: reading the property list failed: {reason}")
 
 
 if __name__ == "__main__":

@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "device/records/RecordCodec.h"
+#include "device/screen/IconLayout.h"
 #include "plist/PropertyList.h"
 
 namespace device {
@@ -49,16 +50,23 @@ int HomeScreenService::PNGetFlattenedIconState(Port port, int form, void** buffe
 }
 
 int HomeScreenService::PNSetIconState(Port port, platform::BytesView layout) {
+  std::string problem;
   auto set = [&] {
-    auto parsed = layoutOfValue(plist::read(platform::Bytes(layout)));
+    platform::ErrorRef error;
+    const platform::Value value = plist::read(platform::Bytes(layout), &error);
+    problem = error ? error->description() : problemOfLayout(value).text;
+    auto parsed = layoutOfValue(value);
     if (!parsed) return invalidArgument;
     ChangeSet changes;
     changes.setLayout(std::move(*parsed));
     AppRecords::Lock lock(_records);
     return _records.commit(std::move(changes)) ? 0 : notStored;
   };
-  return _boundary.call({{className, "PNSetIconState"}}, nullptr,
-                        {{"port", port}, {"layout", CallArgument::BytesCount{layout.size()}}}, set, notStored);
+  const int status =
+      _boundary.call({{className, "PNSetIconState"}}, nullptr,
+                     {{"port", port}, {"layout", CallArgument::BytesCount{layout.size()}}}, set, notStored);
+  if (!problem.empty() && _refused) _refused(problem);
+  return status;
 }
 
 }  // namespace device

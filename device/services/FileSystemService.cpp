@@ -4,6 +4,7 @@
 
 #include "device/files/DevicePath.h"
 #include "device/services/LastRead.h"
+#include "device/services/ListProblem.h"
 
 namespace device {
 
@@ -87,6 +88,8 @@ std::optional<Bytes> FileSystemService::readFile(std::string_view path, ErrorRef
   auto bytes = run({className, "readFile"}, path, error, {{"path", path}},
                    [&](ErrorRef* reason) { return _files.readFile(path, reason); });
   if (bytes) LastRead::ofThisThread().set(path, bytes->size());
+  if (bytes && bytes->empty() && maySeemMissing(path) && _failed)
+    _failed("reading the property list", path, "an empty document");
   return bytes;
 }
 

@@ -4,6 +4,7 @@
 #include <array>
 #include <cstddef>
 #include <string_view>
+#include <utility>
 
 namespace device {
 
@@ -23,12 +24,15 @@ class LastRead {
     _size = size;
   }
   std::string_view path() const { return {_path.data(), _length}; }
-  std::size_t size() const { return _size; }
+  /// Whether bytes of this size are the file's content; asked once, before they are read as a list.
+  bool isWhole(std::size_t size) { return std::exchange(_size, unknown) == size; }
 
  private:
+  static constexpr std::size_t unknown = ~std::size_t{0};
+
   std::array<char, 4096> _path{};
   std::size_t _length = 0;
-  std::size_t _size = 0;
+  std::size_t _size = unknown;
 };
 
 }  // namespace device

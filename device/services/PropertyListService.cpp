@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "device/services/LastRead.h"
+#include "device/services/ListProblem.h"
 #include "plist/PropertyList.h"
 
 namespace device {
@@ -20,10 +21,12 @@ Value PropertyListService::propertyListWithData(Bytes bytes, ErrorRef* error) {
   Value value = _boundary.call({{"PropertyListSerialization", "propertyListWithData"}}, &reason,
                                {{"bytes", CallArgument::BytesCount{size}}},
                                [&] { return plist::read(std::move(bytes), &reason); });
-  if (value.isAbsent() && _unreadable && !Boundary::isDeclined(reason)) {
-    const LastRead& file = LastRead::ofThisThread();
-    _unreadable(std::string(file.path()) + (file.size() == size ? "" : ", in it"),
-                reason ? std::string_view(reason->description()) : "no reason given");
+  LastRead& file = LastRead::ofThisThread();
+  if (file.isWhole(size) && _unreadable && !Boundary::isDeclined(reason)) {
+    const std::string problem = !value.isAbsent() ? problemOfList(file.path(), value)
+                                : reason          ? reason->description()
+                                                  : "no reason given";
+    if (!problem.empty()) _unreadable(file.path(), problem);
   }
   platform::setError(error, std::move(reason));
   return value;

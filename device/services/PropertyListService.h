@@ -12,8 +12,8 @@ namespace device {
 /// The property-list codec behind the boundary.
 class PropertyListService final : public platform::PropertyListSerialization {
  public:
-  /// Told of every document that cannot be read, as the plug-in passes over some in silence: the file that it came from
-  /// and the reason. From any thread. May be null.
+  /// Told of every file that is not the list it ought to be, as the plug-in passes over some in silence: its path and
+  /// the reason. From any thread. May be null.
   using Unreadable = std::function<void(std::string_view path, std::string_view reason)>;
   PropertyListService(Boundary& boundary, Unreadable unreadable)
       : _boundary(boundary), _unreadable(std::move(unreadable)) {}

@@ -9,6 +9,7 @@
 
 #include "device/install/AppIdentifier.h"
 #include "device/screen/IconImage.h"
+#include "device/screen/IconLayout.h"
 #include "platform/TodoOperation.h"
 #include "plist/ElementLines.h"
 #include "plist/PropertyList.h"
@@ -217,16 +218,19 @@ void HostCheck::checkAppFolder(const std::string& app) {
 void HostCheck::checkLayout() {
   const List list = readList(_host + "/" + std::string(iconLayoutName), Kind::array, Weight::note,
                              "leave it out, or write an array of pages of identifiers");
+  if (!list.value.array()) return;
+  if (auto problem = device::problemOfLayout(list.value); !problem.text.empty()) {
+    add({Weight::note, list.path, list.lineOf(problem.place), "",
+         "the home screen does not take this layout: " + problem.text,
+         "write an array of identifiers, or of pages of them"});
+    return;
+  }
   std::set<std::string, std::less<>> seen;
   auto look = [&](const Value& each, std::size_t line) {
-    if (!each.string()) {
-      add({Weight::note, list.path, line, "", "the home screen does not take this layout: something in it is no text",
-           "write an array of identifiers, or of pages of them"});
-    } else if (!seen.emplace(*each.string()).second) {
+    if (!seen.emplace(*each.string()).second)
       add({Weight::note, list.path, line, std::string(*each.string()), "it is there twice", "leave one of them"});
-    }
   };
-  for (std::size_t place = 0; list.value.array() && place < list.value.array()->size(); ++place) {
+  for (std::size_t place = 0; place < list.value.array()->size(); ++place) {
     const Value& each = (*list.value.array())[place];
     if (!each.array()) {
       look(each, list.lineOf(place));
