@@ -16,6 +16,7 @@ import sys
 import unittest
 
 import tsd_folder
+from colliding_names import bytes_that_cancel_a_key, harmless, names_of_one_hash
 from tsd_folder import DONE, FAILED, SOME_FAILED
 from hostile_host import zipped
 
@@ -125,7 +126,7 @@ XML = {
 }
 
 
-class Lists(tsd_folder.Folder):
+class Costs(tsd_folder.Folder):
     def setUp(self):
         super().setUp()
         self.apps = self.make(2)
@@ -145,6 +146,8 @@ class Lists(tsd_folder.Folder):
         self.assertIn(int(code), (DONE, FAILED, SOME_FAILED), run.stderr)
         return int(memory), float(seconds)
 
+
+class Lists(Costs):
     # Each puts a document made of the objects in its place, and answers the command that comes across it.
 
     def as_todo_list(self, make):
@@ -209,6 +212,47 @@ class Lists(tsd_folder.Folder):
             for path in written:
                 marks = [entry["operation"] for entry in plistlib.loads(path.read_bytes())]
                 self.assertEqual(marks, ["INSTALLED"] * 2, path)
+
+
+class Names(Costs):
+    """Names that collide in every table that has no secret cost what others of their length cost."""
+
+    def write(self, name, value):
+        pathlib.Path("host", name).write_bytes(plistlib.dumps(value, fmt=plistlib.FMT_BINARY))
+
+    def as_entries(self, names):
+        self.write("ApplicationsSync.plist", [{"identifier": name, "operation": "keep"} for name in names])
+        return "sync"
+
+    def as_keys(self, names):
+        self.write(f"{self.apps[0]}/Info.plist", {**dict.fromkeys(names, 1), "KBBundleIdentifier": self.apps[0]})
+        return "sync"
+
+    def as_icons(self, names):
+        self.write("PanelloIconState.plist", names)
+        return "sync"
+
+    def as_demoted(self, names):
+        self.write("Restore/com.vantor.Cellarum.DemotedApps.plist", {"AutomaticDowngrades": names})
+        return "restore"
+
+    def as_values(self, names):
+        todo = [{"identifier": app, "operation": "install", "x": names} for app in self.apps]
+        self.write("ApplicationsSync.plist", todo)
+        return "sync"
+
+    def test_names_that_collide(self):
+        names, contents = names_of_one_hash(), bytes_that_cancel_a_key(60_000)
+        for place, colliding in ((self.as_entries, names), (self.as_keys, names), (self.as_icons, names),
+                                 (self.as_demoted, names), (self.as_values, names), (self.as_values, contents)):
+            seconds = []
+            for each in (harmless(colliding), colliding):
+                self.renew()
+                seconds.append(self.cost(place(each), "dev", "host", "--progress", "none")[1])
+            with self.subTest(place.__name__, of=type(colliding[0])):
+                if os.environ.get("SHOW_COSTS"):
+                    print(f"{place.__name__:12} {seconds[0]:6.2f} s, colliding {seconds[1]:6.2f} s", flush=True)
+                self.assertLess(seconds[1], SECONDS + 3 * seconds[0])
 
 
 class Files(tsd_folder.Folder):
