@@ -2,11 +2,12 @@
 /// fail to start, and all after it; `SCARCE_MEMORY=3` does the same with allocations, `SCARCE_MEMORY=3!` with the third
 /// alone; `SCARCE_LARGEST=3` lets every allocation of more than three bytes fail. `SCARCE_COUNT=FILE` writes the number
 /// of allocations when the program ends. What libraries allocate before `main` does not count: some of them end the
-/// process then.
+/// process then. `SCARCE_TIME=3` sets the clock to two and a half seconds before 1970.
 
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <pthread.h>
+#include <time.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -68,6 +69,19 @@ int __libc_start_main(Main program, int count, char** arguments, void (*init)(),
   programsMain = program;
   auto start = reinterpret_cast<Start>(dlsym(RTLD_NEXT, "__libc_start_main"));
   return start(beginning, count, arguments, init, fini, end, stack);
+}
+
+using Clock = int (*)(clockid_t, timespec*);
+
+int clock_gettime(clockid_t clock, timespec* time) {
+  static bool ignored = false;
+  static const unsigned long before = numberIn("SCARCE_TIME", &ignored);
+  static const auto read = reinterpret_cast<Clock>(dlsym(RTLD_NEXT, "clock_gettime"));
+  int status = read(clock, time);
+  if (before == 0 || clock != CLOCK_REALTIME || status != 0) return status;
+  // Half a second, so that a second that is rounded the wrong way shows.
+  *time = {-static_cast<time_t>(before), 500'000'000};
+  return status;
 }
 
 using Create = int (*)(pthread_t*, const pthread_attr_t*, void* (*)(void*), void*);

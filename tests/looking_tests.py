@@ -61,6 +61,8 @@ class Looking(Folder):
         os.environ["TMPDIR"] = str(pathlib.Path("tmp").resolve())
         self.addCleanup(lambda: os.environ.pop("TMPDIR") if outside is None else os.environ.update(TMPDIR=outside))
         first = self.document("plan", "dev", "host")["apps"][0]["id"]
+        self.tsd("plan", "dev", "host", "--inject", "AppsClient.outstandingAssetTransfers=kill", code=-signal.SIGKILL)
+        self.views(app, "plan")
         sync = Stuck("dev", "host", until=f'"op":"assetTransferUpdatedProgress","app":"{first}","args":{{"asset"')
         self.addCleanup(sync.kill)
         try:

@@ -103,6 +103,13 @@ class Scarcity(tsd_folder.Folder):
         self.assertRegex(": ".join(outcomes[app]), rf"\AFAILED: .*{app}.pkg.*: out of memory")
         self.check_recovers("sync", "dev", "host")
 
+    def test_a_clock_that_nobody_set(self):
+        self.run_short("sync", "dev", "host", "--progress", "none", SCARCE_TIME="3")
+        began = "1969-12-31T23:59:57.500Z"
+        self.assertEqual(json.loads(pathlib.Path("dev/runs/0001-sync/run.json").read_text())["began"], began)
+        self.assertEqual([run["began"] for run in self.document("runs", "dev")["runs"]], [began])
+        self.tsd("why", "dev", self.apps[0])
+
     def test_a_file_that_may_not_grow(self):
         def limited():
             becomes_ordinary()

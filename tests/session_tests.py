@@ -239,6 +239,22 @@ class Syncs(Folder):
         reports = self.sync("dev", "host", "--repeat", "2")["runs"]
         self.assertEqual([report["deleted"] for report in reports], [[apps[0]], []])
 
+    def test_a_removed_app_is_told_again_after_a_kill_unless_it_is_wanted_back(self):
+        apps = self.make(2)
+        self.sync("dev", "host")
+        self.tsd("uninstall", "dev", apps[0])
+        os.rename("dev", "fresh")
+        for wanted, told in ((True, []), (False, [apps[0]])):
+            with self.subTest(wanted=wanted):
+                if not wanted:
+                    self.tsd("host", "remove", "host", apps[0])
+                shutil.copytree("fresh", "dev")
+                self.tsd("sync", "dev", "host", "--inject", "AppsClient.outstandingAssetTransfers=kill",
+                         code=-signal.SIGKILL)
+                reports = self.sync("dev", "host", "--repeat", "2")["runs"]
+                self.assertEqual([report["deleted"] for report in reports], [told, []])
+                shutil.rmtree("dev")
+
 
 class Explanations(Folder):
     def plan(self, *options):
