@@ -154,7 +154,7 @@ def token_sites(source, tokens, partners):
             if declared >= 0 or not re.match(r"\s*(const |auto)", source[begin:end]):
                 yield Site("condition negated", begin, end, f"!({source[begin:end].strip()})")
         elif token.kind == "sign" and token.text in EXCHANGED and spaced(source, token):
-            yield Site(f"{token.text} for {EXCHANGED[token.text]}"[::1], token.begin, token.end, EXCHANGED[token.text])
+            yield Site(f"{EXCHANGED[token.text]} for {token.text}", token.begin, token.end, EXCHANGED[token.text])
         elif token.text in ("true", "false"):
             yield Site("constant changed", token.begin, token.end, EXCHANGED[token.text])
         elif token.text == "!" and tokens[place + 1].text != "=" and not source[token.end].isspace():

@@ -1,35 +1,47 @@
 #!/usr/bin/env python3
 """Plants faults by the dice, one at a time, and sees whether the tests find them: says how good the tests are.
 
-usage: random_mutants.py BUILD [--area plugin|values|install] [--count N] [--seed S] [--jobs N] [--only FILE]
+usage: random_mutants.py BUILD [--area plugin|values|install] [--count N] [--seed S] [--jobs N] [--only FILE] [--again]
 
 A statement, a guard or a message goes, a condition is negated, an operator, a constant or a text becomes another one,
 two neighbouring statements change places. One object is compiled and linked for each; a fault that does not compile is
 drawn again. It is found when a test fails, crashes or does not end. What survives is printed with its place, and is
 either equivalent to what was there, which a line of tests/mutants/equivalent.txt says with the reason, or wants a test.
-The copies of the sources and their builds lie in BUILD, one for each job. Ends with 1 when fewer were found than the
-area's goal.
+
+The copies of the sources and their builds lie in BUILD, one for each job. BUILD/AREA.jsonl keeps what became of each
+fault: another run, with another seed or after an interruption, plants what was not planted yet, and the figures are of
+all of them. `--again` plants the survivors once more, when tests were added. A fault is another one as soon as its file
+has changed. Ends with 1 when fewer were found than the area's goal.
 """
 
 import argparse
 import collections
 import concurrent.futures
+import hashlib
 import json
+import os
 import pathlib
 import queue
 import random
+import shutil
+import signal
 import subprocess
 import sys
+import threading
+import time
 from typing import NamedTuple
 
 from fault_sites import sites_of
-from source_copy import Copy, ROOT
+from quick_build import QuickCopy
+from source_copy import ROOT
 
 SEEDS = "300"
+# A fault may want all memory, or write without end.
+BOUNDED = ["sh", "-c", 'ulimit -c 0; ulimit -v 4000000; ulimit -f 2000000; exec "$@"', "sh"]
 
 
 class Area(NamedTuple):
-    """Where faults are planted, what is built anew with one, which tests have to find it, and how many of a hundred."""
+    """Where faults are planted, what is built for it, which tests have to find one, and how many of a hundred."""
 
     folders: list
     targets: list
@@ -37,19 +49,25 @@ class Area(NamedTuple):
     goal: int
 
 
-# Suites in the order in which they are asked; a word that begins with "@" is a file of the copy, "%" one of its build.
+def journals(test):
+    return [sys.executable, "@tests/journal_tests.py", "%bin/tsd", "%bin/plugin_tests", f"Journals.{test}"]
+
+
+# A word that begins with "@" is a file of the copy, "%" one of its build.
 PLUGIN_SUITES = [
     ["%bin/plugin_tests", "--gtest_filter=-*Simulation*:*Sweep*:*Thread*"],
-    ["%bin/plugin_tests", "--gtest_filter=*Simulation*:*Sweep*"],
-    ["%bin/plugin_tests", "--gtest_filter=*Thread*"],
-    [sys.executable, "@tests/journal_tests.py", "%bin/tsd", "%bin/plugin_tests", "Journals"],
+    ["%bin/plugin_tests", "--gtest_filter=*Sweep*:*Thread*"],
+    ["%bin/plugin_tests", "--gtest_filter=*Simulation*"],
+    *map(journals, ["test_chosen_cases", "test_every_call_failed", "test_lives_of_a_device", "test_the_program"]),
+    ["%bin/exception_tests"],
 ]
+PLUGIN_TARGETS = ["ApplicationSync", "plugin_tests", "exception_tests", "tsd"]
 AREAS = {
-    "plugin": Area(["core", "transfer", "coordination", "restore", "placeholder"],
-                   ["ApplicationSync", "plugin_tests", "tsd"], PLUGIN_SUITES, 97),
-    "values": Area(["platform", "plist"], ["ApplicationSync", "plugin_tests", "property_list_tests", "device_foundation_tests", "tsd"],
+    "plugin": Area(["core", "transfer", "coordination", "restore", "placeholder"], PLUGIN_TARGETS, PLUGIN_SUITES, 97),
+    "values": Area(["platform", "plist"], [*PLUGIN_TARGETS, "property_list_tests", "device_foundation_tests"],
                    [["%bin/property_list_tests"], ["%bin/device_foundation_tests"], *PLUGIN_SUITES], 90),
-    "install": Area(["device/package", "device/reports", "device/install", "device/coordination"], ["plugin_tests", "device_service_tests", "contract_tests", "tsd"],
+    "install": Area(["device/package", "device/reports", "device/install", "device/coordination"],
+                    [*PLUGIN_TARGETS, "device_service_tests", "contract_tests"],
                     [["%bin/device_service_tests"], ["%bin/contract_tests"], *PLUGIN_SUITES], 90),
 }
 
@@ -64,8 +82,11 @@ class Fault(NamedTuple):
     def name(self):
         return f"{self.file}:{self.line} {self.kind}: {self.was}"
 
+    def key(self):
+        return hashlib.sha256(f"{self.file} {self.text}".encode()).hexdigest()[:16]
 
-def one_line(text, most=100):
+
+def one_line(text, most=140):
     text = " ".join(text.split())
     return text if len(text) <= most else text[:most - 1] + "…"
 
@@ -78,51 +99,96 @@ def faults_of(area, only):
                 continue
             source = path.read_text(encoding="utf-8")
             for site in sites_of(source):
-                # A short one is told by its whole line.
                 was = source[site.begin:site.end]
                 if len(was) < 12:
-                    was = source[source.rfind("\n", 0, site.begin) + 1:source.find("\n", site.end)]
+                    # A short one is shown in its line.
+                    was = f"{source[source.rfind(chr(10), 0, site.begin) + 1:site.begin]}«{was}»" \
+                          f"{source[site.end:source.find(chr(10), site.end)]}"
                 yield Fault(file, site.kind, source.count("\n", 0, site.begin) + 1, one_line(was),
                             source[:site.begin] + site.planted + source[site.end:])
 
 
-class Job(Copy):
+class Job(QuickCopy):
     """One copy, in which one fault after another is tried."""
 
     def __init__(self, folder, area):
-        super().__init__(folder, "debug", "-DCMAKE_CXX_FLAGS=-O1 -g0", "-DCMAKE_CXX_FLAGS_DEBUG=")
-        self._area = area
-        if wrong := self.make(*area.targets):
-            sys.exit(wrong)
-        if found := self.tests():
-            sys.exit(f"without a fault, {found}")
+        super().__init__(folder, area.folders, area.targets)
+        self._scratch = folder / "scratch"
+        self._suites = [Suite(words) for words in area.suites]
+        for suite in self._suites:
+            began = time.monotonic()
+            if found := self._run(suite, 1200):
+                sys.exit(f"without a fault, {found}")
+            suite.unmutated = suite.spent = time.monotonic() - began
 
-    def tests(self):
+    def _run(self, suite, limit):
         """Which test failed; empty: none."""
         places = {"%": self.build, "@": self.sources}
-        for words in self._area.suites:
-            command = [str(places[word[0]] / word[1:]) if word[0] in places else word for word in words]
-            if words[0][0] == "%":
-                command += ["--gtest_brief=1", "--gtest_fail_fast"]
+        command = [str(places[word[0]] / word[1:]) if word[0] in places else word for word in suite.words]
+        if suite.words[0][0] == "%":
+            command += ["--gtest_brief=1", "--gtest_fail_fast"]
+        shutil.rmtree(self._scratch, ignore_errors=True)
+        self._scratch.mkdir()
+        environment = {"APPSYNC_SEEDS": SEEDS, "PATH": "/usr/bin:/bin", "TMPDIR": str(self._scratch)}
+        with subprocess.Popen([*BOUNDED, *command], stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True,
+                              errors="replace", start_new_session=True, env=environment) as running:
             try:
-                ended = subprocess.run(command, capture_output=True, text=True, check=False, timeout=120, errors="replace",
-                                       env={"APPSYNC_SEEDS": SEEDS, "PATH": "/usr/bin:/bin"})
+                output, _ = running.communicate(timeout=limit)
             except subprocess.TimeoutExpired:
-                return "it does not end"
-            if ended.returncode != 0:
-                lines = [line for line in ended.stdout.splitlines() if "[  FAILED  ]" in line]
-                return lines[0].split("]")[1].split("(")[0].strip() if lines else f"ended with {ended.returncode}"
-        return ""
+                os.killpg(running.pid, signal.SIGKILL)
+                return f"{suite.name()} does not end"
+        if running.returncode == 0:
+            return ""
+        failed = [line.split("]")[1].split("(")[0].strip() for line in output.splitlines() if "[  FAILED  ]" in line]
+        return failed[0] if failed else f"{suite.name()} ended with {running.returncode}"
 
     def try_out(self, fault):
         """What found it; empty: nothing; none: it is no fault, as it does not build."""
-        path = self.sources / fault.file
-        original = path.read_text(encoding="utf-8")
-        path.write_text(fault.text, encoding="utf-8")
-        try:
-            return None if self.make(*self._area.targets) else self.tests()
-        finally:
-            path.write_text(original, encoding="utf-8")
+        with self.exchanged(fault.file, fault.text) as wrong:
+            if wrong:
+                return None
+            # First what has found most in its time.
+            for suite in sorted(self._suites, key=lambda each: -(each.found + 1) / each.spent):
+                began = time.monotonic()
+                found = self._run(suite, 3 * suite.unmutated + 10)
+                suite.spent += time.monotonic() - began
+                if found:
+                    suite.found += 1
+                    return found
+            return ""
+
+
+class Suite:
+    def __init__(self, words):
+        self.words = words
+        self.unmutated = self.spent = 1.0  # seconds
+        self.found = 0
+
+    def name(self):
+        return pathlib.PurePath(self.words[0][1:]).name if self.words[0][0] == "%" else self.words[-1]
+
+
+class Results:
+    """What became of each fault, in a file that grows line by line."""
+
+    def __init__(self, path, again):
+        self._path, self._lock = path, threading.Lock()
+        lines = path.read_text(encoding="utf-8").splitlines() if path.exists() else []
+        self._found = {row["key"]: row["found"] for row in map(json.loads, lines)}
+        self.again = {key for key, found in self._found.items() if found == ""} if again else set()
+
+    def holds(self, fault):
+        return fault.key() in self._found
+
+    def add(self, fault, found):
+        row = fault._asdict() | {"text": "", "key": fault.key(), "found": found}
+        with self._lock, self._path.open("a", encoding="utf-8") as file:
+            file.write(json.dumps(row, ensure_ascii=False) + "\n")
+            self._found[fault.key()] = found
+
+    def planted(self, faults):
+        """(fault, what found it) of those that were built."""
+        return [(fault, found) for fault in faults if (found := self._found.get(fault.key())) is not None]
 
 
 def equivalents():
@@ -130,6 +196,31 @@ def equivalents():
     lines = (ROOT / "tests/mutants/equivalent.txt").read_text(encoding="utf-8").splitlines()
     rows = [line.split(" | ") for line in lines if line and not line.startswith("#")]
     return {tuple(row[:3]): row[3] for row in rows}
+
+
+def without_equivalents(faults, only):
+    """Those that somebody could see. Ends the program when a line of the list fits nothing."""
+    known = equivalents()
+    places = {(fault.file, fault.kind, fault.was) for fault in faults}
+    folders = {fault.file.rsplit("/", 1)[0] for fault in faults}
+    stale = [row for row in known if row not in places and row[0].rsplit("/", 1)[0] in folders]
+    if stale and not only:
+        sys.exit("tests/mutants/equivalent.txt has lines that fit nothing:\n" + "\n".join(map(" | ".join, stale)))
+    return [fault for fault in faults if (fault.file, fault.kind, fault.was) not in known]
+
+
+def summary(results, goal):
+    """Prints the figures; gives the share that was found, in percent."""
+    survivors = [fault for fault, found in results if not found]
+    planted = collections.Counter(fault.kind for fault, _ in results)
+    missed = collections.Counter(fault.kind for fault in survivors)
+    for kind, count in sorted(planted.items()):
+        print(f"{kind:22} {count:5} planted {count - missed[kind]:5} found")
+    for fault in survivors:
+        print(f"survives: {fault.name()}")
+    share = 100 * (len(results) - len(survivors)) / max(1, len(results))
+    print(f"{len(results)} planted, {len(results) - len(survivors)} found: {share:.1f} %, wanted {goal} %")
+    return share
 
 
 def main():
@@ -140,45 +231,39 @@ def main():
     parser.add_argument("--seed", type=int, default=1)
     parser.add_argument("--jobs", type=int, default=2)
     parser.add_argument("--only", default="")
+    parser.add_argument("--again", action="store_true")
     options = parser.parse_args()
-    area, known = AREAS[options.area], equivalents()
+    area = AREAS[options.area]
 
-    drawn = [fault for fault in faults_of(area, options.only) if (fault.file, fault.kind, fault.was) not in known]
+    faults = without_equivalents(list(faults_of(area, options.only)), options.only)
+    options.build.mkdir(parents=True, exist_ok=True)
+    results = Results(options.build / f"{options.area}.jsonl", options.again)
+    drawn = [fault for fault in faults
+             if (fault.key() in results.again if options.again else not results.holds(fault))]
     random.Random(options.seed).shuffle(drawn)
-    print(f"{len(drawn)} places in {', '.join(area.folders)}; seed {options.seed}", flush=True)
-    free = queue.Queue()
-    for number in range(options.jobs):
-        free.put(Job(options.build.resolve() / f"{options.area}-{number}", area))
-
-    results, rest = [], iter(drawn)
-
-    def work():
-        job = free.get()
-        for fault in rest_one_by_one():
-            found = job.try_out(fault)
-            if found is not None:
-                results.append((fault, found))
-                if not found:
-                    print(f"SURVIVES {fault.name()}", flush=True)
+    print(f"{len(faults)} places in {', '.join(area.folders)}, {len(drawn)} to be tried; seed {options.seed}", flush=True)
+    tried, rest = [], iter(drawn)
 
     def rest_one_by_one():
-        while len(results) < options.count and (fault := next(rest, None)):
+        while len(tried) < options.count and (fault := next(rest, None)):
             yield fault
 
-    with concurrent.futures.ThreadPoolExecutor(options.jobs) as pool:
-        for each in [pool.submit(work) for _ in range(options.jobs)]:
-            each.result()
+    def work(number):
+        job = Job(options.build.resolve() / f"{options.area}-{number}", area)
+        for fault in rest_one_by_one():
+            began, found = time.monotonic(), job.try_out(fault)
+            results.add(fault, found)
+            if found is not None:
+                tried.append(fault)
+                how = f"found by {found}" if found else "SURVIVES"
+                print(f"{len(tried):4} {time.monotonic() - began:5.1f} s  {fault.name()}: {how}", flush=True)
 
-    survivors = [fault for fault, found in results if not found]
-    planted = collections.Counter(fault.kind for fault, _ in results)
-    missed = collections.Counter(fault.kind for fault in survivors)
-    for kind, count in sorted(planted.items()):
-        print(f"{kind:22} {count:5} planted {count - missed[kind]:5} found")
-    share = 100 * (len(results) - len(survivors)) / max(1, len(results))
-    print(f"{len(results)} planted, {len(results) - len(survivors)} found: {share:.1f} %, wanted {area.goal} %")
-    rows = [fault._asdict() | {"text": "", "found": found} for fault, found in results]
-    (options.build / f"{options.area}-{options.seed}.json").write_text(json.dumps(rows, indent=1))
-    return 0 if results and share >= area.goal else 1
+    if drawn and options.count:
+        with concurrent.futures.ThreadPoolExecutor(options.jobs) as pool:
+            for each in [pool.submit(work, number) for number in range(options.jobs)]:
+                each.result()
+    planted = results.planted(faults)
+    return 0 if summary(planted, area.goal) >= area.goal and planted else 1
 
 
 if __name__ == "__main__":
