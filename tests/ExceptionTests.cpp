@@ -19,15 +19,26 @@ using Lasts = FailingMemory::Lasts;
 /// Throws after the n-th call of the plug-in to a service or to the log, once.
 class ThrowingService {
  public:
-  explicit ThrowingService(std::size_t nth) : _nth(nth) {}
+  /// Of which calls: every one, or the first of each operation of a service inside of each call into the plug-in.
+  enum class Of { all, everyKind };
+
+  explicit ThrowingService(std::size_t nth, Of of = Of::all) : _nth(nth), _of(of) {}
 
   std::function<void(const device::CallRecord&)> listener() {
     return [this](const device::CallRecord& record) {
+      if (record.service == "AppsClient") {
+        if (record.end) _inside.pop_back();
+        if (!record.end) _inside.push_back(record.operation);
+        return;
+      }
       // What the transaction log makes of a record is inside of the call that records it.
-      if (!armed || record.service == "AppsClient" || record.thread != "daemon" || isTransaction(record)) return;
+      if (!armed || _inside.empty() || isTransaction(record)) return;
       if (record.operation == "deallocateMemory") return;  // the device has yet to do it
+      if (_of == Of::everyKind && !_kinds.insert(_inside.back() + record.service + record.operation).second) return;
       if (++_seen != _nth) return;
       thrownAt = record.operation;
+      isTold = record.service != "log";
+      if (record.operation == "utimes") throw "no exception of the standard library";
       throw std::runtime_error("a service that throws");
     };
   }
@@ -35,6 +46,7 @@ class ThrowingService {
 
   bool armed = false;
   std::string thrownAt{};
+  bool isTold = false;  // it threw elsewhere than in the log, and a message says so
 
  private:
   static bool isTransaction(const device::CallRecord& record) {
@@ -42,8 +54,27 @@ class ThrowingService {
   }
 
   const std::size_t _nth;
+  const Of _of;
   std::size_t _seen = 0;
+  std::vector<std::string> _inside;
+  std::set<std::string> _kinds;
 };
+
+using Names = std::set<std::string>;
+
+/// What the messages say that exceptions stopped.
+Names stoppedIn(const PluginRig& rig) {
+  const std::string said = " was stopped by an exception";
+  Names names;
+  for (const auto& line : rig.messages()) {
+    const auto at = line.find(said);
+    if (at == line.npos) continue;
+    const std::string what = line.substr(at + said.size());
+    names.insert(line.substr(2, at - 2) +
+                 (what == ": a service that throws" || what == ": std::bad_alloc" ? "" : what));
+  }
+  return names;
+}
 
 /// Runs the trial with 1, 2, … until it has no such allocation or call.
 template <class Trial>
@@ -120,7 +151,8 @@ void expectOneFailure(PluginRig& rig, const std::vector<TSAssetRef>& assets, con
 }
 
 TEST(Exceptions, OneAllocationCostsOneInstallAtMost) {
-  forEveryOne([](std::size_t nth) {
+  Names named;
+  forEveryOne([&](std::size_t nth) {
     PluginRig rig;
     stage(rig);
     std::vector<TSAssetRef> assets;
@@ -135,8 +167,10 @@ TEST(Exceptions, OneAllocationCostsOneInstallAtMost) {
     if (seen < nth) {
       EXPECT_EQ(assets.size(), 2u);
     }
+    named.merge(stoppedIn(rig));
     return seen >= nth;
   });
+  EXPECT_EQ(named, (Names{"outstandingAssetTransfers", "prepareAppForInstallUsingCoordination"}));
 }
 
 TEST(Exceptions, AfterMemoryHasComeBackEverythingIsAskedFor) {
@@ -208,7 +242,8 @@ void expectRestored(PluginRig& rig, const ThrowingService* service, Around aroun
 }
 
 TEST(Exceptions, OneAllocationCostsOneRestoredAppAtMost) {
-  forEveryOne([](std::size_t nth) {
+  Names named;
+  forEveryOne([&](std::size_t nth) {
     PluginRig rig(optionsOf(restored));
     std::size_t seen = 0;
     expectRestored(rig, nullptr, [&](auto&& call) {
@@ -216,8 +251,11 @@ TEST(Exceptions, OneAllocationCostsOneRestoredAppAtMost) {
       call();
       seen = memory.seen();
     });
+    named.merge(stoppedIn(rig));
     return seen >= nth;
   });
+  EXPECT_EQ(named, (Names{"_loadDemotedAppsPlist", "_placeHolderForBundleIdentifierWithHarluneMetadata",
+                          "prepareAppForRestoreUsingCoordination"}));
 }
 
 TEST(Exceptions, AServiceThatThrowsCostsOneRestoredAppAtMost) {
@@ -260,6 +298,71 @@ TEST(Exceptions, WhatWasNotReportedAsDeletedIsReportedLater) {
     EXPECT_EQ(rig.exists(lastSyncPath), reported == 0);
     return seen >= nth;
   });
+}
+
+TEST(Exceptions, WhatAServiceStopsIsNamed) {
+  using App = ScenarioApp;
+  const Scenario life{
+      .apps = {{.id = "app.arrives", .hasIcon = true, .report = App::Report::succeeded},
+               {.id = "app.update", .before = App::Before::installed, .transfer = App::Transfer::fails},
+               {.id = "app.wanted", .person = App::Person::prioritizes, .report = App::Report::failed},
+               {.id = "app.unwanted", .before = App::Before::installed, .operation = "remove"},
+               {.id = "app.cancelled", .transfer = App::Transfer::stalls, .person = App::Person::cancels},
+               {.id = "app.stalls", .transfer = App::Transfer::stalls},
+               {.id = "app.refused"}},
+      .rules = {"setPlaceholderPromise:app.refused=fail"},
+      .phaseSucceeded = false};
+  Names named;
+  forEveryOne([&](std::size_t nth) {
+    ThrowingService service(nth, ThrowingService::Of::everyKind);
+    auto options = optionsOf(life);
+    options.told = service.listener();
+    PluginRig rig(options);
+    service.armed = true;
+    run(rig, life);
+    rig.daemon().installedAssetMetrics();
+    rig.daemon().vantorIDsForAssets();
+    rig.daemon().accountsForAssets();
+    rig.daemon().disabledAssetTypes();
+    rig.daemon().prepareForBackup();
+    writeRestoreLists(rig, restored);
+    rig.reconcileRestore(2);
+    rig.deliver();
+    rig.daemon().clearSyncData();
+    service.armed = false;
+    const Names stopped = stoppedIn(rig);
+    EXPECT_EQ(stopped.size(), service.isTold ? 1u : 0u) << service.thrownAt;
+    named.insert(stopped.begin(), stopped.end());
+    return service.seen() >= nth;
+  });
+  std::string shown;
+  for (const auto& name : named) shown += (shown.empty() ? "" : ", ") + name;
+  EXPECT_EQ(shown,
+            "_notifyPanello, _placeHolderForBundleIdentifierWithHarluneMetadata, _processHarluneRestoreInfo, "
+            "accountsForAssets, assetInstallFailed, assetInstallSucceeded, assetSyncFinishedWithStatus, "
+            "assetTransferSucceeded, assetTransferUpdatedProgress, cancelForReason, changeAssetID, "
+            "clearSyncData, coordinatorCanceledWithReason, coordinatorDidCompleteSuccessfully, "
+            "coordinatorDidInstallPlaceholder, coordinatorShouldPrioritize, createDirectory, disabledAssetTypes, "
+            "installedAssetMetrics, installedAssets, logStep, moveItem, outstandingAssetTransfers, "
+            "prepareAppForInstallUsingCoordination, prepareAppForRestoreUsingCoordination, prepareForBackup, "
+            "reconcileRestoreOfType, reconcileSync, removeItem, removeObserver, setupInstallCoordinatorObserver, "
+            "syncEndedWithSuccess, syncEndedWithSuccess of an unknown kind, uninstallAppUsingCoordination, "
+            "vantorIDsForAssets");
+}
+
+TEST(Exceptions, WhatWantOfMemoryStopsIsNamed) {
+  const std::pair<const char*, std::function<void(PluginRig&)>> calls[] = {
+      {"supportedDataclasses", [](PluginRig& rig) { rig.client()->supportedDataclasses(); }},
+      {"currentSyncAnchor", [](PluginRig& rig) { rig.client()->currentSyncAnchor(); }},
+      {"installedAssets", [](PluginRig& rig) { rig.client()->installedAssets(); }}};
+  for (const auto& [name, call] : calls) {
+    PluginRig rig;
+    {
+      FailingMemory memory(1, Lasts::once);
+      call(rig);
+    }
+    EXPECT_EQ(stoppedIn(rig), Names{name});
+  }
 }
 
 }  // namespace

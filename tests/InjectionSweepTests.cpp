@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <cstdlib>
+#include <map>
 #include <string>
 
 #include "tests/ReferenceModel.h"
@@ -48,36 +49,62 @@ void sweep(AnyScenario scenario, std::size_t fewest) {
   }
 }
 
-TEST(InjectionSweep, EveryCallOfASyncFailsOnce) {
-  using App = ScenarioApp;
-  sweep(Scenario{.name = "three installs, a removal, a deletion",
-                 .apps = {{.id = "app.fresh", .hasIcon = true},
-                          {.id = "app.update", .before = App::Before::installed},
-                          {.id = "app.shown", .before = App::Before::placeholder, .path = App::Path::recorded},
-                          {.id = "app.unwanted", .before = App::Before::installed, .operation = "remove"},
-                          {.id = "app.lost", .lost = true, .previousMark = "INSTALLED", .operation = ""},
-                          {.id = "app.last", .operation = "", .inLastSync = true}},
-                 .layout = {"app.update", "app.fresh"}},
-        250);
+using App = ScenarioApp;
+
+const Scenario threeInstalls{
+    .name = "three installs, a removal, a deletion",
+    .apps = {{.id = "app.fresh", .hasIcon = true},
+             {.id = "app.update", .before = App::Before::installed},
+             {.id = "app.shown", .before = App::Before::placeholder, .path = App::Path::recorded},
+             {.id = "app.unwanted", .before = App::Before::installed, .operation = "remove"},
+             {.id = "app.lost", .lost = true, .previousMark = "INSTALLED", .operation = ""},
+             {.id = "app.last", .operation = "", .inLastSync = true}},
+    .layout = {"app.update", "app.fresh"}};
+const Scenario trouble{
+    .name = "transfers that end badly",
+    .apps = {{.id = "app.stalled", .transfer = App::Transfer::stalls},
+             {.id = "app.failed", .before = App::Before::installed, .transfer = App::Transfer::fails},
+             {.id = "app.reported", .report = App::Report::failed}},
+    .phaseSucceeded = false};
+const RestoreScenario threeRestored{.name = "three apps",
+                                    .apps = {{.id = "app.plain"},
+                                             {.id = "app.automatic", .demotedAutomatically = true},
+                                             {.id = "app.byHand", .demotedByHand = true}}};
+
+TEST(InjectionSweep, EveryCallOfASyncFailsOnce) { sweep(threeInstalls, 250); }
+TEST(InjectionSweep, EveryCallOfASyncWithTroubleFailsOnce) { sweep(trouble, 150); }
+TEST(InjectionSweep, EveryCallOfARestoreFailsOnce) { sweep(threeRestored, 90); }
+
+/// What is an error by itself: a service's answer to the question for one.
+bool answersAnError(const Failure& failure) {
+  return failure.point == "RVAppInstallCoordinator.error" ||
+         failure.point == "CLManager.tessaroShouldCreateAppPlaceholdersWithError" ||
+         failure.point == "InstallCoordination.RVCreateUserPresentableError";
 }
 
-TEST(InjectionSweep, EveryCallOfASyncWithTroubleFailsOnce) {
-  using App = ScenarioApp;
-  sweep(Scenario{.name = "transfers that end badly",
-                 .apps = {{.id = "app.stalled", .transfer = App::Transfer::stalls},
-                          {.id = "app.failed", .before = App::Before::installed, .transfer = App::Transfer::fails},
-                          {.id = "app.reported", .report = App::Report::failed}},
-                 .phaseSucceeded = false},
-        150);
+/// Each kind of call in each operation once takes effect and reports an error besides, which changes nothing.
+template <class AnyScenario>
+void errorSweep(AnyScenario scenario, std::size_t fewest) {
+  const std::string clean = predict(scenario).text();
+  std::map<std::string, Failure> kinds;
+  {
+    PluginRig rig(optionsOf(scenario));
+    run(rig, scenario);
+    for (const auto& failure : failuresOf(rig.records())) kinds.emplace(failure.entry + ' ' + failure.point, failure);
+  }
+  ASSERT_GT(kinds.size(), fewest);
+  for (const auto& [kind, failure] : kinds) {
+    if (answersAnError(failure)) continue;
+    const std::string rule = failure.rule();
+    scenario.rules = {rule.substr(0, rule.rfind('=')) + "=error"};
+    PluginRig rig(optionsOf(scenario));
+    EXPECT_EQ(run(rig, scenario).text(), clean) << describe(failure);
+  }
 }
 
-TEST(InjectionSweep, EveryCallOfARestoreFailsOnce) {
-  sweep(RestoreScenario{.name = "three apps",
-                        .apps = {{.id = "app.plain"},
-                                 {.id = "app.automatic", .demotedAutomatically = true},
-                                 {.id = "app.byHand", .demotedByHand = true}}},
-        90);
-}
+TEST(InjectionSweep, AnErrorBesideASyncChangesNothing) { errorSweep(threeInstalls, 100); }
+TEST(InjectionSweep, AnErrorBesideASyncWithTroubleChangesNothing) { errorSweep(trouble, 100); }
+TEST(InjectionSweep, AnErrorBesideARestoreChangesNothing) { errorSweep(threeRestored, 40); }
 
 }  // namespace
 }  // namespace tests

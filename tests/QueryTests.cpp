@@ -100,6 +100,13 @@ TEST(Queries, Accounts) {
        "E [0] unexpected type for DSPersonID", "E [0] unexpected type for AltDSID", "Returning accountInfo: *"}));
 }
 
+TEST(Queries, AnAccountThatCannotBeMadeIsAskedForAgain) {
+  PluginRig rig({.rules = {"makeAccountInfo@1=none"}});
+  installAccounts(rig);
+  // The first app's person has the third app, too.
+  EXPECT_EQ(rig.daemon().accountsForAssets().size(), 4u);
+}
+
 TEST(Queries, DisabledAssetTypes) {
   for (bool installing : {true, false}) {
     for (bool removing : {true, false}) {

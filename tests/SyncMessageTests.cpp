@@ -462,6 +462,12 @@ TEST(SyncMessages, LifeAndDeath) {
     EXPECT_TRUE(rig.device().cancelByPerson("app.a"));
     rig.deliver();
   }
+  // An observer that could not be had is asked for by the next notification.
+  PluginRig twice({.rules = {"makeAppInstallObserver@1=none"}});
+  for (std::size_t posted = 1; posted <= 3; ++posted) {
+    twice.postStartup();
+    EXPECT_EQ(twice.countOf("makeAppInstallObserver"), std::min<std::size_t>(posted, 2));
+  }
   PluginRig elsewhere({.process = "com.vantor.shiftwell"});
   elsewhere.postStartup();
   elsewhere.unload();

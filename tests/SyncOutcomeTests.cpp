@@ -104,13 +104,15 @@ TEST(SyncOutcome, InstallsUnderWayAreLeftAlone) {
                           under("app.e", storeInstall(2, 1, 1)), under("app.f", storeInstall(2, 1, 2)),
                           under("app.g", storeInstall(3, 2, 1)), under("app.h", storeInstall(0, 0, 1)),
                           under("app.i", storeInstall(99, 1, 1)), under("app.j", storeInstall(5, 77, 66)),
-                          under("app.k", paused), under("app.l", idle)}},
-       .outcome = "requested app.b app.g app.h app.j app.k app.l; marks app.a=install app.b=INSTALLED "
-                  "app.c=install app.d=install app.e=install app.f=install app.g=INSTALLED app.h=INSTALLED "
-                  "app.i=install app.j=INSTALLED app.k=INSTALLED app.l=INSTALLED; present app.a=placeholder "
-                  "app.b=installed app.c=placeholder app.d=placeholder app.e=placeholder app.f=placeholder "
-                  "app.g=installed app.h=installed app.i=placeholder app.j=installed app.k=installed "
-                  "app.l=installed; ",
+                          under("app.k", paused), under("app.l", idle), under("app.m", storeInstall(6, 3, 2)),
+                          under("app.n", storeInstall(7, 4, 3)), under("app.o", storeInstall(8, 5, 4))}},
+       .outcome =
+           "requested app.b app.g app.h app.j app.k app.l app.m app.n app.o; marks app.a=install app.b=INSTALLED "
+           "app.c=install app.d=install app.e=install app.f=install app.g=INSTALLED app.h=INSTALLED app.i=install "
+           "app.j=INSTALLED app.k=INSTALLED app.l=INSTALLED app.m=INSTALLED app.n=INSTALLED app.o=INSTALLED; present "
+           "app.a=placeholder app.b=installed app.c=placeholder app.d=placeholder app.e=placeholder app.f=placeholder "
+           "app.g=installed app.h=installed app.i=placeholder app.j=installed app.k=installed app.l=installed "
+           "app.m=installed app.n=installed app.o=installed; ",
        .says = {"Waiting for -applicationInstallsArePrioritized:arePaused: to complete...",
                 "[15] prioritized proxies (*) paused proxies (<OBApplicationProxy app.k placeholder>)",
                 "Got install type=OBInstallTypeSync state=OBInstallStateActive phase=OBInstallPhaseInstalling for "
@@ -126,6 +128,12 @@ TEST(SyncOutcome, InstallsUnderWayAreLeftAlone) {
                 "Got install type=Unknown Install Type: 99 state=OBInstallStateActive *",
                 "Got install type=OBInstallTypeAutomaticUpdate state=Unknown Install State: 77 phase=Unknown Install "
                 "Phase: 66 for app.j",
+                "Got install type=OBInstallTypeMigration state=OBInstallStateCanceled "
+                "phase=OBInstallPhaseRestoringData for app.m",
+                "Got install type=OBInstallTypeDowngrade state=OBInstallStateFailed "
+                "phase=OBInstallPhaseInstallingPlaceholder for app.n",
+                "Got install type=Unknown Install Type: 8 state=OBInstallStateFinished phase=Unknown Install Phase: 4 "
+                "for app.o",
                 "signaling semaphore", "Wait completed",
                 "Assets already in progress (not returning these): (app.a, app.c, app.i)",
                 "Assets currently restoring: (app.d, app.e)"}},

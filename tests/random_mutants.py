@@ -98,14 +98,25 @@ def faults_of(area, only):
             if only and only not in file:
                 continue
             source = path.read_text(encoding="utf-8")
+            seen = collections.Counter()
             for site in sites_of(source):
-                was = source[site.begin:site.end]
-                if len(was) < 12:
-                    # A short one is shown in its line.
-                    was = f"{source[source.rfind(chr(10), 0, site.begin) + 1:site.begin]}«{was}»" \
-                          f"{source[site.end:source.find(chr(10), site.end)]}"
-                yield Fault(file, site.kind, source.count("\n", 0, site.begin) + 1, one_line(was),
+                was = what_was(source, site)
+                seen[site.kind, was] += 1
+                if seen[site.kind, was] > 1:
+                    was += f" ({seen[site.kind, was]})"
+                yield Fault(file, site.kind, source.count("\n", 0, site.begin) + 1, was,
                             source[:site.begin] + site.planted + source[site.end:])
+
+
+def what_was(source, site):
+    """The text in place of which a fault stands; a short one is marked in its line, with the line before a short line."""
+    text = source[site.begin:site.end]
+    if len(text) >= 30:
+        return one_line(text)
+    begin, end = source.rfind("\n", 0, site.begin) + 1, source.find("\n", site.end)
+    if len(source[begin:end].strip()) < 40:
+        begin = source.rfind("\n", 0, begin - 1) + 1
+    return one_line(f"{source[begin:site.begin]}«{text}»{source[site.end:end]}")
 
 
 class Job(QuickCopy):
@@ -199,13 +210,13 @@ def equivalents():
 
 
 def without_equivalents(faults, only):
-    """Those that somebody could see. Ends the program when a line of the list fits nothing."""
+    """Those that somebody could see. Ends the program when a line of the list fits none or several."""
     known = equivalents()
-    places = {(fault.file, fault.kind, fault.was) for fault in faults}
+    places = collections.Counter((fault.file, fault.kind, fault.was) for fault in faults)
     folders = {fault.file.rsplit("/", 1)[0] for fault in faults}
-    stale = [row for row in known if row not in places and row[0].rsplit("/", 1)[0] in folders]
-    if stale and not only:
-        sys.exit("tests/mutants/equivalent.txt has lines that fit nothing:\n" + "\n".join(map(" | ".join, stale)))
+    wrong = [" | ".join(row) for row in known if places[row] != 1 and row[0].rsplit("/", 1)[0] in folders]
+    if wrong and not only:
+        sys.exit("lines of tests/mutants/equivalent.txt that do not fit one place:\n" + "\n".join(wrong))
     return [fault for fault in faults if (fault.file, fault.kind, fault.was) not in known]
 
 

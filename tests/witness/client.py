@@ -355,7 +355,7 @@ class Client:
 
     def on_accountsForAssets(self):
         yield from log("getting accounts for assets")
-        seen = {}
+        seen, shown = {}, set()
         for proxy in (yield from self.apps()):
             _, metadata = yield from self.metadata_of(proxy)
             account = yield from self.account_of(metadata)
@@ -364,22 +364,19 @@ class Client:
                 identifier = yield from self.typed(metadata, "vantorId", str, "vantorID")
             if identifier is None or identifier in seen:
                 continue
-            seen[identifier] = True
-            yield from self.make_account(account, identifier)
-        yield from log(f"Returning accountInfo: {some('.*')}")
+            if (yield from call("TSSupport.makeAccountInfo")):
+                seen[identifier] = True
+                shown.add((yield from self.fill_account(account, identifier)))
+        yield from log("Returning accountInfo: {" + describe(sorted(shown)) + "}")
         return ANY
 
-    def make_account(self, account, identifier):
-        made = yield from call("TSSupport.makeAccountInfo")
-
-        def set_field(operation, **fields):
-            if made:
-                yield from call("TSMutableAccountInfo." + operation, **fields)
+    def fill_account(self, account, identifier):
         person = yield from self.typed(account, "DSPersonID", (int, float), "DSPersonID")
-        yield from set_field("setDSID", number=person)
-        yield from set_field("setVantorID", identifier=identifier)
+        yield from call("TSMutableAccountInfo.setDSID", number=person)
+        yield from call("TSMutableAccountInfo.setVantorID", identifier=identifier)
         other = yield from self.typed(account, "AltDSID", str, "AltDSID")
-        yield from set_field("setAltDSID", identifier=other)
+        yield from call("TSMutableAccountInfo.setAltDSID", identifier=other)
+        return f"<TSMutableAccountInfo vantorID {identifier} DSID {describe(person)} altDSID {describe(other)}>"
 
     def on_disabledAssetTypes(self):
         if (yield from self.is_allowed("Installation")) or (yield from self.is_allowed("Removal")):
