@@ -329,7 +329,9 @@ TEST(Exceptions, WhatAServiceStopsIsNamed) {
     rig.reconcileRestore(2);
     rig.deliver();
     rig.daemon().clearSyncData();
+    rig.postStartup();
     service.armed = false;
+    EXPECT_EQ(rig.countOf("makeAppInstallObserver"), 1u);  // that threw is not among the records
     const Names stopped = stoppedIn(rig);
     EXPECT_EQ(stopped.size(), service.isTold ? 1u : 0u) << service.thrownAt;
     named.insert(stopped.begin(), stopped.end());

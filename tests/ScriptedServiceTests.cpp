@@ -123,6 +123,14 @@ TEST_F(ScriptedServices, PlaceholdersMayLackAnything) {
   EXPECT_TRUE(_client->accountsForAssets().empty());
   EXPECT_EQ(_client->vantorIDsForAssets().size(), 0u);
   _client->prepareForBackup();
+
+  _registry.areOfTheSystem = false;
+  EXPECT_EQ(requested(), (Lines{"app.a", "app.b", "app.bare"}));
+  EXPECT_EQ(said("E missing bundlePath"), 1u);
+  EXPECT_EQ(
+      said("Asset app.bare (pretty=app.bare, version=(null)) prepped with icon (null), at (null), meta at (null), "
+           "info at (null), storePid=0, isRestore=n"),
+      1u);
 }
 
 TEST_F(ScriptedServices, AnOrderOfNoBytesIsNone) {

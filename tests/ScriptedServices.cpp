@@ -3,6 +3,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "platform/OBNumbers.h"
+
 namespace tests {
 
 void ScriptedRegistry::addObserver(std::weak_ptr<Observer> observer) {
@@ -19,6 +21,7 @@ void ScriptedRegistry::removeObserver(const Observer* observer) {
 void ScriptedRegistry::enumerateBundlesOfType(
     std::uint64_t type, const std::function<void(const platform::OBBundleProxyRef&, bool&)>& block) {
   _registry.enumerateBundlesOfType(type, block);
+  if (type == platform::bundleType::systemBundles && !areOfTheSystem) return;
   bool stop = false;
   for (const auto& bundle : bundles) block(bundle, stop);
 }

@@ -26,6 +26,7 @@ class ScriptedRegistry final : public platform::OBApplicationWorkspace {
   explicit ScriptedRegistry(platform::OBApplicationWorkspace& registry) : _registry(registry) {}
 
   std::vector<platform::OBBundleProxyRef> bundles{};                 // of every type, after the device's own
+  bool areOfTheSystem = true;                                        // listed among the system's, too
   std::map<std::string, platform::OBApplicationProxyRef> proxies{};  // in place of the device's
   std::vector<std::pair<Proxies, Proxies>> reports{};                // made to an observer while it is added
   bool isSilent = false;                                             // the device's own reports do not come
