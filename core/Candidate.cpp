@@ -37,11 +37,11 @@ CandidateRef Candidates::find(std::string_view identifier) const {
   return found == _candidates.end() ? nullptr : found->second;
 }
 
-bool Candidates::erase(std::string_view identifier) {
+void Candidates::erase(std::string_view identifier) {
   auto found = _candidates.find(identifier);
-  if (found == _candidates.end()) return false;
+  if (found == _candidates.end()) return;
   _candidates.erase(found);
-  return _order.erase(identifier);
+  _order.erase(identifier);
 }
 
 std::string Candidates::describe() const {

@@ -35,7 +35,7 @@ class Candidates {
   void set(std::string_view identifier, CandidateRef candidate);
   /// Null when there is none.
   CandidateRef find(std::string_view identifier) const;
-  bool erase(std::string_view identifier);
+  void erase(std::string_view identifier);
   std::vector<std::string> identifiers() const { return _order.members(); }
   std::size_t size() const { return _order.size(); }
 

@@ -310,7 +310,7 @@ TEST(Exceptions, WhatAServiceStopsIsNamed) {
                {.id = "app.cancelled", .transfer = App::Transfer::stalls, .person = App::Person::cancels},
                {.id = "app.stalls", .transfer = App::Transfer::stalls},
                {.id = "app.refused"}},
-      .rules = {"setPlaceholderPromise:app.refused=fail"},
+      .rules = {"setPlaceholderPromise:app.refused=fail", "setPlaceholderPromise:" + restored.apps[0].id + "=fail"},
       .phaseSucceeded = false};
   Names named;
   forEveryOne([&](std::size_t nth) {
@@ -365,6 +365,25 @@ TEST(Exceptions, WhatWantOfMemoryStopsIsNamed) {
     }
     EXPECT_EQ(stoppedIn(rig), Names{name});
   }
+}
+
+TEST(Exceptions, ACancellationThatCannotBeRememberedIsPassedOn) {
+  std::size_t passedOn = 0;
+  for (std::size_t nth = 1, seen = 1; seen >= nth; ++nth) {
+    PluginRig rig;
+    stage(rig);
+    rig.daemon().outstandingAssetTransfers();
+    rig.deliver();
+    EXPECT_TRUE(rig.device().cancelByPerson("app.new.with.a.long.name"));
+    {
+      FailingMemory memory(nth, Lasts::once);
+      rig.deliver();
+      seen = memory.seen();
+    }
+    const bool isNamed = stoppedIn(rig) == Names{"coordinatorCanceledWithReason"};
+    if (isNamed && inOrder(rig.messages(), {"Cancelling asset sync for *"})) ++passedOn;
+  }
+  EXPECT_GT(passedOn, 0u);
 }
 
 }  // namespace
