@@ -24,7 +24,7 @@ from witness.engine import Difference, check_journal, read_record
 PLUGIN_TESTS = None
 # They talk to the object itself, which no journal shows.
 WITHOUT_A_BOUNDARY = "Restore.ReportsThatComeTooEarlyOrForNobody:" \
-                     "SyncMessages.CancellationsAreRememberedUntilTheTransferEnds"
+                     "SyncCases.CancellationsAreRememberedUntilTheTransferEnds"
 
 
 def check(path, **facts):
@@ -51,7 +51,7 @@ class Journals(Folder):
         self.check_tests("Simulation.*", seeds * 500, APPSYNC_SEEDS=str(seeds))
 
     def test_chosen_cases(self):
-        self.check_tests("SyncOutcome*:SyncMessages*:Restore*:Queries*", 10_000, others_call_too=True)
+        self.check_tests("SyncOutcome*:SyncCases*:Restore*:Queries*", 10_000, others_call_too=True)
 
     def test_the_program(self):
         dice = random.Random(7)

@@ -110,8 +110,8 @@ def create_placeholder_path(path, app):
     made = yield from call("FileSystem.createDirectory", path=path, withIntermediateDirectories=True,
                            attributes=files.OWNER)
     if not made or made.error:
-        yield from call("InstallTransactionLog.logScenario", scenario="Harlune App Restore", step=0, success=False,
-                        description="Failed to create app directory")
+        yield from call("InstallTransactionLog.logScenario", about=app, scenario="Harlune App Restore", step=0,
+                        success=False, description="Failed to create app directory")
     yield from log(f"Created app directory for '{app}' at {path} with err={describe_error(made.error)}")
     return made
 

@@ -38,16 +38,17 @@ class Difference(AssertionError):
 
 
 class Call:
-    def __init__(self, what, arguments):
+    def __init__(self, what, arguments, about=ANY):
         self.service, self.op = what.split(".", 1)
         self.arguments = known(arguments)
+        self.about = about
 
     def matches(self, record):
         return ((record["service"], record["op"]) == (self.service, self.op) and
-                known(record["args"]) == self.arguments)
+                known(record["args"]) == self.arguments and self.about == record["app"])
 
     def __repr__(self):
-        return f"{self.service}.{self.op} {self.arguments}"
+        return f"{self.service}.{self.op} {self.arguments}" + ("" if self.about is ANY else f" about {self.about}")
 
 
 class Message:
@@ -109,8 +110,8 @@ def some(pattern):
     return f"\x01{pattern}\x02"
 
 
-def call(what, arguments=None, **more):
-    return (yield Call(what, {**(arguments or {}), **more}))
+def call(what, arguments=None, about=ANY, **more):
+    return (yield Call(what, {**(arguments or {}), **more}, about))
 
 
 def log(text, level="default", category="8"):
@@ -122,7 +123,7 @@ def complain(text):
 
 
 def step(number, phase, success, app, description):
-    yield from call("InstallTransactionLog.logStep", step=number, party=1, phase=phase, success=bool(success),
+    yield from call("InstallTransactionLog.logStep", about=app, step=number, party=1, phase=phase, success=bool(success),
                     description=description)
 
 

@@ -337,8 +337,8 @@ def install_failed(asset, error):
     recoverable = yield from is_recoverable(error)
     if recoverable or asset["isRestore"]:
         yield from log(f"{app} install failed but was recoverable: {describe_error(error)}")
-        yield from call("InstallTransactionLog.logScenario", scenario="Orrin restore", step=0, success=False,
-                        description="install failed recoverably")
+        yield from call("InstallTransactionLog.logScenario", about=app, scenario="Orrin restore", step=0,
+                        success=False, description="install failed recoverably")
     else:
         yield from log(f"{app} install failed unrecoverably: {describe_error(error)}")
         yield from files.mark(app, "FAILED")
