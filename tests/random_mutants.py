@@ -15,6 +15,7 @@ has changed. Ends with 1 when fewer were found than the area's goal.
 """
 
 import argparse
+import atexit
 import collections
 import concurrent.futures
 import hashlib
@@ -62,13 +63,25 @@ PLUGIN_SUITES = [
     ["%bin/exception_tests"],
 ]
 PLUGIN_TARGETS = ["ApplicationSync", "plugin_tests", "exception_tests", "tsd"]
+
+
+def seeds(target):
+    return [f"%bin/fuzz_{target}", f"@fuzz/seeds/{target}"]
+
+
 AREAS = {
     "plugin": Area(["core", "transfer", "coordination", "restore", "placeholder"], PLUGIN_TARGETS, PLUGIN_SUITES, 97),
-    "values": Area(["platform", "plist"], [*PLUGIN_TARGETS, "property_list_tests", "device_foundation_tests"],
-                   [["%bin/property_list_tests"], ["%bin/device_foundation_tests"], *PLUGIN_SUITES], 90),
+    "values": Area(["platform", "plist"],
+                   [*PLUGIN_TARGETS, "property_list_tests", "device_foundation_tests", "fuzz_binary_list",
+                    "fuzz_xml_list", "fuzz_round_trip"],
+                   [["%bin/property_list_tests"], ["%bin/device_foundation_tests"],
+                    *map(seeds, ["binary_list", "xml_list", "round_trip"]), *PLUGIN_SUITES], 90),
     "install": Area(["device/package", "device/reports", "device/install", "device/coordination"],
-                    [*PLUGIN_TARGETS, "device_service_tests", "contract_tests"],
-                    [["%bin/device_service_tests"], ["%bin/contract_tests"], *PLUGIN_SUITES], 90),
+                    ["ApplicationSync", "plugin_tests", "tsd", "device_service_tests", "contract_tests",
+                     "fuzz_package"],
+                    [["%bin/device_service_tests"], ["%bin/contract_tests"], seeds("package"), *PLUGIN_SUITES[:3],
+                     *([sys.executable, f"@tests/{name}.py", "%bin/tsd"]
+                       for name in ("hostile_host", "outcome_tests"))], 90),
 }
 
 
@@ -109,7 +122,7 @@ def faults_of(area, only):
 
 
 def what_was(source, site):
-    """The text in place of which a fault stands; a short one is marked in its line, with the line before a short line."""
+    """The text that a fault replaces; a short one is marked in its line, and a short line comes after the one before."""
     text = source[site.begin:site.end]
     if len(text) >= 30:
         return one_line(text)
@@ -124,7 +137,9 @@ class Job(QuickCopy):
 
     def __init__(self, folder, area):
         super().__init__(folder, area.folders, area.targets)
-        self._scratch = folder / "scratch"
+        memory = pathlib.Path("/dev/shm")
+        self._scratch = (memory if memory.is_dir() else folder) / f"{folder.name}.{os.getpid()}"
+        atexit.register(shutil.rmtree, self._scratch, ignore_errors=True)
         self._suites = [Suite(words) for words in area.suites]
         for suite in self._suites:
             began = time.monotonic()
@@ -136,7 +151,7 @@ class Job(QuickCopy):
         """Which test failed; empty: none."""
         places = {"%": self.build, "@": self.sources}
         command = [str(places[word[0]] / word[1:]) if word[0] in places else word for word in suite.words]
-        if suite.words[0][0] == "%":
+        if suite.words[0].endswith("_tests"):
             command += ["--gtest_brief=1", "--gtest_fail_fast"]
         shutil.rmtree(self._scratch, ignore_errors=True)
         self._scratch.mkdir()
@@ -176,7 +191,8 @@ class Suite:
         self.found = 0
 
     def name(self):
-        return pathlib.PurePath(self.words[0][1:]).name if self.words[0][0] == "%" else self.words[-1]
+        shown = self.words[:1] if self.words[0][0] == "%" else [word for word in self.words[1:] if word[0] != "%"]
+        return " ".join(pathlib.PurePath(word).name for word in shown)
 
 
 class Results:
@@ -252,7 +268,7 @@ def main():
     drawn = [fault for fault in faults
              if (fault.key() in results.again if options.again else not results.holds(fault))]
     random.Random(options.seed).shuffle(drawn)
-    print(f"{len(faults)} places in {', '.join(area.folders)}, {len(drawn)} to be tried; seed {options.seed}", flush=True)
+    print(f"{len(faults)} places in {', '.join(area.folders)}, {len(drawn)} to try; seed {options.seed}", flush=True)
     tried, rest = [], iter(drawn)
 
     def rest_one_by_one():
