@@ -84,7 +84,7 @@ mutants: packages ## faults planted in a copy of the sources, for the tests to f
 	  --seed $(or $(SEED),1)
 
 fuzz: fuzz-packages ## looks for inputs that break something: make fuzz RUNS=1000000 TARGETS=xml_list
-	@$(call PRESET,fuzz,$(addprefix fuzz_,$(or $(TARGETS),$(notdir $(wildcard fuzz/seeds/*)))))
+	@$(call PRESET,fuzz,$(addprefix fuzz_,$(or $(TARGETS),$(notdir $(wildcard fuzz/seeds/*))) seeds))
 	@.ci/fuzz build/fuzz $(or $(RUNS),20000) $(TARGETS)
 
 bench: build-all ## the speed of everything against its goals, as a table

@@ -24,7 +24,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   require(facts.nodes <= plist::maximumNodes(size), "the budget of nodes");
   require(facts.text <= plist::maximumText(size), "the budget of text");
   require(facts.depth <= plist::maximumDepth, "the limit of depth");
-  if (facts.nodes > fuzz::largeTree) return -1;
+  if (facts.nodes > fuzz::largeTree(size)) return -1;
   const platform::Value copy = value;
   value = {};
   auto bytes = plist::writeBinary(copy, &error);

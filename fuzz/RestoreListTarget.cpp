@@ -30,7 +30,7 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t s
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const platform::Bytes input(reinterpret_cast<const char*>(data), size);
   const platform::Value list = plist::read(input);
-  if (fuzz::factsOf(list).nodes > fuzz::largeTree) return -1;
+  if (fuzz::factsOf(list).nodes > fuzz::largeTree(size)) return -1;
 
   fuzz::MemoryPhone phone("com.vantor.shiftwell");
   phone.write(restoreListPath, input);

@@ -16,7 +16,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   using fuzz::require;
   platform::Value value = plist::read({reinterpret_cast<const char*>(data), size});
   fuzz::ValueFacts facts = fuzz::factsOf(value);
-  if (value.isAbsent() || facts.nodes > fuzz::largeTree) return 0;
+  if (value.isAbsent() || facts.nodes > fuzz::largeTree(size)) return 0;
 
   platform::ErrorRef error;
   auto binary = plist::writeBinary(value, &error);

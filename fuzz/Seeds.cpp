@@ -1,5 +1,7 @@
-// Writes the seeds: fuzz_seeds FOLDER, where each target's come to lie in a folder of its name.
+// Writes the seeds: fuzz_seeds FOLDER, where each target's come to lie in a folder of its name. fuzz_seeds FOLDER SIZE
+// writes the hostile ones alone, that large.
 
+#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <iostream>
@@ -9,6 +11,7 @@
 #include <utility>
 #include <vector>
 
+#include "fuzz/HostileShapes.h"
 #include "fuzz/SampleApp.h"
 #include "plist/PropertyList.h"
 #include "tests/SampleContent.h"
@@ -149,6 +152,21 @@ void addIcons(Seeds& seeds) {
   seeds.push_back({"icon", "larger-than-drawn", huge});
 }
 
+void addShapes(Seeds& seeds, std::size_t size) {
+  auto add = [&](const char* target, const std::vector<fuzz::Shape>& shapes) {
+    for (const auto& [name, bytes] : shapes) seeds.push_back({target, name, bytes});
+  };
+  add("binary_list", fuzz::binaryShapes(fuzz::Place::bare, size));
+  add("round_trip", fuzz::binaryShapes(fuzz::Place::bare, size));
+  add("xml_list", fuzz::xmlShapes(size));
+  add("todo_list", fuzz::binaryShapes(fuzz::Place::todoList, size));
+  add("restore_list", fuzz::binaryShapes(fuzz::Place::restoreList, size));
+  const Value facts = dictionaryOf({{"KBBundleIdentifier", "com.example.maps"}});
+  add("package",
+      {fuzz::longTable(
+          tests::ZipArchive::of({{"Maps.app/Info.plist", *plist::writeBinary(facts)}, {"Maps.app/x", "x"}}), size)});
+}
+
 bool write(const std::filesystem::path& folder, const Seed& seed) {
   std::filesystem::create_directories(folder / seed.target);
   std::ofstream file(folder / seed.target / seed.name, std::ios::binary);
@@ -158,16 +176,21 @@ bool write(const std::filesystem::path& folder, const Seed& seed) {
 }  // namespace
 
 int main(int count, char** arguments) {
-  if (count != 2) {
-    std::cerr << "usage: fuzz_seeds FOLDER\n";
+  constexpr std::size_t smallSize = 1500;
+  const std::size_t size = count == 3 ? std::strtoul(arguments[2], nullptr, 10) : smallSize;
+  if (count < 2 || count > 3 || size == 0) {
+    std::cerr << "usage: fuzz_seeds FOLDER [SIZE]\n";
     return 2;
   }
   Seeds seeds;
-  addLists(seeds);
-  addTodoLists(seeds);
-  addRestoreLists(seeds);
-  addPackages(seeds);
-  addIcons(seeds);
+  addShapes(seeds, size);
+  if (count == 2) {
+    addLists(seeds);
+    addTodoLists(seeds);
+    addRestoreLists(seeds);
+    addPackages(seeds);
+    addIcons(seeds);
+  }
   for (const auto& seed : seeds) {
     if (!write(arguments[1], seed)) {
       std::cerr << arguments[1] << ": cannot write " << seed.target << '/' << seed.name << '\n';

@@ -54,7 +54,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   static const fuzz::SampleApp app;
   const platform::Bytes input(reinterpret_cast<const char*>(data), size);
   const Value todoList = plist::read(input);
-  if (fuzz::factsOf(todoList).nodes > fuzz::largeTree) return -1;
+  if (fuzz::factsOf(todoList).nodes > fuzz::largeTree(size)) return -1;
 
   fuzz::MemoryPhone phone("com.vantor.tsd");
   phone.write(packagePath, app.package);

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
 
 #include "platform/Value.h"
@@ -15,7 +16,7 @@ struct ValueFacts {
 };
 ValueFacts factsOf(const platform::Value& value);
 
-/// Above that many nodes a document that was read is not worth a fuzzer's time any more.
-inline constexpr std::size_t largeTree = 4096;
+/// Above that many nodes a document that was read from so many bytes is not worth a fuzzer's time any more.
+constexpr std::size_t largeTree(std::size_t size) { return std::max<std::size_t>(4096, size); }
 
 }  // namespace fuzz

@@ -97,7 +97,7 @@ std::size_t mutateList(std::uint8_t* data, std::size_t size, std::size_t maximum
   Mutation mutation(seed);
   if (mutation.oneIn(4)) return LLVMFuzzerMutate(data, size, maximumSize);
   Value value = plist::read({reinterpret_cast<const char*>(data), size});
-  if (value.isAbsent() || factsOf(value).nodes > largeTree) return LLVMFuzzerMutate(data, size, maximumSize);
+  if (value.isAbsent() || factsOf(value).nodes > largeTree(size)) return LLVMFuzzerMutate(data, size, maximumSize);
   value = mutation.of(value);
   auto bytes = mutation.oneIn(2) ? plist::writeBinary(value) : plist::writeXML(value);
   // A string of any bytes has no form; then the bytes of the list change.

@@ -28,21 +28,20 @@ bool isAboutName(const platform::ErrorRef& error) {
   return error && (error->code() == EINVAL || error->code() == ENAMETOOLONG || error->code() == EILSEQ);
 }
 
-CommandError tooMany(const std::string& path) {
-  return CommandError(path + ": more than " + std::to_string(FileConduit::maximumEntries) +
-                      " files and folders are not taken");
+CommandError tooMany(const std::string& path, std::size_t limit) {
+  return CommandError(path + ": more than " + std::to_string(limit) + " files and folders are not taken");
 }
 CommandError tooMuch(const std::string& path) {
   return CommandError(path + ": more than " + std::to_string(FileConduit::maximumBytes) + " bytes are not taken");
 }
 
 /// The names in a directory, sorted.
-std::vector<std::string> namesIn(DIR* directory, const std::string& path) {
+std::vector<std::string> namesIn(DIR* directory, const std::string& path, std::size_t limit) {
   std::vector<std::string> names;
   errno = 0;
   while (const dirent* entry = ::readdir(directory)) {
     if (isFileName(entry->d_name)) names.emplace_back(entry->d_name);
-    if (names.size() > FileConduit::maximumEntries) throw tooMany(path);
+    if (names.size() > limit) throw tooMany(path, limit);
     errno = 0;
   }
   if (errno != 0) throw CommandError(path + ": " + std::strerror(errno));
@@ -110,7 +109,7 @@ void FileConduit::pushDirectory(const Level& level) {
   int descriptor = ::openat(level.directory, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
   Directory directory(descriptor < 0 ? nullptr : ::fdopendir(descriptor));
   if (!directory) throw CommandError(level.hostPath + ": " + std::strerror(errno));
-  for (const auto& name : namesIn(directory.get(), level.hostPath)) {
+  for (const auto& name : namesIn(directory.get(), level.hostPath, _limits.entries)) {
     if (level.depth == 0 && (name == packagesName || name == restoreName)) continue;
     pushItem(level, name);
   }
@@ -124,7 +123,7 @@ void FileConduit::checkStopped() const {
 void FileConduit::pushItem(const Level& level, const std::string& name) {
   checkStopped();
   std::string hostPath = level.hostPath + "/" + name;
-  if (++_entries > maximumEntries) throw tooMany(hostPath);
+  if (++_entries > _limits.entries) throw tooMany(hostPath, _limits.entries);
   std::string devicePath = level.devicePath + "/" + name;
   struct stat facts {};
   if (::fstatat(level.directory, name.c_str(), &facts, AT_SYMLINK_NOFOLLOW) != 0) {

@@ -24,6 +24,7 @@ class FileConduit {
   static constexpr std::uint64_t maximumBytes = std::uint64_t{16} << 30;
 
   struct Limits {
+    std::size_t entries = maximumEntries;
     std::uint64_t fileBytes = maximumBytes;  // a larger file is refused
   };
   /// `isStopped`, if there is one, tells whether to end: asked before each piece of a file.
