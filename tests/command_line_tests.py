@@ -211,6 +211,24 @@ class Shells(Folder):
             run = subprocess.run(["zsh", "-fc", ask], capture_output=True, text=True, env=os.environ | {"HOME": os.getcwd()})
             self.assertEqual(run.stdout, "_tsd\n", run.stderr)
 
+    def test_completion_in_fish(self):
+        if not shutil.which("fish"):
+            self.skipTest("no fish is here")
+        os.mkdir("folder")
+        self.tsd("init", "dev")
+        self.tsd("store", "dev", "com.example.a")
+        pathlib.Path("completion").write_text(self.tsd("completion", "fish").stdout)
+        path = {"PATH": f"{pathlib.Path(tsd_folder.TSD).parent}:{os.environ['PATH']}", "HOME": os.getcwd()}
+        for line, offered in [("sync f", "folder/"), ("set d", "dev/"), ("set dev app-rem", "app-removal=allowed,app-removal=forbidden"),
+                              ("set dev app-removal=forbidden icon", "icon-size="), ("query dev --log f met", "metrics"),
+                              ("host che", "check"), ("host check f", "folder/"), ("query dev metrics f", ""),
+                              ("why dev com.", "com.example.a"), ("sync --transfers 3 dev f", "folder/")]:
+            with self.subTest(line):
+                run = subprocess.run(["fish", "-c", f"source completion; complete -C 'tsd {line}'"], capture_output=True,
+                                     text=True, env=os.environ | path)
+                self.assertEqual({row.split("\t")[0] for row in run.stdout.splitlines()},
+                                 set(filter(None, offered.split(","))), run.stderr)
+
     def actions(self):
         """Of a rule, as the completion has them."""
         return re.search(r"%%=\*\}=\" -W \"([^\"]*)\"", self.tsd("completion", "bash").stdout)[1].split()

@@ -1,3 +1,7 @@
+#include <cstddef>
+#include <set>
+#include <string>
+
 #include "tsd/help/Completion.h"
 
 namespace tsd {
@@ -26,17 +30,41 @@ std::string valueOf(const OptionEntry& option) {
   return option.words.empty() ? " -x" : " -x -a " + listOf(option.words);
 }
 
+/// `place`: which argument of the subcommand it is, from 1 on.
+std::string argumentLine(const std::string& start, const std::string& seen, std::size_t place,
+                         const OptionEntry& argument) {
+  const std::string more = argument.isRepeatable ? " more" : "";
+  const std::string front = start + " -n '" + seen + "; and __tsd_at " + std::to_string(place) + more + '\'';
+  if (argument.takesFile()) return front + " -F\n";
+  if (argument.takesFolder()) return front + " -a '(__fish_complete_directories)'\n";
+  if (argument.takesApp()) return front + " -a '(__tsd_apps)'\n";
+  return argument.words.empty() ? "" : front + " -a " + listOf(argument.words) + '\n';
+}
+
 std::string lineOf(const std::string& front, const OptionEntry& option) {
-  if (option.isArgument) {
-    if (option.takesFile()) return front + " -F\n";
-    if (option.takesFolder()) return front + " -a '(__fish_complete_directories)'\n";
-    if (option.takesApp()) return front + " -a '(__tsd_apps)'\n";
-    return option.words.empty() ? "" : front + " -a " + listOf(option.words) + '\n';
-  }
   std::string line = front;
   for (const auto& name : option.names) line += name[1] == '-' ? " -l " + name.substr(2) : " -s " + name.substr(1);
   if (!option.value.empty()) line += valueOf(option);
   return line + " -d " + quoted(option.description) + '\n';
+}
+
+/// What tells at which argument of the subcommand the cursor is, or with "more" whether at a later one. What an option
+/// takes does not count.
+std::string placeFunction(const OptionTable& table) {
+  std::set<std::string> taking;
+  for (const auto& command : table.commands) {
+    for (const auto& option : command.options) {
+      if (!option.isArgument && !option.value.empty()) taking.insert(option.names.begin(), option.names.end());
+    }
+  }
+  std::string text =
+      "function __tsd_at\n  set -l place 1\n  set -l taken 0\n  for word in (commandline -opc)[3..]\n"
+      "    if test $taken = 1\n      set taken 0\n    else if contains -- $word";
+  for (const auto& name : taking) text += ' ' + name;
+  return text +
+         "\n      set taken 1\n    else if not string match -q -- '-*' $word\n"
+         "      set place (math $place + 1)\n    end\n  end\n"
+         "  test $place -eq $argv[1]; or test \"$argv[2]\" = more -a $place -ge $argv[1]\nend\n";
 }
 
 /// What completes apps of the device that the command line names, and rules.
@@ -65,13 +93,16 @@ std::string functionsOf(const OptionTable& table) {
 std::string fishCompletion(const OptionTable& table) {
   std::string start = "complete -c " + table.program;
   std::string text = "# Completes command lines of " + table.program + " in fish.\n";
-  text += functionsOf(table) + start + " -f\n";
+  text += placeFunction(table) + functionsOf(table) + start + " -f\n";
   for (const auto& command : table.commands) {
     text += start + " -n __fish_use_subcommand -a " + command.name + " -d " + quoted(command.description) + '\n';
   }
   for (const auto& command : table.commands) {
-    std::string front = start + " -n '__fish_seen_subcommand_from " + command.name + '\'';
-    for (const auto& option : command.options) text += lineOf(front, option);
+    const std::string seen = "__fish_seen_subcommand_from " + command.name;
+    const std::string front = start + " -n '" + seen + '\'';
+    std::size_t place = 0;
+    for (const auto& option : command.options)
+      text += option.isArgument ? argumentLine(start, seen, ++place, option) : lineOf(front, option);
   }
   return text;
 }
