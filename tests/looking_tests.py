@@ -4,10 +4,15 @@
 usage: looking_tests.py TSD [unittest arguments]
 """
 
+import fcntl
 import os
 import pathlib
+import pty
 import signal
+import struct
 import subprocess
+import termios
+import unicodedata
 
 import tsd_folder
 from tsd_folder import BUSY, DONE, Folder, tree_of
@@ -37,6 +42,28 @@ class Stuck:
         self.calls.close()
 
 
+def on_terminal(columns, *arguments):
+    """The lines that a command writes to a terminal of so many columns."""
+    terminal, end = pty.openpty()
+    fcntl.ioctl(end, termios.TIOCSWINSZ, struct.pack("HHHH", 30, columns, 0, 0))
+    text = b""
+    with subprocess.Popen([tsd_folder.TSD, *arguments], stdout=end, stderr=subprocess.DEVNULL,
+                          stdin=subprocess.DEVNULL):
+        os.close(end)
+        try:
+            while part := os.read(terminal, 65536):
+                text += part
+        except OSError:  # nobody writes to it any more
+            pass
+    os.close(terminal)
+    return text.decode().split("\r\n")
+
+
+def columns_of(line):
+    return sum(0 if unicodedata.combining(sign) else 2 if unicodedata.east_asian_width(sign) in "WF" else 1
+               for sign in line)
+
+
 class Looking(Folder):
     VIEWS = [("status", "dev"), ("home", "dev", "-o", "home.png"), ("plan", "dev", "host"), ("why", "dev", "APP"),
              ("query", "dev", "metrics"), ("watch", "dev", "--until-idle")]
@@ -53,6 +80,19 @@ class Looking(Folder):
         self.assertEqual([path for path in {**before, **after} if before.get(path) != after.get(path)], [])
         self.assertEqual(tree_of(os.environ["TMPDIR"]), {})
         return answers
+
+    def test_lines_keep_to_the_terminal(self):
+        app = self.make(8)[0]
+        for columns in (40, 80, 160):
+            for arguments in (("plan", "dev", "host"), ("sync", "dev", "host"), ("status", "dev"), ("home", "dev"),
+                              ("runs", "dev"), ("why", "dev", app), ("query", "dev", "metrics")):
+                lines = on_terminal(columns, *arguments)
+                self.assertGreater(len(lines), 1, arguments)
+                # An identifier is one word, which is never cut where the person may want to copy it.
+                wide = [line for line in lines if columns_of(line) > columns and len(line.split()) > 1]
+                self.assertEqual(wide, [], f"{' '.join(arguments)} in {columns} columns")
+        # A wide one is used.
+        self.assertGreater(max(columns_of(line) for line in on_terminal(160, "home", "dev")), 100)
 
     def test_a_device_at_work_and_after_a_kill(self):
         app = self.make(4, "dev", "--package-size", "4000000")[0]

@@ -206,17 +206,23 @@ Value document(const CommandContext& context, const Rehearsal& rehearsal) {
 std::string text(const Rehearsal& rehearsal) {
   const auto& decisions = rehearsal.decisions();
   if (decisions.empty() && rehearsal.deleted().empty()) return "Nothing to do.\n";
-  std::size_t width = 3;
-  for (const auto& decision : decisions)
+  std::size_t whatWidth = 4, width = 3;
+  for (const auto& decision : decisions) {
+    whatWidth = std::max(whatWidth, columnsOf(decision.what));
     width = std::max(width, std::min<std::size_t>(36, columnsOf(printable(decision.app))));
+  }
   auto front = [&](const std::string& place, const std::string& what, const std::string& app) {
     std::string padding(5 - std::min<std::size_t>(5, place.size()), ' ');
     std::string name = printable(app);
-    return padding + place + "  " + fitted(what, 13) + "  " + (columnsOf(name) > width ? name : fitted(name, width)) +
-           "  ";
+    return padding + place + "  " + fitted(what, whatWidth) + "  " +
+           (columnsOf(name) > width ? name : fitted(name, width)) + "  ";
   };
   std::string text;
-  if (!decisions.empty()) text = front("PLACE", "WHAT", "APP") + "WHY\n";
+  if (!decisions.empty()) {
+    text = front("PLACE", "WHAT", "APP") + "WHY";
+    // Where the reasons begin on a line of their own, none stands below it.
+    text = (columnsOf(text) > lineWidth() ? front("PLACE", "WHAT", "APP") : text) + "\n";
+  }
   std::map<std::string, std::size_t> counts;
   for (const auto& decision : decisions) {
     std::string place = decision.place ? std::to_string(decision.place) : "-";

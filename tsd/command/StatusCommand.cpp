@@ -56,33 +56,34 @@ std::string stateText(const device::AppStatus& app) {
 
 /// Why the home screen shows a sync: it does so from the beginning of a restore until a sync has ended.
 std::string syncingText(const std::vector<RunSummary>& runs) {
-  constexpr const char* shown = "\nThe home screen shows that a sync is running";
+  constexpr const char* shown = "The home screen shows that a sync is running";
   auto last = std::find_if(runs.rbegin(), runs.rend(),
                            [](const auto& run) { return run.command == "sync" || run.command == "restore"; });
-  if (last == runs.rend()) return std::string(shown) + ", but none is.\n";
+  if (last == runs.rend()) return std::string(shown) + ", but none is.";
   return std::string(shown) + ", but none is: " + (last->ended ? "" : "a killed ") + last->command + " " +
-         std::to_string(last->number) + " left it so, until the next sync ends.\n";
+         std::to_string(last->number) + " left it so, until the next sync ends.";
 }
 
 std::string text(const DeviceView& view, const std::vector<RunSummary>& runs) {
   const device::DeviceStatus& status = view.status();
   std::string text;
-  Table apps({{"APP"}, {"NAME", 12}, {"VERSION", 7}, {"STATE"}, {"LAST OUTCOME"}});
+  Table apps(
+      {{"APP", 9, true}, {"NAME", 4}, {"VERSION", 4}, {"STATE", 9, false, true}, {"LAST OUTCOME", 6, false, true}});
   for (const auto& app : status.apps) {
     apps.add({app.id, app.name, app.version, stateText(app), lastOutcomeText(app)});
   }
   text += apps.empty() ? "No apps.\n" : apps.text();
   for (const auto& app : status.apps) {
-    if (!app.lastReason.empty()) text += printable(app.id) + ": " + printable(endOf(app).reason) + "\n";
+    if (!app.lastReason.empty()) text += noteLine(printable(app.id) + ": ", endOf(app).reason);
   }
   if (!status.coordinators.empty()) {
-    Table open({{"OPEN COORDINATOR"}, {"KIND"}, {"CLIENT"}});
+    Table open({{"OPEN COORDINATOR", 12, true}, {"KIND"}, {"CLIENT"}});
     for (const auto& each : status.coordinators)
       open.add({each.app, device::shortNameOfKind(each.kind), std::to_string(each.client)});
     text += "\n" + open.text();
   }
   if (status.syncing != 0)
-    text += view.holder() ? "\nThe home screen shows that a sync is running.\n" : syncingText(runs);
+    text += "\n" + noteLine("", view.holder() ? "The home screen shows that a sync is running." : syncingText(runs));
   if (view.holder()) text += "\n" + view.holderText();
   return text;
 }

@@ -9,10 +9,22 @@
 namespace tsd {
 namespace {
 
-constexpr std::size_t iconsAcross = 4;
-constexpr std::size_t cellColumns = 18;
 constexpr std::size_t barColumns = 8;
-constexpr std::size_t lineColumns = iconsAcross * (cellColumns + 1) - 1;
+
+/// How a page is divided: as many apps in a row as the home screen has, or as a narrow line takes.
+struct Layout {
+  explicit Layout(std::size_t width) {
+    constexpr std::size_t frame = 4, mostAcross = 4, leastCell = 16, mostCell = 30;
+    std::size_t inside = width > frame ? width - frame + 1 : 1;
+    iconsAcross = std::clamp<std::size_t>(inside / (leastCell + 1), 1, mostAcross);
+    cellColumns = std::clamp(inside / iconsAcross - 1, leastCell, mostCell);
+    lineColumns = iconsAcross * (cellColumns + 1) - 1;
+  }
+
+  std::size_t iconsAcross;
+  std::size_t cellColumns;  // of an app
+  std::size_t lineColumns;  // within the frame
+};
 
 std::string repeated(const char* sign, std::size_t count) {
   std::string text;
@@ -47,33 +59,34 @@ std::string whatOf(const HomeIcon& icon) {
   return repeated("█", full) + repeated("░", barColumns - full) + " " + std::to_string(percent) + " %";
 }
 
-std::string pageText(const std::vector<HomeIcon>& page, const std::string& heading) {
+std::string pageText(const Layout& layout, const std::vector<HomeIcon>& page, const std::string& heading) {
   // Each app's cell ends with a space; that of the last one is beyond the line.
-  auto line = [](std::string inside) {
+  auto line = [&](std::string inside) {
     inside.pop_back();
-    return "│ " + fitted(inside, lineColumns) + " │\n";
+    return "│ " + fitted(inside, layout.lineColumns) + " │\n";
   };
-  std::string text = "╭─ " + heading + " " + repeated("─", lineColumns - columnsOf(heading) - 1) + "╮\n";
-  for (std::size_t first = 0; first < page.size(); first += iconsAcross) {
+  std::string text = "╭─ " + heading + " " + repeated("─", layout.lineColumns - columnsOf(heading) - 1) + "╮\n";
+  for (std::size_t first = 0; first < page.size(); first += layout.iconsAcross) {
     std::string names, whats;
-    for (std::size_t i = first; i < std::min(page.size(), first + iconsAcross); ++i) {
-      names += signOf(page[i].look) + std::string(" ") + fitted(labelOf(page[i]), cellColumns - 2) + " ";
-      whats += "  " + fitted(whatOf(page[i]), cellColumns - 2) + " ";
+    for (std::size_t i = first; i < std::min(page.size(), first + layout.iconsAcross); ++i) {
+      names += signOf(page[i].look) + std::string(" ") + fitted(labelOf(page[i]), layout.cellColumns - 2) + " ";
+      whats += "  " + fitted(whatOf(page[i]), layout.cellColumns - 2) + " ";
     }
     text += line(names);
     if (whats.find_first_not_of(' ') != std::string::npos) text += line(whats);
   }
-  return text + "╰" + repeated("─", lineColumns + 2) + "╯\n";
+  return text + "╰" + repeated("─", layout.lineColumns + 2) + "╯\n";
 }
 
 }  // namespace
 
 std::string homeInText(const HomePages& home, const std::string& title) {
   std::string text;
+  const Layout layout(lineWidth());
   for (std::size_t i = 0; i < home.pages.size(); ++i) {
-    std::string number = std::to_string(i + 1) + " of " + std::to_string(home.pages.size());
-    text +=
-        pageText(home.pages[i], fitted(title, std::min<std::size_t>(40, columnsOf(printable(title)))) + ", " + number);
+    std::string number = ", " + std::to_string(i + 1) + " of " + std::to_string(home.pages.size());
+    std::size_t room = layout.lineColumns - std::min(layout.lineColumns, columnsOf(number) + 2);
+    text += pageText(layout, home.pages[i], fitted(title, std::min(room, columnsOf(printable(title)))) + number);
   }
   if (home.pages.empty()) text += printable(title) + ": no apps on the home screen.\n";
   std::string legend;
@@ -85,7 +98,7 @@ std::string homeInText(const HomePages& home, const std::string& title) {
   }
   if (!legend.empty()) text += wrappedLine("", legend);
   for (const auto& app : home.failed) text += wrappedLine("Gone after a failed install: ", app.id + ": " + app.reason);
-  if (home.syncing) text += "The home screen shows that a sync is running.\n";
+  if (home.syncing) text += wrappedLine("", "The home screen shows that a sync is running.");
   return text;
 }
 

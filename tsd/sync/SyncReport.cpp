@@ -65,7 +65,7 @@ std::string SyncReport::text() const {
   text += listLine("Removed from the device", removed);
   if (text.empty() && code == ExitCode::done) text = "Nothing to do.\n";
   if (placeholderSeconds) {
-    text += "The last placeholder was on the home screen after " + secondsText(*placeholderSeconds) + ".\n";
+    text += noteLine("", "The last placeholder was on the home screen after " + secondsText(*placeholderSeconds) + ".");
   }
   std::string counts = OutcomeCounts(apps).text();
   return text + noteLine("", "Sync " + wordsOfEnd(code) + " after " + secondsText(seconds) +

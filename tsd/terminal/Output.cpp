@@ -19,11 +19,15 @@ constexpr std::size_t ordinaryWidth = 80;
 constexpr std::size_t leastWidth = 20;
 constexpr std::size_t noteIndent = 2;
 
+}  // namespace
+
 std::size_t lineWidth() {
   struct winsize size {};
   if (::ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return ordinaryWidth;
   return std::max<std::size_t>(size.ws_col, leastWidth);
 }
+
+namespace {
 
 /// Lines of at most `width` columns, broken between words; all but the first are indented.
 std::string wrappedTo(std::size_t width, const std::string& front, std::string_view text, std::size_t indent) {
@@ -138,7 +142,7 @@ std::vector<std::size_t> Table::widths() const {
     std::size_t widest = _columns.size();
     for (std::size_t column = 0; column < _columns.size(); ++column) {
       bool mayShrink = _columns[column].least && widths[column] > _columns[column].least &&
-                       (isTerminal || !_columns[column].keepsEnd);
+                       (isTerminal || !_columns[column].isWholeElsewhere);
       if (mayShrink && (widest == _columns.size() || widths[column] > widths[widest])) widest = column;
     }
     if (widest == _columns.size()) break;

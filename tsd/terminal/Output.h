@@ -29,9 +29,10 @@ platform::Value arrayOf(const std::vector<std::string>& texts);
 /// have no description, in words.
 std::string reasonForPeople(std::string_view description);
 
-/// The front and the text on a line no wider than the terminal on standard output (80 columns if it is not a terminal),
-/// followed by as many more lines as the text needs, indented by the front's width as far as that leaves room. The
-/// front is printable.
+/// The columns of the terminal on standard output, 80 if it is not a terminal.
+std::size_t lineWidth();
+/// The front and the text on a line no wider than that, followed by as many more lines as the text needs, indented by
+/// the front's width as far as that leaves room. The front is printable.
 std::string wrappedLine(const std::string& front, std::string_view text);
 /// The same, but in one line if standard output is not a terminal, so that it can be searched; further lines are
 /// indented a little.
@@ -43,8 +44,9 @@ class Table {
  public:
   struct Column {
     std::string title;
-    std::size_t least = 0;  // may be shortened to this width; 0: never
-    bool keepsEnd = false;  // its front is what goes, and only on a terminal: others look for the whole of it
+    std::size_t least = 0;             // may be shortened to this width; 0: never
+    bool keepsEnd = false;             // its front is what goes
+    bool isWholeElsewhere = keepsEnd;  // shortened on a terminal alone: others look for the whole of it
   };
   explicit Table(std::vector<Column> columns) : _columns(std::move(columns)) {}
   void add(std::vector<std::string> cells) { _rows.push_back(std::move(cells)); }
