@@ -98,8 +98,8 @@ struct Called {
   std::string text;
   std::string ran;
 
-  template <class Result>
-  void call(Boundary& boundary, const Crossing& crossing, Result answer, Result failure, std::string (*show)(Result)) {
+  template <class Result, class Show>
+  void call(Boundary& boundary, const Crossing& crossing, Result answer, Result failure, Show show) {
     ErrorRef error;
     Result result = boundary.call(
         crossing, &error, {}, [&] { return ran += '!', answer; }, failure);
@@ -139,9 +139,9 @@ TEST(Boundary, carriesOutWhatARuleOrders) {
     called.call<int>(boundary, crossing, 7, -1, [](int n) { return std::to_string(n); });
     called.call<std::optional<std::string>>(boundary, crossing, "text", std::nullopt,
                                             [](auto t) { return t.value_or("absent"); });
-    called.call<Value>(boundary, crossing, 8, {}, [](Value v) { return platform::describe(v); });
+    called.call<Value>(boundary, crossing, 8, {}, [](const Value& v) { return platform::describe(v); });
     called.call<ErrorRef>(boundary, crossing, nullptr, nullptr,
-                          [](ErrorRef e) { return e ? e->domain() : std::string("none"); });
+                          [](const ErrorRef& e) { return e ? e->domain() : std::string("none"); });
     EXPECT_EQ(called.text, row.expected);
     EXPECT_EQ(called.ran, row.ran);
     EXPECT_EQ(bystander, std::string(row.action) == "store=b" ? "bbbbb" : "");
