@@ -15,7 +15,6 @@ using platform::Platform;
 /// The daemon's log categories that the plug-in writes to.
 enum class LogCategory : int { unexpectedMetadata = 0, plugin = 8, summary = 15 };
 
-constexpr std::string_view pluginIdentifier = "com.vantor.tsd.appsync";
 constexpr std::string_view messagePrefix = "com.vantor.tsd.appsync|";
 
 /// How "%c" shows a boolean.

@@ -100,20 +100,28 @@ bool BinaryWriter::count(const Value& value, std::size_t depth) {
         _stringsSize += markerSize(value.data()->size()) + value.data()->size();
       return true;
     case Value::Kind::array:
-      if (!countContainer(value.array()->size(), 1, depth)) return false;
-      for (const Value& item : *value.array()) {
-        if (!count(item, depth + 1)) return false;
-      }
-      return true;
+      return countItems(*value.array(), depth);
     case Value::Kind::dictionary:
-      if (!countContainer(value.dictionary()->size(), 2, depth)) return false;
-      for (const Dictionary::Entry& entry : *value.dictionary()) {
-        auto place = static_cast<std::size_t>(&entry - value.dictionary()->begin());
-        if (!countKey(entry.key, place) || !count(entry.value, depth + 1)) return false;
-      }
-      return true;
+      return countEntries(*value.dictionary(), depth);
   }
   return false;
+}
+
+bool BinaryWriter::countItems(const platform::Array& items, std::size_t depth) {
+  if (!countContainer(items.size(), 1, depth)) return false;
+  for (const Value& item : items) {
+    if (!count(item, depth + 1)) return false;
+  }
+  return true;
+}
+
+bool BinaryWriter::countEntries(const Dictionary& entries, std::size_t depth) {
+  if (!countContainer(entries.size(), 2, depth)) return false;
+  for (const Dictionary::Entry& entry : entries) {
+    auto place = static_cast<std::size_t>(&entry - entries.begin());
+    if (!countKey(entry.key, place) || !count(entry.value, depth + 1)) return false;
+  }
+  return true;
 }
 
 /// Whether it is a new object.

@@ -38,6 +38,8 @@ class BinaryWriter {
 
   bool isReadable(std::size_t size) const;
   bool count(const platform::Value& value, std::size_t depth);
+  bool countItems(const platform::Array& items, std::size_t depth);
+  bool countEntries(const platform::Dictionary& entries, std::size_t depth);
   bool addText(StringTable::Kind kind, std::string_view text);
   bool countString(std::string_view text);
   bool countKey(std::string_view text, std::size_t place);

@@ -111,6 +111,7 @@ struct FileRow {
 
 const std::string before = "/d/\n/d/f old\n/d/s/\n/d/s/x x\n/e/\n";
 
+// NOLINTNEXTLINE(readability-function-size): a table
 std::vector<FileRow> fileRows() {
   auto remove = [](const char* path) { return [=](FileTree& f, ErrorRef* e) { return f.removeItem(path, e); }; };
   auto make = [](const char* path, bool all) {
@@ -122,7 +123,7 @@ std::vector<FileRow> fileRows() {
   auto copy = [](const char* from, const char* to) {
     return [=](FileTree& f, ErrorRef* e) { return f.copyItem(from, to, e); };
   };
-  auto write = [](std::string path) {
+  auto write = [](const std::string& path) {
     return [=](FileTree& f, ErrorRef* e) { return f.writeAtomically(path, "new", e); };
   };
   auto read = [](const char* path) {

@@ -58,8 +58,9 @@ void findCode() {
 
 // The frames of these functions are the first of every walk; they are known by their section.
 #define IN_OWN_SECTION __attribute__((noinline, section("failing_memory")))
-extern "C" const char __start_failing_memory[];
-extern "C" const char __stop_failing_memory[];
+// The linker's names for where the section lies.
+extern "C" const char sectionBegin[] __asm__("__start_failing_memory");
+extern "C" const char sectionEnd[] __asm__("__stop_failing_memory");
 
 /// Whether the innermost code that is the plug-in's or the program's, with the standard library between, is the
 /// plug-in's.
@@ -68,8 +69,7 @@ IN_OWN_SECTION bool pluginAllocates() {
   _Unwind_Backtrace(
       [](_Unwind_Context* frame, void* answer) {
         const auto address = static_cast<std::uintptr_t>(_Unwind_GetIP(frame));
-        const Code own{reinterpret_cast<std::uintptr_t>(__start_failing_memory),
-                       reinterpret_cast<std::uintptr_t>(__stop_failing_memory)};
+        const Code own{reinterpret_cast<std::uintptr_t>(sectionBegin), reinterpret_cast<std::uintptr_t>(sectionEnd)};
         if (own.holds(address)) return _URC_NO_REASON;
         *static_cast<bool*>(answer) = plugin.holds(address);
         return plugin.holds(address) || program.holds(address) ? _URC_END_OF_STACK : _URC_NO_REASON;

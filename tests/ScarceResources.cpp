@@ -17,9 +17,12 @@
 
 extern "C" {
 
+// The C library's own names.
+// NOLINTBEGIN(bugprone-reserved-identifier)
 void* __libc_malloc(std::size_t size);
 void* __libc_calloc(std::size_t count, std::size_t size);
 void* __libc_realloc(void* block, std::size_t size);
+// NOLINTEND(bugprone-reserved-identifier)
 
 static std::atomic<bool> begun{false};
 static std::atomic<unsigned long> threads{0};
@@ -64,6 +67,7 @@ static int beginning(int count, char** arguments, char** environment) {
   return code;
 }
 
+// NOLINTNEXTLINE(bugprone-reserved-identifier)
 int __libc_start_main(Main program, int count, char** arguments, void (*init)(), void (*fini)(), void (*end)(),
                       void* stack) {
   programsMain = program;

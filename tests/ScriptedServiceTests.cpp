@@ -15,7 +15,6 @@ namespace tests {
 namespace {
 
 using platform::OBApplicationProxy;
-using platform::TSAsset;
 using Lines = std::vector<std::string>;
 
 std::shared_ptr<OBApplicationProxy> proxyOf(const char* app) {

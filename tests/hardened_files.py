@@ -10,6 +10,7 @@ where the pointers to functions point.
 """
 
 import re
+import shutil
 import subprocess
 import sys
 
@@ -19,6 +20,8 @@ ARRIVALS = {"X86-64": [b"\xf3\x0f\x1e\xfa"], "AArch64": [b"\x3f\x23\x03\xd5", b"
 LARGE_FRAME = {"X86-64": re.compile(r"\bsub +\$0x([0-9a-f]+),%rsp"), "AArch64": re.compile(r"\bsub\s+sp, sp, #0x([0-9a-f]+)")}
 GUARD = {"X86-64": 4096, "AArch64": 65536}
 MARKS = {"X86-64": ["IBT", "SHSTK"], "AArch64": ["BTI", "PAC"]}
+# A processor's own reader of code, where this machine's reads another processor's.
+DISASSEMBLER = {"X86-64": "x86_64-linux-gnu-objdump", "AArch64": "aarch64-linux-gnu-objdump"}
 
 
 def output(*command):
@@ -62,7 +65,8 @@ def problems_of_linkage(file):
 
 def problems_of_frames(file, machine):
     """A frame larger than the guard may be taken in pieces alone, each of which is touched."""
-    large = [size for size in LARGE_FRAME[machine].findall(output("objdump", "-d", "--no-show-raw-insn", file))
+    disassembler = shutil.which(DISASSEMBLER[machine]) or "objdump"
+    large = [size for size in LARGE_FRAME[machine].findall(output(disassembler, "-d", "--no-show-raw-insn", file))
              if GUARD[machine] < int(size, 16) < 1 << 31]
     if large:
         yield f"{len(large)} frames could step over the guard below the stack, the largest of {max(large, key=len)}"

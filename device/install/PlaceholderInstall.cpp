@@ -27,6 +27,15 @@ platform::Value infoOf(const PlaceholderRecord& placeholder) {
   return info;
 }
 
+/// What a placeholder takes over from the one that stood there.
+AppRecord inPlaceOf(const AppRecord* existing, AppRecord written) {
+  if (!existing || !existing->isPlaceholder) return written;
+  written.applicationType = existing->applicationType;
+  written.systemBundle = existing->systemBundle;
+  written.homeOrder = existing->homeOrder;
+  return written;
+}
+
 /// What the home screen shows of an install that is under way: as much as has come of its package.
 InstallProgressRecord progressSoFar(const CoordinatorRecord& record) REQUIRES(recordsGuard) {
   InstallProgressRecord progress;
@@ -104,17 +113,11 @@ bool PlaceholderInstall::put(std::optional<AppRecord> written, AbandonedContaine
   if (isInstalled == written.has_value())
     return fail(error, coordinationError(CoordinationError::invalid,
                                          id + " was installed or removed by somebody else meanwhile"));
-  auto app = written ? *written : *existing;
-  std::string superfluous;
-  if (existing && existing->isPlaceholder) {
-    superfluous = existing->container;
-    app.applicationType = existing->applicationType;
-    app.systemBundle = existing->systemBundle;
-    app.homeOrder = existing->homeOrder;
-  }
   // A demoted app waits for the person to ask for it, so no install is running.
   bool isDemoted = _coordinator->kind == platform::RVCoordinatorKind::RVRestoringDemotedAppInstallCoordinator;
   bool hadProgress = existing && existing->progress;
+  std::string superfluous = existing && existing->isPlaceholder ? existing->container : "";
+  auto app = written ? inPlaceOf(existing, *std::move(written)) : *existing;
   app.progress.reset();
   if (!isDemoted) app.progress = progressSoFar(state.record);
   auto record = state.record;

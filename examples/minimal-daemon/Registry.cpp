@@ -53,7 +53,7 @@ void Registry::reportInstalls() {
   for (const auto& each : _observers) _queue.post([this, address = each.address, report] { tell(address, report); });
 }
 
-void Registry::reportCancelled(OBApplicationProxyRef app) {
+void Registry::reportCancelled(const OBApplicationProxyRef& app) {
   Report report = [app](Observer& observer) { observer.applicationInstallsDidCancel({app}); };
   platform::Mutex::Lock lock(_mutex);
   for (const auto& each : _observers) _queue.post([this, address = each.address, report] { tell(address, report); });

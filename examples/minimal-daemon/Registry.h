@@ -21,7 +21,7 @@ class Registry final : public platform::OBApplicationWorkspace {
   void put(platform::OBApplicationProxy app);
   void remove(std::string_view app);
   void reportInstalls();
-  void reportCancelled(platform::OBApplicationProxyRef app);
+  void reportCancelled(const platform::OBApplicationProxyRef& app);
   void setUninstaller(std::function<bool(std::string_view)> uninstall) { _uninstall = std::move(uninstall); }
 
   void addObserver(std::weak_ptr<platform::OBApplicationWorkspaceObserverProtocol> observer) override;

@@ -92,6 +92,29 @@ std::string counted(std::size_t count, const std::string& what) {
   return std::to_string(count) + " " + what + (count == 1 ? "" : "s");
 }
 
+Value valueOf(const std::vector<Finding>& findings) {
+  Value list = Value::makeArray();
+  for (const auto& finding : findings) {
+    auto& item = list.array()->appendDictionary();
+    item.set("weight", nameOf(finding.weight));
+    item.set("file", finding.file);
+    if (finding.line > 0) item.set("line", finding.line);
+    if (!finding.app.empty()) item.set("app", finding.app);
+    item.set("text", finding.text);
+    item.set("remedy", finding.remedy);
+  }
+  return list;
+}
+
+/// "host/Packages/a.pkg:3: error: ... (what to do)"
+std::string lineOf(const Finding& finding) {
+  std::string place = finding.file + (finding.line > 0 ? ":" + std::to_string(finding.line) : "");
+  bool isNamed = finding.app.empty() || finding.file.find("/" + finding.app) != std::string::npos ||
+                 finding.text.find('"' + finding.app + '"') != std::string::npos;
+  std::string app = isNamed ? "" : finding.app + ": ";
+  return noteLine("", place + ": " + nameOf(finding.weight) + ": " + app + finding.text + " (" + finding.remedy + ")");
+}
+
 ExitCode check(const CommandContext& context, const HostOptions& options) {
   HostCheck hostCheck(options.host);
   const auto& findings = hostCheck.run();
@@ -104,30 +127,13 @@ ExitCode check(const CommandContext& context, const HostOptions& options) {
     auto& entries = *document.dictionary();
     entries.set("result", nameOfResult(code));
     entries.set("exitCode", static_cast<int>(code));
-    Value list = Value::makeArray();
-    for (const auto& finding : findings) {
-      auto& item = list.array()->appendDictionary();
-      item.set("weight", nameOf(finding.weight));
-      item.set("file", finding.file);
-      if (finding.line > 0) item.set("line", finding.line);
-      if (!finding.app.empty()) item.set("app", finding.app);
-      item.set("text", finding.text);
-      item.set("remedy", finding.remedy);
-    }
-    entries.set("findings", list);
+    entries.set("findings", valueOf(findings));
     entries.set("installs", hostCheck.installs());
     entries.set("removals", hostCheck.removals());
     writeDocument(document);
     return code;
   }
-  for (const auto& finding : findings) {
-    std::string place = finding.file + (finding.line > 0 ? ":" + std::to_string(finding.line) : "");
-    bool isNamed = finding.app.empty() || finding.file.find("/" + finding.app) != std::string::npos ||
-                   finding.text.find('"' + finding.app + '"') != std::string::npos;
-    std::string app = isNamed ? "" : finding.app + ": ";
-    writeOutput(
-        noteLine("", place + ": " + nameOf(finding.weight) + ": " + app + finding.text + " (" + finding.remedy + ")"));
-  }
+  for (const auto& finding : findings) writeOutput(lineOf(finding));
   std::string sum = options.host + ": " + counted(hostCheck.installs(), "app") + " to install, " +
                     std::to_string(hostCheck.removals()) + " to remove; ";
   sum += findings.empty()

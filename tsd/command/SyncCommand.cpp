@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <cstdlib>
 
 #include "tsd/CommandError.h"
@@ -34,6 +35,21 @@ void show(const CommandContext& context, const std::vector<SyncReport>& reports)
   }
 }
 
+/// Tells what was done, and how the first sync that was not done ended.
+ExitCode conclude(const CommandContext& context, const std::vector<SyncReport>& reports) {
+  context.kept->conclude(reports.back().apps, reports.back().message);
+  show(context, reports);
+  auto undone =
+      std::find_if(reports.begin(), reports.end(), [](const auto& each) { return each.code != ExitCode::done; });
+  const ExitCode code = undone == reports.end() ? ExitCode::done : undone->code;
+  // A device that is not quiet by the deadline cannot be closed properly; the next process to open it tidies up.
+  if (reports.back().code == ExitCode::deadline) {
+    context.kept->end(code);
+    std::_Exit(static_cast<int>(code));
+  }
+  return code;
+}
+
 }  // namespace
 
 ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
@@ -62,21 +78,12 @@ ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
   daemon.postStartupNotification();
 
   std::vector<SyncReport> reports;
-  ExitCode code = ExitCode::done;
   while (reports.size() < options.repeat) {
     reports.push_back(SyncRun({context, options, session, daemon, queue, watch, verdicts, progress, stop}).run(wanted));
-    if (code == ExitCode::done) code = reports.back().code;
     if (reports.back().code == ExitCode::cancelled || reports.back().code == ExitCode::deadline) break;
   }
   stop.letFinish();
-  context.kept->conclude(reports.back().apps, reports.back().message);
-  show(context, reports);
-  // A device that is not quiet by the deadline cannot be closed properly; the next process to open it tidies up.
-  if (code == ExitCode::deadline) {
-    context.kept->end(code);
-    std::_Exit(static_cast<int>(code));
-  }
-  return code;
+  return conclude(context, reports);
 }
 
 }  // namespace tsd

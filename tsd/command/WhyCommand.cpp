@@ -84,6 +84,28 @@ std::string headOf(const RunSummary& run, bool mayRunStill) {
                             dayAndTime(run.began) + ": " + words + " (" + end + ")");
 }
 
+void describe(const AppChapter& chapter, platform::Dictionary& run) {
+  run.set("number", chapter.run.number);
+  run.set("command", chapter.run.command);
+  run.set("arguments", arrayOf(chapter.run.arguments));
+  run.set("began", chapter.run.began);
+  if (chapter.run.ended) run.set("ended", *chapter.run.ended);
+  if (chapter.run.ended) run.set("result", chapter.run.result);
+  if (!chapter.run.message.empty()) run.set("message", chapter.run.message);
+  if (chapter.outcome) {
+    run.set("outcome", nameOf(chapter.outcome->outcome));
+    run.set("reason", chapter.outcome->reason);
+  }
+  Value events = Value::makeArray();
+  for (const auto& line : chapter.lines) {
+    auto& event = events.array()->appendDictionary();
+    if (line.time) event.set("t", line.time->count());
+    event.set("kind", line.kind);
+    event.set("text", line.text);
+  }
+  run.set("events", events);
+}
+
 Value document(const CommandContext& context, const std::string& id, const std::string& answer, const Present& present,
                const std::vector<AppChapter>& chapters) {
   Value document = startDocument(context.options.command);
@@ -106,28 +128,7 @@ Value document(const CommandContext& context, const std::string& id, const std::
     entries.set("install", install);
   }
   Value runs = Value::makeArray();
-  for (const auto& chapter : chapters) {
-    auto& run = runs.array()->appendDictionary();
-    run.set("number", chapter.run.number);
-    run.set("command", chapter.run.command);
-    run.set("arguments", arrayOf(chapter.run.arguments));
-    run.set("began", chapter.run.began);
-    if (chapter.run.ended) run.set("ended", *chapter.run.ended);
-    if (chapter.run.ended) run.set("result", chapter.run.result);
-    if (!chapter.run.message.empty()) run.set("message", chapter.run.message);
-    if (chapter.outcome) {
-      run.set("outcome", nameOf(chapter.outcome->outcome));
-      run.set("reason", chapter.outcome->reason);
-    }
-    Value events = Value::makeArray();
-    for (const auto& line : chapter.lines) {
-      auto& event = events.array()->appendDictionary();
-      if (line.time) event.set("t", line.time->count());
-      event.set("kind", line.kind);
-      event.set("text", line.text);
-    }
-    run.set("events", events);
-  }
+  for (const auto& chapter : chapters) describe(chapter, runs.array()->appendDictionary());
   entries.set("runs", runs);
   return document;
 }

@@ -67,6 +67,7 @@ std::vector<Verdicts::Ending> Verdicts::takeEndings() {
   return std::exchange(_endings, {});
 }
 
+// NOLINTNEXTLINE(readability-function-size): one case for each kind
 void Verdicts::take(const AppEvent& event) {
   switch (event.kind) {
     case Kind::removalsRestricted:
