@@ -2,8 +2,9 @@
 # presets of CMakePresets.json, each in build/<preset>.
 
 .DEFAULT_GOAL := help
-.PHONY: help build build-all demo test check asan tsan tsan-clang clang debug sweep kill-sweep error-sweep full-disk \
-        power-loss simulate mutants fuzz bench deb interface format clean packages check-packages fuzz-packages deb-packages
+.PHONY: help build build-all demo test check asan tsan tsan-clang clang debug arm64 coverage sweep kill-sweep error-sweep full-disk \
+        power-loss simulate mutants fuzz bench deb interface format clean packages check-packages fuzz-packages \
+        deb-packages arm64-packages coverage-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
 SEEDS ?=
@@ -16,7 +17,7 @@ PRESET = mkdir -p build && cmake --preset $(1) >build/$(1).configured && \
          cmake --build --preset $(1) $(if $(2),--target $(2))
 
 help: ## this list
-	@awk -F ':.*## ' '/^[a-z-]+:.*## / {printf "make %-11s %s\n", $$1, $$2}' Makefile
+	@awk -F ':.*## ' '/^[a-z0-9-]+:.*## / {printf "make %-11s %s\n", $$1, $$2}' Makefile
 
 build: packages ## the program and the plug-in, into build/release/bin
 	@$(call PRESET,release,tsd ApplicationSync)
@@ -59,6 +60,16 @@ clang: check-packages ## a build with clang, whose thread-safety analysis may fi
 
 debug: packages ## a build for a debugger
 	@$(call PRESET,debug)
+
+arm64: arm64-packages ## the plug-in, the lists and the device for the processor of the phones, tested under an emulator
+	@$(call PRESET,arm64,ApplicationSync platform plist property_list_tests plugin_tests contract_tests)
+	@.ci/arm64 build/arm64
+
+coverage: coverage-packages ## how much of each folder the tests run, as a table, and every line as pages
+	@$(call PRESET,coverage)
+	@find build/coverage -name '*.gcda' -delete
+	@cd build/coverage && $(WITH_SEEDS) $(CTEST)
+	@.ci/coverage build/coverage
 
 sweep: build-all ## every call of every scenario failed once, all of them
 	@cd build/release && APPSYNC_SWEEP=all bin/plugin_tests --gtest_filter='*Sweep*' --gtest_brief=1
@@ -116,3 +127,9 @@ fuzz-packages:
 
 deb-packages:
 	@.ci/packages deb
+
+arm64-packages:
+	@.ci/packages arm64
+
+coverage-packages:
+	@.ci/packages coverage
