@@ -310,10 +310,9 @@ TEST(PropertyList, ExpandsToItsBudgetAndNotBeyond) {
   EXPECT_EQ(read(ofNodes(shared, alone)).array()->size(), shared + 1);
   expectRejected({{ofNodes(shared, alone + 1), ErrorCode::tooLarge, "containers"}});
 
-  auto ofText = [](std::size_t places, std::size_t alone) {
+  auto ofText = [](std::size_t places, std::size_t more) {
     return binary({counted('\xaf', std::string(places, '\1') + '\2'), counted('\x4f', std::string(40000, 't')),
-                   counted('\x4f', std::string(alone, 't')),
-                   counted('\x4f', std::string(50000 - places - alone, 'p'))});
+                   counted('\x4f', std::string(more, 't')), counted('\x4f', std::string(50000 - places - more, 'p'))});
   };
   std::size_t text = maximumText(ofText(0, 0).size()), places = text / 40000;
   EXPECT_EQ(read(ofText(places, text % 40000)).array()->size(), places + 1);

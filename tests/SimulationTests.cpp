@@ -113,7 +113,7 @@ Scenario randomSync(Dice& dice, std::size_t count) {
   }
   scenario.stages = !dice.oneIn(12);
   if (dice.oneIn(2)) {
-    for (std::size_t count = dice.below(6); count > 0; --count) {
+    for (std::size_t left = dice.below(6); left > 0; --left) {
       std::string id = dice.oneIn(5) ? "app.nowhere" : ids[dice.below(ids.size())];
       if (std::find(scenario.layout.begin(), scenario.layout.end(), id) == scenario.layout.end()) {
         scenario.layout.push_back(id);
