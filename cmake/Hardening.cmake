@@ -3,7 +3,7 @@
 #   HARDENED=OFF   for a build to compare with
 option(HARDENED "protect stack, control flow and linkage of optimised builds" ON)
 
-if(NOT CMAKE_BUILD_TYPE MATCHES "^(Release|RelWithDebInfo|MinSizeRel)$" OR CMAKE_CXX_FLAGS MATCHES "-fsanitize")
+if(NOT CMAKE_BUILD_TYPE MATCHES "^(Release|RelWithDebInfo|MinSizeRel)$" OR INSTRUMENTED)
   set(HARDENED OFF)
 endif()
 if(NOT HARDENED)

@@ -61,7 +61,7 @@ foreach(shell bash zsh fish)
   list(APPEND written_by_program ${completions}/${shell})
 endforeach()
 # Nothing is installed from a build with a sanitizer, which may not even run where it is built.
-if(NOT CMAKE_CXX_FLAGS MATCHES -fsanitize)
+if(NOT INSTRUMENTED)
   set(always ALL)
 endif()
 add_custom_target(written_by_program ${always} DEPENDS ${written_by_program})

@@ -17,7 +17,6 @@
 namespace tsd {
 
 using platform::ErrorRef;
-using platform::Value;
 
 namespace {
 
