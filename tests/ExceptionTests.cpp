@@ -10,6 +10,8 @@
 #include "platform/Installer.h"
 #include "tests/FailingMemory.h"
 #include "tests/RestoreScenario.h"
+#include "tests/ScriptedServices.h"
+#include "tsd/daemon/PluginLoader.h"
 
 namespace tests {
 namespace {
@@ -365,6 +367,33 @@ TEST(Exceptions, WhatWantOfMemoryStopsIsNamed) {
     }
     EXPECT_EQ(stoppedIn(rig), Names{name});
   }
+}
+
+TEST(Exceptions, AReportThatWasNotUnderstoodIsFollowedByTheNext) {
+  auto proxy = std::make_shared<platform::OBApplicationProxy>();
+  proxy->applicationIdentifier = proxy->bundleIdentifier = "app.installing.with.a.long.name";
+  proxy->isPlaceholder = true;
+  proxy->installType = 4;
+  proxy->installProgressSync = platform::OBInstallProgress{1, 1};
+  std::size_t stopped = 0;
+  for (std::size_t nth = 1, seen = 1; seen >= nth; ++nth) {
+    PluginRig rig;
+    ScriptedRegistry registry(rig.platform().workspace);
+    registry.isSilent = true;
+    registry.reports = {{{proxy}, {}}, {{proxy}, {}}};
+    auto client = tsd::PluginLoader(SHIPPED_PLUGIN).create(scripted(rig.platform(), {.workspace = &registry}));
+    {
+      FailingMemory memory(nth, Lasts::once);
+      client->outstandingAssetTransfers();
+      seen = memory.seen();
+    }
+    if (stoppedIn(rig) != Names{"applicationInstallsArePrioritized"}) continue;
+    ++stopped;
+    EXPECT_TRUE(inOrder(rig.messages(), {"Wait completed",
+                                         "Assets already in progress (not returning these): "
+                                         "(app.installing.with.a.long.name)"}));
+  }
+  EXPECT_GT(stopped, 0u);
 }
 
 TEST(Exceptions, ACancellationThatCannotBeRememberedIsPassedOn) {

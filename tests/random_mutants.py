@@ -10,8 +10,8 @@ either equivalent to what was there, which a line of tests/mutants/equivalent.tx
 
 The copies of the sources and their builds lie in BUILD, one for each job. BUILD/AREA.jsonl keeps what became of each
 fault: another run, with another seed or after an interruption, plants what was not planted yet, and the figures are of
-all of them. `--again` plants the survivors once more, when tests were added. A fault is another one as soon as its file
-has changed. Ends with 1 when fewer were found than the area's goal.
+all of them. `--again` plants the survivors once more, when tests were added, and what did not end. A fault is another
+one as soon as its file has changed. Ends with 1 when fewer were found than the area's goal.
 """
 
 import argparse
@@ -202,7 +202,9 @@ class Results:
         self._path, self._lock = path, threading.Lock()
         lines = path.read_text(encoding="utf-8").splitlines() if path.exists() else []
         self._found = {row["key"]: row["found"] for row in map(json.loads, lines)}
-        self.again = {key for key, found in self._found.items() if found == ""} if again else set()
+        # A machine that had much to do may have been too slow.
+        unsure = ("", *(found for found in self._found.values() if found and found.endswith("does not end")))
+        self.again = {key for key, found in self._found.items() if found in unsure} if again else set()
 
     def holds(self, fault):
         return fault.key() in self._found
