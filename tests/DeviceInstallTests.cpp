@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include "platform/Describe.h"
 #include "plist/PropertyList.h"
 #include "tests/DeviceRig.h"
 
@@ -307,6 +308,68 @@ TEST_P(DeviceInstalls, AnAppsWayThroughItsCoordinator) {
   }
 }
 
+TEST_P(DeviceInstalls, ARefusalSaysWhatAndWhy) {
+  auto coordinator = this->coordinator(Kind::RVInitiatingAppInstallCoordinator);
+  auto& service = platform().installCoordination;
+  Lines said;
+  ErrorRef error;
+  auto note = [&](bool done) {
+    EXPECT_FALSE(done);
+    said.push_back(error ? error->describe().substr(std::string("InstallCoordination ").size()) : "nothing");
+  };
+  note(coordinator->appAssetPromiseWithError(&error) != nullptr);
+  note(coordinator->setAppAssetPromise(nullptr, &error));
+  note(coordinator->setPlaceholderPromise(nullptr, &error));
+  note(coordinator->setUserDataPromise(nullptr, &error));
+  note(coordinator->setInitialZDRAssetPromises({nullptr}, &error));
+  note(coordinator->setInstallOptions(nullptr, &error));
+  auto userData = service.makePromisedOutOfBandTransfer("user data", 3, 0);
+  EXPECT_TRUE(coordinator->setUserDataPromise(userData, &error));
+  note(coordinator->setUserDataPromise(userData, &error));
+  auto bare = service.makeAppPlaceholder("Maps", maps, 4, 3);
+  note(bare->setIconPromise(nullptr, &error));
+  note(bare->setPlaceholderAttributes(nullptr, &error));
+  auto complete = placeholder();
+  note(complete->setSinfData("rights", &error));
+  EXPECT_TRUE(coordinator->setPlaceholderPromise(complete, &error));
+  note(coordinator->setPlaceholderPromise(complete, &error));
+  note(coordinator->setPlaceholderPromise(placeholder(), &error));
+  note(coordinator->setPlaceholderPromise(placeholder(notes), &error));
+  EXPECT_TRUE(bare->cancelForReason(nullptr, 3, &error));
+  note(bare->cancelForReason(nullptr, 3, &error));
+  note(bare->setMetadata(nullptr, &error));
+  note(coordinator->setPlaceholderPromise(bare, &error));
+  auto promise = this->promise(coordinator);
+  note(coordinator->setAppAssetPromise(promise, &error));
+  EXPECT_TRUE(coordinator->cancelForReason(nullptr, 3, &error));
+  note(coordinator->cancelForReason(nullptr, 3, &error));
+  note(coordinator->setInstallOptions(platform().installer.makeInstallOptions(), &error));
+  EXPECT_EQ(
+      said,
+      (Lines{
+          "5: com.example.maps has no app asset promise",
+          "1: no app asset promise of this service for com.example.maps",
+          "1: no placeholder of this service for com.example.maps",
+          "1: no user-data promise of this service for com.example.maps",
+          "1: no initial asset promise of this service for com.example.maps",
+          "1: no install options of this service for com.example.maps",
+          "4: com.example.maps already has a user-data promise", "1: no icon promise for com.example.maps",
+          "1: no attributes for com.example.maps", "3: the placeholder of com.example.maps is already configured",
+          "4: the placeholder of com.example.maps is already attached to a coordinator",
+          "4: com.example.maps already has a placeholder promise",
+          "1: a placeholder of com.example.notes is not one of com.example.maps",
+          "3: the placeholder of com.example.maps is cancelled", "3: the placeholder of com.example.maps is cancelled",
+          "3: the placeholder of com.example.maps is cancelled", "4: com.example.maps already has an app asset promise",
+          "3: the coordinator of com.example.maps has ended", "3: the coordinator of com.example.maps has ended"}));
+}
+
+TEST_P(DeviceInstalls, WhatWasUninstalledIsTold) {
+  install(notes, "1");
+  EXPECT_TRUE(device().uninstallByPerson(notes));
+  EXPECT_EQ(platform::describe(platform().installer.CorvaneLookupUninstalled()),
+            "{com.example.notes = {KBBundleIdentifier = com.example.notes; KBBundleVersion = 1}}");
+}
+
 TEST_P(DeviceInstalls, APlaceholdersFiles) {
   auto coordinator = this->coordinator(Kind::RVInitiatingAppInstallCoordinator);
   ASSERT_TRUE(coordinator->setPlaceholderPromise(placeholder()));
@@ -327,16 +390,22 @@ TEST_P(DeviceInstalls, APlaceholdersFiles) {
   EXPECT_EQ(list(*proxy->bundleContainerURL + "/HarluneMetadata.plist"), DeviceRig::placeholderMetadata());
   EXPECT_EQ(platform().process.infoDictionaryOfBundleAtPath(*proxy->bundleURL), info);
   EXPECT_EQ(*proxy->bundleURL, *proxy->bundleContainerURL + "/com.example.maps.app");
+  const std::string name = proxy->bundleContainerURL->substr(std::string(containers).size() + 1);
+  EXPECT_EQ(name.size(), 36u);
+  for (std::size_t at = 0; at < name.size(); ++at)
+    EXPECT_EQ(name[at] == '-', at == 8 || at == 13 || at == 18 || at == 23) << name;
 }
 
 TEST_P(DeviceInstalls, StoreMetadataOfWhatIsInstalled) {
   struct Case {
     bool inOptions, inPlaceholder, before;
     const char* expected;  // null: no file
+    bool byStore = false;
   };
-  for (auto [inOptions, inPlaceholder, before, expected] :
+  for (auto [inOptions, inPlaceholder, before, expected, byStore] :
        {Case{true, true, true, "options"}, Case{false, true, true, "placeholder"}, Case{false, false, true, "before"},
-        Case{false, false, false, nullptr}}) {
+        Case{false, false, false, nullptr}, Case{true, true, true, "options", true},
+        Case{false, true, true, "placeholder", true}}) {
     SCOPED_TRACE(expected ? expected : "none");
     DeviceRig rig(GetParam());
     rig.install(maps, "1");
@@ -355,8 +424,13 @@ TEST_P(DeviceInstalls, StoreMetadataOfWhatIsInstalled) {
         inPlaceholder ? rig.placeholder() : rig.platform().installCoordination.makeAppPlaceholder("Maps", maps, 4, 3);
     ASSERT_TRUE(coordinator->setPlaceholderPromise(placeholder));
     rig.write(rig.packagePath(maps), packageOf(maps, "3"));
-    promise->setTransferPath(rig.packagePath(maps));
-    promise->setComplete(true);
+    if (byStore) {
+      ASSERT_TRUE(coordinator->setAppAssetPromiseResponsibleClient(1));
+      EXPECT_TRUE(rig.device().finishStoreInstall(maps, rig.packagePath(maps)));
+    } else {
+      promise->setTransferPath(rig.packagePath(maps));
+      promise->setComplete(true);
+    }
     rig.deliver();
     EXPECT_EQ(rig.list(metadataPath()), !expected ? Value()
                                         : expected == std::string_view("placeholder")

@@ -81,7 +81,8 @@ AREAS = {
                      "fuzz_package"],
                     [["%bin/device_service_tests"], ["%bin/contract_tests"], seeds("package"), *PLUGIN_SUITES[:3],
                      *([sys.executable, f"@tests/{name}.py", "%bin/tsd"]
-                       for name in ("hostile_host", "outcome_tests"))], 90),
+                       for name in ("hostile_host", "outcome_tests")),
+                     [sys.executable, "@tests/kill_sweep.py", "%bin/tsd", "error", "--every", "20"]], 90),
 }
 
 
