@@ -344,6 +344,8 @@ TEST_P(DeviceInstalls, ARefusalSaysWhatAndWhy) {
   EXPECT_TRUE(coordinator->cancelForReason(nullptr, 3, &error));
   note(coordinator->cancelForReason(nullptr, 3, &error));
   note(coordinator->setInstallOptions(platform().installer.makeInstallOptions(), &error));
+  EXPECT_FALSE(device().beginStoreInstall("a/b", {}, &error));
+  EXPECT_EQ(error->description(), "\"a/b\" cannot be an app's identifier");
   EXPECT_EQ(
       said,
       (Lines{
