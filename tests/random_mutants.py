@@ -79,7 +79,7 @@ AREAS = {
     "install": Area(["device/package", "device/reports", "device/install", "device/coordination"],
                     ["ApplicationSync", "plugin_tests", "tsd", "device_service_tests", "contract_tests",
                      "fuzz_package"],
-                    [["%bin/device_service_tests"], ["%bin/contract_tests"], seeds("package"), *PLUGIN_SUITES[:3],
+                    [["%bin/device_service_tests"], ["%bin/contract_tests"], seeds("package"), *PLUGIN_SUITES[:4],
                      *([sys.executable, f"@tests/{name}.py", "%bin/tsd"]
                        for name in ("hostile_host", "outcome_tests")),
                      [sys.executable, "@tests/kill_sweep.py", "%bin/tsd", "error", "--every", "20"]], 90),
