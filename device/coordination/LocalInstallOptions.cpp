@@ -18,7 +18,7 @@ void LocalInstallOptions::setHarluneMetadata(std::shared_ptr<platform::CVStoreMe
   _boundary.call({{className, "setHarluneMetadata"}}, nullptr, {{"metadata", metadata}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalStoreMetadata>(metadata);
     Lock lock(_mutex);
-    _record.metadata = ours ? ours->dictionary : platform::Value();
+    _record.metadata = ours ? ours->dictionary : SharedValue();
   });
 }
 

@@ -75,9 +75,8 @@ bool LocalPlaceholder::setIconPromise(const std::shared_ptr<platform::RVPromised
 bool LocalPlaceholder::setMetadata(const std::shared_ptr<platform::CVStoreMetadata>& metadata, ErrorRef* error) {
   return _boundary.call({{className, "setMetadata"}, _app}, error, {{"metadata", metadata}}, [&] {
     auto ours = std::dynamic_pointer_cast<LocalStoreMetadata>(metadata);
-    return change(error, [&](PlaceholderRecord& record, auto&) {
-      record.metadata = ours ? ours->dictionary : platform::Value();
-    });
+    return change(error,
+                  [&](PlaceholderRecord& record, auto&) { record.metadata = ours ? ours->dictionary : SharedValue(); });
   });
 }
 

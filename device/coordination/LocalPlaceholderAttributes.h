@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "device/boundary/Boundary.h"
+#include "device/records/SharedValue.h"
 #include "platform/Mutex.h"
 #include "platform/RVPlaceholder.h"
 #include "platform/ThreadSafety.h"
@@ -15,7 +16,7 @@ namespace device {
 class LocalPlaceholderAttributes final : public platform::RVPlaceholderAttributes {
  public:
   struct Facts {
-    platform::Value manifest;  // a dictionary, or absent
+    SharedValue manifest;  // a dictionary, or absent
     std::optional<std::string> version;
     bool launchProhibited = false;
   };

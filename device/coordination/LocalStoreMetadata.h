@@ -3,8 +3,8 @@
 #include <string>
 #include <utility>
 
+#include "device/records/SharedValue.h"
 #include "platform/CVInstallOptions.h"
-#include "platform/Value.h"
 
 namespace device {
 
@@ -13,7 +13,7 @@ class LocalStoreMetadata final : public platform::CVStoreMetadata {
  public:
   explicit LocalStoreMetadata(platform::Value dictionary) : dictionary(std::move(dictionary)) {}
 
-  const platform::Value dictionary;
+  const SharedValue dictionary;
 
   std::string describe() const override {
     return "<CVStoreMetadata " + std::to_string(dictionary.dictionary()->size()) + " entries>";

@@ -14,7 +14,7 @@ struct InstallRequest {
   std::string app;  // empty: whatever app the package holds
   std::string packagePath;
   std::optional<InstallOptionsRecord> options;
-  platform::Value metadata;  // if the options have none
+  SharedValue metadata;  // if the options have none
   /// The container of the app that is to be finished, for an install without a coordinator: an app that is removed or
   /// replaced meanwhile is not finished, and nothing is done to what is there instead.
   std::optional<std::string> continues;

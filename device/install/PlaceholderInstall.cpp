@@ -15,8 +15,9 @@ namespace {
 
 /// The placeholder's Info.plist.
 platform::Value infoOf(const PlaceholderRecord& placeholder) {
-  auto info = placeholder.configured && placeholder.manifest.dictionary() ? placeholder.manifest
-                                                                          : platform::Value::makeDictionary();
+  platform::Value info = placeholder.configured && placeholder.manifest.dictionary()
+                             ? placeholder.manifest.value()
+                             : platform::Value::makeDictionary();
   auto& entries = *info.dictionary();
   entries.remove("KBBundleIconFile");  // names a file of the package
   entries.set("KBBundleIdentifier", placeholder.app);
@@ -63,7 +64,7 @@ std::optional<AppRecord> writePlaceholder(const InstallParts& parts, const Place
     app.container = *container;
     auto sum = parts.containers.writePlaceholder(
         app.container, app.bundle, std::move(info), placeholder.configured ? placeholder.iconPath : std::nullopt,
-        placeholder.configured ? placeholder.metadata : platform::Value(), &reason);
+        placeholder.configured ? placeholder.metadata : SharedValue(), &reason);
     app.filesSum = sum.value_or(0);
     if (sum) return app;
     parts.containers.remove(app.container);

@@ -7,10 +7,10 @@
 #include <vector>
 
 #include "device/records/RecordsGuard.h"
+#include "device/records/SharedValue.h"
 #include "platform/InstallCoordination.h"
 #include "platform/RVClient.h"
 #include "platform/ThreadSafety.h"
-#include "platform/Value.h"
 
 namespace device {
 
@@ -35,7 +35,7 @@ struct PromiseRecord {
 using PromiseRef = std::shared_ptr<PromiseRecord>;
 
 struct InstallOptionsRecord {
-  platform::Value metadata;  // a dictionary; absent: the app has none
+  SharedValue metadata;  // a dictionary; absent: the app has none
   std::uint64_t installType = 0;
   std::uint64_t installTargetType = 0;
 };
@@ -47,10 +47,10 @@ struct PlaceholderRecord {
   std::uint64_t installType = 0;
   platform::RVClientIdentifier client = 0;
   bool configured = false;  // false: nothing of what follows counts
-  platform::Value manifest;
+  SharedValue manifest;
   std::optional<std::string> version;
   bool launchProhibited = false;
-  platform::Value metadata;  // a dictionary; absent: none
+  SharedValue metadata;  // a dictionary; absent: none
   platform::Bytes rights;
   std::optional<std::string> iconPath;
 };

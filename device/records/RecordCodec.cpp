@@ -18,6 +18,9 @@ class Writer {
   template <class Record>
   using Of = const Record;
 
+  Writer() : written(Value::makeDictionary()), entries(*written.dictionary()) {}
+  explicit Writer(Dictionary& entries) : entries(entries) {}
+
   void text(std::string_view key, const std::string& text) { entries.set(key, text); }
   void text(std::string_view key, const std::optional<std::string>& text) {
     if (text) entries.set(key, *text);
@@ -37,17 +40,17 @@ class Writer {
   template <class Record>
   void record(std::string_view key, const std::optional<Record>& record) {
     if (!record) return;
-    Writer inner;
+    entries.set(key, Value::makeDictionary());
+    Writer inner(*entries.dictionary(key));
     fields(inner, *record);
-    entries.set(key, inner.written);
   }
   void record(std::string_view key, const PromiseRef& promise) REQUIRES(recordsGuard) {
     if (promise) entries.set(key, valueOf(*promise));
   }
   static Value valueOf(const PromiseRecord& promise) REQUIRES(recordsGuard);
 
-  Value written = Value::makeDictionary();
-  Dictionary& entries = *written.dictionary();
+  Value written;  // absent when the entries are somebody else's
+  Dictionary& entries;
 };
 
 /// Reads the fields that it is shown into a new record; one that is missing, or of another kind, keeps its default.
@@ -66,7 +69,7 @@ class Reader {
   void number(std::string_view key, std::uint64_t& number) { number = entries[key].unsignedInteger().value_or(0); }
   void always(std::string_view key, std::uint64_t& number) { this->number(key, number); }
   void real(std::string_view key, double& number) { number = entries[key].real().value_or(0); }
-  void value(std::string_view key, Value& value) { value = entries[key]; }
+  void value(std::string_view key, SharedValue& value) { value = entries[key]; }
   void bytes(std::string_view key, platform::Bytes& bytes) { bytes = entries[key].data().value_or(""); }
   template <class Record>
   void record(std::string_view key, std::optional<Record>& record) {

@@ -4,6 +4,8 @@
 #include <cstdint>
 #include <filesystem>
 #include <memory>
+#include <optional>
+#include <stdexcept>
 #include <string_view>
 #include <system_error>
 #include <utility>
@@ -11,7 +13,6 @@
 #include "device/files/DevicePath.h"
 #include "device/files/StepWatch.h"
 #include "device/store/DatabaseImage.h"
-#include "device/store/RecordList.h"
 #include "device/store/Store.h"
 #include "platform/Mutex.h"
 #include "platform/ThreadSafety.h"
@@ -125,7 +126,11 @@ class DatabaseStore final : public Store {
 
   std::vector<StoreRecord> load() override {
     platform::Mutex::Lock lock(_mutex);
-    return _records.all();
+    if (_asOpened) return *_asOpened;
+    std::vector<StoreRecord> records;
+    ErrorRef error;
+    if (!readRecords(records, &error)) throw std::runtime_error(error->description());
+    return records;
   }
 
   bool commit(const std::vector<StoreRecord>& changes, ErrorRef* error) override { return apply(changes, true, error); }
@@ -137,7 +142,8 @@ class DatabaseStore final : public Store {
                    "INSERT INTO records(kind, key, value) VALUES(?1, ?2, ?3) "
                    "ON CONFLICT(kind, key) DO UPDATE SET value = excluded.value",
                    error) &&
-           prepare(_remove, "DELETE FROM records WHERE kind = ?1 AND key = ?2", error) && readRecords(error);
+           prepare(_remove, "DELETE FROM records WHERE kind = ?1 AND key = ?2", error) &&
+           readRecords(_asOpened.emplace(), error);
   }
 
   bool apply(const std::vector<StoreRecord>& changes, bool flushes, ErrorRef* error) EXCLUDES(_mutex) {
@@ -149,6 +155,7 @@ class DatabaseStore final : public Store {
       values.push_back(std::move(*bytes));
     }
     platform::Mutex::Lock lock(_mutex);
+    _asOpened.reset();
     Step step{flushes ? Step::Kind::storeCommit : Step::Kind::storeWrite, {}};
     if (int forbidden = _watch ? _watch->before(step) : 0) {
       platform::setError(error, platform::makeError("Store", forbidden, _path + ": " + textOfErrorNumber(forbidden)));
@@ -171,14 +178,7 @@ class DatabaseStore final : public Store {
     for (std::size_t i = 0; i < changes.size(); ++i) {
       if (!put(changes[i], values[i])) return fail(error);
     }
-    if (!transaction.commit()) return fail(error);
-    remember(changes);
-    return true;
-  }
-
-  /// What is stored cannot be taken back: without the memory for it the process ends here.
-  void remember(const std::vector<StoreRecord>& changes) noexcept REQUIRES(_mutex) {
-    for (const auto& change : changes) _records.apply(change);
+    return transaction.commit() || fail(error);
   }
 
   bool fail(ErrorRef* error, std::string_view text = {}) const REQUIRES(_mutex) {
@@ -230,7 +230,7 @@ class DatabaseStore final : public Store {
     return execute(schema, error) && execute(marks.c_str(), error) && (transaction.commit() || fail(error));
   }
 
-  bool readRecords(ErrorRef* error) REQUIRES(_mutex) {
+  bool readRecords(std::vector<StoreRecord>& records, ErrorRef* error) REQUIRES(_mutex) {
     Statement all;
     if (!prepare(all, "SELECT kind, key, value FROM records ORDER BY place", error)) return false;
     int status;
@@ -242,7 +242,7 @@ class DatabaseStore final : public Store {
         return fail(error, "the record " + record.kind + " \"" + record.key +
                                "\" cannot be read: " + (reason ? reason->description() : std::string("it is empty")));
       }
-      _records.apply(record);
+      records.push_back(std::move(record));
     }
     return status == SQLITE_DONE || fail(error);
   }
@@ -266,7 +266,8 @@ class DatabaseStore final : public Store {
   Statement _put GUARDED_BY(_mutex);
   Statement _remove GUARDED_BY(_mutex);
   bool _flushes GUARDED_BY(_mutex) = true;
-  RecordList _records GUARDED_BY(_mutex);  // what the file holds
+  /// What the file held when it was opened, until it changes: whoever opens a device asks more than once.
+  std::optional<std::vector<StoreRecord>> _asOpened GUARDED_BY(_mutex);
 };
 
 }  // namespace

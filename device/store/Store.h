@@ -23,7 +23,8 @@ struct StoreRecord {
 class Store {
  public:
   virtual ~Store() = default;
-  /// Every record, in the order of first insertion. None is missing: an unreadable store is an error when it is opened.
+  /// Every record, in the order of first insertion. None is missing: an unreadable store is an error when it is opened,
+  /// and throws when it becomes one later.
   virtual std::vector<StoreRecord> load() = 0;
   virtual bool commit(const std::vector<StoreRecord>& changes, platform::ErrorRef* error = nullptr) = 0;
   /// The same for changes that a loss of power may take back: atomic, in order with every other change, and kept when

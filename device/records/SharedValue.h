@@ -1,0 +1,30 @@
+#pragma once
+
+#include <memory>
+#include <utility>
+
+#include "platform/Value.h"
+
+namespace device {
+
+/// A value that never changes and that several records hold, which copying it would make several of. Without one it is
+/// absent.
+class SharedValue {
+ public:
+  SharedValue() = default;
+  SharedValue(platform::Value value)
+      : _value(value.isAbsent() ? nullptr : std::make_shared<const platform::Value>(std::move(value))) {}
+
+  operator const platform::Value&() const { return value(); }
+  const platform::Value& value() const {
+    static const platform::Value absent{};
+    return _value ? *_value : absent;
+  }
+  bool isAbsent() const { return !_value; }
+  const platform::Dictionary* dictionary() const { return value().dictionary(); }
+
+ private:
+  std::shared_ptr<const platform::Value> _value;
+};
+
+}  // namespace device
