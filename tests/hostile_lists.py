@@ -28,8 +28,7 @@ process = subprocess.Popen(sys.argv[1:], stdin=subprocess.DEVNULL, stdout=subpro
 _, status, usage = os.wait4(process.pid, 0)
 print(os.waitstatus_to_exitcode(status), usage.ru_maxrss << 10, usage.ru_utime + usage.ru_stime)
 """
-# A manifest and metadata are held by several records while the install that they belong to is under way.
-BASE, EACH, EACH_HELD = 64 << 20, 16, {"as_manifest": 64, "as_metadata": 160}
+BASE, EACH = 64 << 20, 16
 # What a command does beside reading the list, and a factor that no quadratic reader stays below.
 SECONDS, FACTOR = 2.0, 8
 
@@ -190,7 +189,7 @@ class Lists(Costs):
                 if os.environ.get("SHOW_COSTS"):
                     print(f"{place.__name__:22} {name:32} {memory / 2**20:7.0f} MiB {seconds:6.2f} s", flush=True)
                 with self.subTest(place.__name__, name=name):
-                    self.assertLess(memory, BASE + EACH_HELD.get(place.__name__, EACH) * max(size, SIZE))
+                    self.assertLess(memory, BASE + EACH * max(size, SIZE))
             for name, (_, seconds) in costs.items():
                 with self.subTest(place.__name__, name=name):
                     self.assertLess(seconds, SECONDS + FACTOR * costs["harmless"][1])
