@@ -77,7 +77,7 @@ const Hostile hostiles[] = {
     {"a file for a folder", {{"Maps.app", "x"}}, "\"Maps.app\": a file where the folder should be", false},
     {"no manifest", {{"Maps.app/x", "x"}}, "no manifest \"Maps.app/Info.plist\"", false},
     {"a folder for a manifest", {{"Maps.app/Info.plist/", ""}}, "no manifest \"Maps.app/Info.plist\"", false},
-    {"a manifest that is none",
+    {"a manifest that is not a list",
      {{"Maps.app/Info.plist", "x"}},
      "\"Maps.app/Info.plist\": not a property list: neither an XML nor a binary property list",
      false},

@@ -224,7 +224,7 @@ PACKAGES = [
     Row("cut", package(file("A.app/c"), then=lambda archive: archive[:-30]), reason="not a zip archive"),
     Row("a tape archive", tar_with_links, reason="not a zip archive"),
     Row("a garbage manifest", package(manifest=GARBAGE), reason=r"A.app/Info.plist.*byte \d+: "),
-    Row("a manifest that is none", package(manifest=plistlib.dumps(["x"])), reason="A.app/Info.plist.* not a dictionary"),
+    Row("a manifest that is not a dictionary", package(manifest=plistlib.dumps(["x"])), reason="A.app/Info.plist.* not a dictionary"),
     Row("of another app", lambda folder, path: path.write_bytes(zipped("com.example.other")), reason="com.example.other"),
     Row("bytes for a name", package(file("A.app/bytes"), then=lambda all: all.replace(b"bytes", b"\xff\xfe\x80\xc0 "))),
 ]

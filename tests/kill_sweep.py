@@ -199,7 +199,7 @@ class Command:
         require(begun, "the todo list has changed")
         host_list = plistlib.loads((self.host / "ApplicationsSync.plist").read_bytes())
         require([entry["identifier"] for entry in todo] == [entry["identifier"] for entry in host_list],
-                "the todo list is none that was written")
+                "the todo list is not one that was written")
         for entry in todo:
             mark = acknowledged.get(entry["identifier"], "install")
             require(PROGRESS[entry["operation"]] >= PROGRESS[mark] or entry["operation"] == "remove",

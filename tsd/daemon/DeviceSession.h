@@ -74,7 +74,7 @@ class DeviceSession {
 
   const CommandContext& _context;
   std::optional<PluginLoader> _loader;
-  std::optional<DeviceLock> _lock;  // none of a copy
+  std::optional<DeviceLock> _lock;  // a copy has none
   std::optional<LineFile> _log;
   std::optional<LineFile> _calls;
   std::optional<TraceFile> _trace;

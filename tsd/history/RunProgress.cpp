@@ -50,7 +50,7 @@ bool RunProgress::refresh() {
     changed = changed || size > 0;
     _read += size;
     text.erase(0, size);
-    // No line is as long: it is none of ours.
+    // No line is as long: it is not ours.
     if (text.size() > blockSize) return changed;
   }
 }
