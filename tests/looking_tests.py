@@ -113,6 +113,8 @@ class Looking(Folder):
             self.assertEqual({icon["look"] for icon in icons.values()}, {"waiting"})
             self.assertTrue(0 < icons[first]["progress"] < 1, icons[first])
             self.assertRegex(self.tsd("status", "dev").stdout, rf"(?m)^{first} .* placeholder, \d+ %$")
+            self.assertRegex(self.tsd("runs", "dev").stdout, "sync +still running$")
+            self.assertIn("run 1 (sync): still running", answers["why"]["answer"])
             self.tsd("backup", "dev", code=BUSY)
             watch = subprocess.Popen([tsd_folder.TSD, "watch", "dev", "--until-idle"], stdout=subprocess.PIPE, text=True)
             self.addCleanup(watch.stdout.close)
@@ -127,6 +129,8 @@ class Looking(Folder):
         icons = {icon["id"]: icon for page in after["home"]["pages"] for icon in page}
         self.assertTrue(0 < icons[first]["progress"] < 1, icons[first])
         self.assertNotIn("busy", after["status"])
+        self.assertRegex(self.tsd("runs", "dev").stdout, "sync +killed$")
+        self.assertIn("run 1 (sync): killed", after["why"]["answer"])
         self.sync("dev", "host")
         self.assertEqual(self.tsd("watch", "dev", "--until-idle").stdout,
                          "dev: nobody is changing it; 4 apps: 4 installed.\ndev: 4 apps: 4 installed.\n")

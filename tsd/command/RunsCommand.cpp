@@ -2,7 +2,7 @@
 
 #include "tsd/CommandError.h"
 #include "tsd/command/Commands.h"
-#include "tsd/daemon/DeviceLock.h"
+#include "tsd/daemon/DeviceView.h"
 #include "tsd/history/RunHistory.h"
 #include "tsd/terminal/Output.h"
 
@@ -20,7 +20,7 @@ std::string dayAndTime(const std::string& moment) {
 }
 
 std::string endText(const RunSummary& run) {
-  if (!run.ended) return "killed, or still running";
+  if (!run.ended) return wordsOfNoEnd(run);
   std::string text = run.exitCode ? wordsOfEnd(static_cast<ExitCode>(*run.exitCode)) : run.result;
   std::string counts = run.counts.text();
   if (!counts.empty()) text += ": " + counts;
@@ -65,7 +65,7 @@ std::string text(const std::vector<RunSummary>& runs) {
 
 ExitCode runRuns(const CommandContext& context, const DeviceOnlyOptions& options) {
   DeviceLock::requireDevice(options.device);
-  auto runs = keptRuns(options.device, context.console.problems());
+  auto runs = runsOfDevice(options.device, context.console.problems());
   if (context.options.json)
     writeDocument(document(context, runs));
   else

@@ -21,13 +21,11 @@ namespace {
 struct Present {
   std::optional<device::AppStatus> app;
   std::optional<device::CoordinatorStatus> install;
-  bool isBusy = false;  // another process is changing the device
 };
 
 Present presentOf(const DeviceView& view, const std::string& id) {
   const auto& status = view.status();
   Present present;
-  present.isBusy = view.holder().has_value();
   for (const auto& app : status.apps) {
     if (app.id == id) present.app = app;
   }
@@ -76,10 +74,10 @@ std::string dayAndTime(const std::string& moment) {
   return text;
 }
 
-std::string headOf(const RunSummary& run, bool mayRunStill) {
+std::string headOf(const RunSummary& run) {
   std::string words = "tsd " + run.command;
   for (const auto& argument : run.arguments) words += " " + argument;
-  std::string end = run.ended ? run.result : mayRunStill ? "killed, or still running" : "killed";
+  std::string end = run.ended ? run.result : wordsOfNoEnd(run);
   return "\n" + wrappedLine("Run " + std::to_string(run.number) + ", ",
                             dayAndTime(run.began) + ": " + words + " (" + end + ")");
 }
@@ -180,7 +178,7 @@ std::string text(const std::string& id, const std::string& answer, const Present
                  const std::vector<AppChapter>& chapters, bool all, std::size_t silent) {
   std::string text = noteLine("", id + ": " + answer + ".");
   for (std::size_t i = all || chapters.empty() ? 0 : chapters.size() - 1; i < chapters.size(); ++i) {
-    text += headOf(chapters[i].run, present.isBusy);
+    text += headOf(chapters[i].run);
     for (const auto& line : chapters[i].lines) text += wrappedLine(timeText(line), line.text);
   }
   if (!all) text += othersText(chapters, silent);
@@ -188,7 +186,7 @@ std::string text(const std::string& id, const std::string& answer, const Present
 }
 
 std::vector<RunSummary> runsOf(const CommandContext& context, const WhyOptions& options) {
-  auto runs = keptRuns(options.device, context.console.problems());
+  auto runs = runsOfDevice(options.device, context.console.problems());
   if (options.run == 0) return runs;
   for (auto& run : runs) {
     if (run.number == options.run) return {run};

@@ -14,6 +14,15 @@ RunProgress progressOf(const std::string& device) {
 
 }  // namespace
 
+std::vector<RunSummary> runsOfDevice(const std::string& folder, const TellProblem& tell) {
+  const bool wasBusy = DeviceLock::holderOf(folder).has_value();
+  auto runs = keptRuns(folder, tell);
+  // It may have begun, or ended, meanwhile.
+  const bool isBusy = wasBusy || DeviceLock::holderOf(folder);
+  if (!runs.empty()) runs.back().isRunning = isBusy && !runs.back().ended;
+  return runs;
+}
+
 DeviceView::DeviceView(const CommandContext& context, const std::string& folder)
     : DeviceView(context, folder, progressOf(folder)) {}
 

@@ -2,13 +2,19 @@
 
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "tsd/daemon/CommandContext.h"
 #include "tsd/daemon/DeviceLock.h"
 #include "tsd/daemon/DeviceSession.h"
+#include "tsd/history/RunHistory.h"
 #include "tsd/history/RunProgress.h"
 
 namespace tsd {
+
+/// The runs that a device's folder keeps, as `keptRuns`. A last one without an end is marked as running while a process
+/// is working on the device.
+std::vector<RunSummary> runsOfDevice(const std::string& folder, const TellProblem& tell);
 
 /// A device as it is now, whoever is using it: nobody is waited for or disturbed, and nothing is written.
 class DeviceView {

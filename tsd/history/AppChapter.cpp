@@ -58,7 +58,7 @@ std::string AppChapter::answer() const {
     return isRuns ? words + ": " + run.message : words;
   }
   std::string last = lines.empty() ? "" : lines.back().text;
-  if (!run.ended) return "killed, or still running; last known: " + last;
+  if (!run.ended) return std::string(wordsOfNoEnd(run)) + "; last known: " + last;
   return run.message.empty() ? last : "the whole run failed: " + run.message;
 }
 

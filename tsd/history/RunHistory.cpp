@@ -93,6 +93,8 @@ void readOutcomes(const RunSummary& run, const std::string& text, Each&& each) {
 
 }  // namespace
 
+const char* wordsOfNoEnd(const RunSummary& run) { return run.isRunning ? "still running" : "killed"; }
+
 std::optional<AppOutcome> outcomeIn(const RunSummary& run, const std::string& app) {
   std::optional<AppOutcome> found;
   readOutcomes(run, device::jsonText(platform::Value(app)), [&](AppOutcome outcome) {

@@ -27,6 +27,7 @@ struct RunSummary {
   std::vector<std::string> arguments;
   std::string began;                 // "2024-02-29T12:34:56.789Z"; empty: unknown
   std::optional<std::string> ended;  // absent: it was killed, or is still running
+  bool isRunning = false;            // as far as whoever asks for it knows; otherwise it was killed
   std::string result;                // "done", …; empty if it has no end
   std::optional<int> exitCode;
   OutcomeCounts counts;
@@ -39,6 +40,9 @@ using TellProblem = std::function<void(const std::string& problem)>;
 /// The runs that a device's folder keeps, the oldest first. Other folders are ignored; of a run whose summary
 /// cannot be read, only the folder, the number and the command are known. `tell` may be null.
 std::vector<RunSummary> keptRuns(const std::string& device, const TellProblem& tell);
+
+/// "killed" or "still running", of a run without an end.
+const char* wordsOfNoEnd(const RunSummary& run);
 
 // What follows throws a `CommandError` when a file is there and cannot be read. Lines that are not
 // records, are too long or are nested too deeply are skipped.
