@@ -365,6 +365,15 @@ TEST_P(DeviceInstalls, ARefusalSaysWhatAndWhy) {
           "3: the coordinator of com.example.maps has ended", "3: the coordinator of com.example.maps has ended"}));
 }
 
+TEST_P(DeviceInstalls, AContainerThatGoesWhileAPackageIsUnpacked) {
+  ErrorRef error;
+  write(packagePath(maps), packageOf(maps, "1"));
+  meanwhile("createNew", [this] { EXPECT_TRUE(files().removeItem(containers)); });
+  EXPECT_FALSE(device().installFromPackage(packagePath(maps), &error));
+  EXPECT_TRUE(error);
+  EXPECT_EQ(stateOf(), "");
+}
+
 TEST_P(DeviceInstalls, WhatWasUninstalledIsTold) {
   install(notes, "1");
   EXPECT_TRUE(device().uninstallByPerson(notes));
