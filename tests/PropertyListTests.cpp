@@ -5,11 +5,13 @@
 #include <bit>
 #include <cmath>
 #include <limits>
+#include <set>
 #include <string>
 #include <vector>
 
 #include "platform/Describe.h"
 #include "plist/BigEndian.h"
+#include "plist/ElementLines.h"
 #include "plist/PropertyList.h"
 
 namespace plist {
@@ -63,15 +65,21 @@ void expectAccepted(const std::vector<Accepted>& rows) {
   }
 }
 
-void expectRejected(const std::vector<Rejected>& rows) {
+/// What was said, without the places.
+std::set<std::string> expectRejected(const std::vector<Rejected>& rows) {
+  std::set<std::string> said;
   for (const Rejected& row : rows) {
     ErrorRef error;
     EXPECT_TRUE(read(row.input, &error).isAbsent()) << printable(row.input);
-    ASSERT_TRUE(error) << printable(row.input);
+    EXPECT_TRUE(error) << printable(row.input);
+    if (!error) continue;
     EXPECT_EQ(error->domain(), errorDomain);
     EXPECT_EQ(error->code(), static_cast<std::int64_t>(row.code)) << printable(row.input) << error->describe();
     EXPECT_NE(error->description().find(row.text), std::string::npos) << printable(row.input) << error->describe();
+    const auto colon = error->description().find(": ");
+    said.insert(error->description().substr(colon == std::string::npos ? 0 : colon + 2));
   }
+  return said;
 }
 
 using namespace std::string_literals;
@@ -240,7 +248,37 @@ TEST(PropertyList, RefusesBinary) {
     bytes[bytes.size() - static_cast<std::size_t>(fromEnd)] = static_cast<char>(byte);
     rows.push_back({bytes});
   }
-  expectRejected(rows);
+  EXPECT_EQ(expectRejected(rows), (std::set<std::string>{"a UID, which a property list cannot hold",
+                                                         "a UTF-16 string with half a surrogate pair",
+                                                         "a binary property list of an unknown version",
+                                                         "a container that contains itself",
+                                                         "a date cannot have this size",
+                                                         "a date outside the years 1 to 9999",
+                                                         "a dictionary key that is not a string",
+                                                         "a dictionary runs past the objects",
+                                                         "a real cannot have this size",
+                                                         "a reference to object 0 of 0",
+                                                         "a reference to object 1 of 1",
+                                                         "a reference to object 5 of 1",
+                                                         "a set, which a property list cannot hold",
+                                                         "a string runs past the objects",
+                                                         "a string without a count",
+                                                         "an ASCII string with other characters",
+                                                         "an array runs past the objects",
+                                                         "an integer beyond 64 bits",
+                                                         "an integer cannot have this size",
+                                                         "an integer runs past the objects",
+                                                         "more objects than the offset table has room for",
+                                                         "no object has the marker 112",
+                                                         "no object has the marker 15",
+                                                         "no object has the marker 224",
+                                                         "null, which a property list cannot hold",
+                                                         "offsets cannot have this size",
+                                                         "references cannot have this size",
+                                                         "the document ends before its trailer",
+                                                         "the key \"a\" appears twice",
+                                                         "the key \"k\" appears twice",
+                                                         "the offset table lies outside"}));
 }
 
 /// So many arrays, one in the other.
@@ -347,6 +385,7 @@ TEST(PropertyList, RefusesToWriteWhatAFormCannotCarry) {
     bool xml;
     ErrorCode code = ErrorCode::notRepresentable;
   };
+  std::set<std::string> said;
   Value badKey = Value::makeDictionary();
   badKey.dictionary()->set("\x01", 1);
   for (const Row& row : std::vector<Row>{
@@ -373,9 +412,20 @@ TEST(PropertyList, RefusesToWriteWhatAFormCannotCarry) {
         EXPECT_EQ(read(*bytes), row.value);
       } else {
         EXPECT_EQ(error->code(), static_cast<std::int64_t>(row.code)) << error->describe();
+        said.insert(error->description());
       }
     }
   }
+  for (const char* text :
+       {"an absent value", "the string \"\x80\" is not valid UTF-8", "XML cannot carry the string \"a?b\""})
+    EXPECT_EQ(said.count(text), 1u) << text;
+}
+
+TEST(PropertyList, TellsOnWhichLineEachElementStands) {
+  using Numbers = std::vector<std::size_t>;
+  EXPECT_EQ(elementLines(xml("<dict>\n<key>a</key>\n<true/>\n<key>b</key><array>\n<true/></array></dict>")),
+            (Numbers{2, 4}));
+  EXPECT_EQ(elementLines(xml("<array>\n<true/>\n<dict><key>a</key><true/></dict></array>")), (Numbers{2, 3}));
 }
 
 TEST(PropertyList, WritesCompactly) {
