@@ -412,12 +412,13 @@ TEST(PropertyList, RefusesToWriteWhatAFormCannotCarry) {
         EXPECT_EQ(read(*bytes), row.value);
       } else {
         EXPECT_EQ(error->code(), static_cast<std::int64_t>(row.code)) << error->describe();
-        said.insert(error->description());
+        said.insert((isBinary ? "binary: " : "XML: ") + error->description());
       }
     }
   }
   for (const char* text :
-       {"an absent value", "the string \"\x80\" is not valid UTF-8", "XML cannot carry the string \"a?b\""})
+       {"binary: an absent value", "XML: an absent value", "binary: the string \"\x80\" is not valid UTF-8",
+        "XML: XML cannot carry the string \"a?b\""})
     EXPECT_EQ(said.count(text), 1u) << text;
 }
 
