@@ -37,7 +37,7 @@ cairo_status_t take(void* in, unsigned char* data, unsigned length) {
 
 /// An icon of the size that the device shows: a shaded ground that leaves the corners out, and circles on it.
 Bytes drawIcon() {
-  constexpr double side = 120;
+  constexpr int side = 120;
   Surface surface(cairo_image_surface_create(CAIRO_FORMAT_ARGB32, side, side), cairo_surface_destroy);
   Pen pen(cairo_create(surface.get()), cairo_destroy);
   std::unique_ptr<cairo_pattern_t, void (*)(cairo_pattern_t*)> shade(cairo_pattern_create_linear(0, 0, side, side),
