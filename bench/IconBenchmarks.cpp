@@ -44,7 +44,7 @@ Bytes drawIcon() {
                                                                      cairo_pattern_destroy);
   cairo_pattern_add_color_stop_rgb(shade.get(), 0, 0.9, 0.4, 0.2);
   cairo_pattern_add_color_stop_rgb(shade.get(), 1, 0.3, 0.1, 0.6);
-  cairo_arc(pen.get(), side / 2, side / 2, side * 0.6, 0, 7);
+  cairo_arc(pen.get(), side * 0.5, side * 0.5, side * 0.6, 0, 7);
   cairo_set_source(pen.get(), shade.get());
   cairo_fill(pen.get());
   for (int circle = 1; circle < 6; ++circle) {
