@@ -7,8 +7,8 @@
 
 namespace device {
 
-/// A value that never changes and that several records hold, which copying it would make several of. Without one it is
-/// absent.
+/// A value that never changes, shared by the records that hold it: copying a record copies no list. Absent when made
+/// without one.
 class SharedValue {
  public:
   SharedValue() = default;
