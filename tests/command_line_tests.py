@@ -163,6 +163,11 @@ class CommandLines(Folder):
 class Shells(Folder):
     """What is made of the options besides the help: completions and manual pages."""
 
+    def make_host(self):
+        for name in ("Packages", "Restore", "com.example.ferrystead", "com.example.folder"):
+            os.makedirs("host/" + name)
+        pathlib.Path("host/Packages/com.example.ferrystead.pkg").touch()
+
     def test_completion_in_bash(self):
         # Words as bash splits them at "=", the last one up to the cursor; what it offers.
         table = [
@@ -183,14 +188,16 @@ class Shells(Folder):
             ("sync --transfers ", ""),
             ("sync dev host --asset com.example.f", "com.example.ferrystead:"),
             ("sync dev host --asset com.example.ferrystead : st", "stall"),
+            ("host remove host com.example.f", "com.example.ferrystead,com.example.folder"),
+            ("host remove host ", "com.example.ferrystead,com.example.folder"),
+            ("host add host a", "a folder,a file"),
             ("nothing a", ""),
         ]
         os.mkdir("a folder")
         pathlib.Path("a file").touch()
         self.tsd("init", "dev")
         self.tsd("store", "dev", "com.example.a")
-        os.makedirs("host/Packages")
-        pathlib.Path("host/Packages/com.example.ferrystead.pkg").touch()
+        self.make_host()
         pathlib.Path("completion").write_text(self.tsd("completion", "bash").stdout)
         ask = """source completion; COMP_WORDS=(tsd "$@"); COMP_CWORD=$#; _tsd; IFS=,; echo "${COMPREPLY[*]}" """
         path = {"PATH": f"{pathlib.Path(tsd_folder.TSD).parent}:{os.environ['PATH']}"}
@@ -215,6 +222,7 @@ class Shells(Folder):
         if not shutil.which("fish"):
             self.skipTest("no fish is here")
         os.mkdir("folder")
+        self.make_host()
         self.tsd("init", "dev")
         self.tsd("store", "dev", "com.example.a")
         pathlib.Path("completion").write_text(self.tsd("completion", "fish").stdout)
@@ -222,7 +230,9 @@ class Shells(Folder):
         for line, offered in [("sync f", "folder/"), ("set d", "dev/"), ("set dev app-rem", "app-removal=allowed,app-removal=forbidden"),
                               ("set dev app-removal=forbidden icon", "icon-size="), ("query dev --log f met", "metrics"),
                               ("host che", "check"), ("host check f", "folder/"), ("query dev metrics f", ""),
-                              ("why dev com.", "com.example.a"), ("sync --transfers 3 dev f", "folder/")]:
+                              ("why dev com.", "com.example.a"),
+                              ("host remove host ", "com.example.ferrystead,com.example.folder"),
+                              ("host add host hos", "host/"), ("sync --transfers 3 dev f", "folder/")]:
             with self.subTest(line):
                 run = subprocess.run(["fish", "-c", f"source completion; complete -C 'tsd {line}'"], capture_output=True,
                                      text=True, env=os.environ | path)

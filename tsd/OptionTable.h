@@ -19,7 +19,9 @@ struct OptionEntry {
   bool isCommon = false;  // one that the subcommands share
 
   /// Whether the value names something in the file system; the placeholder tells which sort.
-  bool takesFile() const { return value == "FILE" || value == "SOURCE"; }
+  bool takesFile() const { return value == "FILE"; }
+  /// Whether it is a file to add to a host or an app of that host to remove, as the two arguments before it have it.
+  bool takesSource() const { return value == "SOURCE"; }
   /// Whether it names an app of the device before it, or is a rule of injection.
   bool takesApp() const { return value == "APP"; }
   bool takesRule() const { return value == "RULE"; }

@@ -54,15 +54,18 @@ _PROGRAM() {
 }
 
 _PROGRAM_answer() {
-  case $1 in
+  local kind=$1
+  [[ $kind != source ]] || { [[ ${words[2]-} == remove ]] && kind=host-app || kind=file; }
+  case $kind in
     file) compopt -o filenames 2>/dev/null; mapfile -t COMPREPLY < <(compgen -f -- "$word") ;;
     folder) compopt -o filenames 2>/dev/null; mapfile -t COMPREPLY < <(compgen -d -- "$word") ;;
-    words*) mapfile -t COMPREPLY < <(compgen -W "${1#words}" -- "$word") ;;
+    words*) mapfile -t COMPREPLY < <(compgen -W "${kind#words}" -- "$word") ;;
+    host-app) _PROGRAM_host_apps ;;
     app) mapfile -t COMPREPLY < <(compgen -W "$(_PROGRAM_apps "${words[2]-}")" -- "$word") ;;
     asset*)
       if [[ $word == *[:,]* ]]; then
         local begin=${word##*[:,]}
-        mapfile -t COMPREPLY < <(compgen -P "${word%"$begin"}" -W "${1#asset}" -- "$begin")
+        mapfile -t COMPREPLY < <(compgen -P "${word%"$begin"}" -W "${kind#asset}" -- "$begin")
       else
         local host=${words[3]-}
         mapfile -t COMPREPLY < <(cd "${host/#\~/$HOME}/Packages" 2>/dev/null && compgen -S : -X '!*.pkg' -f -- "$word")
@@ -82,6 +85,16 @@ _PROGRAM_answer() {
   [[ $current != [=:] ]] || current=
   local front=${word%"$current"}
   [[ -z $front ]] || COMPREPLY=("${COMPREPLY[@]#"$front"}")
+}
+
+# The apps that a host has something of.
+_PROGRAM_host_apps() {
+  local host=${words[3]-}
+  host=${host/#\~/$HOME}
+  mapfile -t COMPREPLY < <({
+    (cd "$host/Packages" 2>/dev/null && compgen -X '!*.pkg' -f -- "$word" | sed 's/\.pkg$//')
+    (cd "$host" 2>/dev/null && compgen -d -- "$word" | sed '/^Packages$/d; /^Restore$/d')
+  } | sort -u)
 }
 
 # The apps of a device.
@@ -106,6 +119,7 @@ std::string joined(const std::vector<std::string>& words) {
 std::string kindOf(const OptionEntry& option) {
   if (option.takesFile()) return "file";
   if (option.takesFolder()) return "folder";
+  if (option.takesSource()) return "source";
   if (option.takesApp()) return "app";
   if (option.takesRule()) return "rule";
   std::string words = option.takesAsset() ? "asset" : "words";

@@ -34,7 +34,10 @@ std::string valueOf(const OptionEntry& option) {
 std::string argumentLine(const std::string& start, const std::string& seen, std::size_t place,
                          const OptionEntry& argument) {
   const std::string more = argument.isRepeatable ? " more" : "";
-  const std::string front = start + " -n '" + seen + "; and __tsd_at " + std::to_string(place) + more + '\'';
+  const std::string condition = start + " -n '" + seen + "; and __tsd_at " + std::to_string(place) + more;
+  if (argument.takesSource())
+    return condition + "; and __tsd_removes' -a '(__tsd_host_apps)'\n" + condition + "; and not __tsd_removes' -F\n";
+  const std::string front = condition + '\'';
   if (argument.takesFile()) return front + " -F\n";
   if (argument.takesFolder()) return front + " -a '(__fish_complete_directories)'\n";
   if (argument.takesApp()) return front + " -a '(__tsd_apps)'\n";
@@ -72,6 +75,10 @@ std::string functionsOf(const OptionTable& table) {
   std::string text =
       "function __tsd_apps\n  set -l words (commandline -opc)\n"
       "  tsd status --json -- $words[3] 2>/dev/null | string match -rg '^ *\"id\": \"([^\"]*)\"'\nend\n"
+      "function __tsd_removes\n  set -l words (commandline -opc)\n  test \"$words[3]\" = remove\nend\n"
+      "function __tsd_host_apps\n  set -l words (commandline -opc)\n"
+      "  for path in $words[4]/Packages/*.pkg $words[4]/*/\n"
+      "    string match -rg '([^/]*?)(?:\\.pkg|/)$' -- $path | string match -vr '^(Packages|Restore)$'\n  end\nend\n"
       "function __tsd_rules\n  set -l point (string match -rg '^([^=]*=)' -- (commandline -ct))\n"
       "  if test -n \"$point\"\n    string join \\n -- $point";
   text += "{";

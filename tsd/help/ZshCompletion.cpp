@@ -17,6 +17,7 @@ std::string actionOf(const OptionEntry& option) {
   if (option.takesApp()) return "_tsd_apps";
   if (option.takesRule()) return "_tsd_rules";
   if (option.takesAsset()) return "_tsd_assets";
+  if (option.takesSource()) return "_tsd_sources";
   if (option.takesFile()) return "_files";
   if (option.takesFolder()) return "_files -/";
   std::string words;
@@ -48,6 +49,16 @@ constexpr const char* frame = R"frame(
 _tsd_apps() {
   local device=${${(Q)words[2]}/#\~/$HOME}
   compadd -- ${(f)"$(tsd status --json -- $device 2>/dev/null | sed -n 's/^ *"id": "\([^"]*\)".*/\1/p')"}
+}
+
+_tsd_sources() {
+  if [[ $words[2] == remove ]]; then
+    local host=${${(Q)words[3]}/#\~/$HOME}
+    local -a apps=($host/Packages/*.pkg(N:t:r) $host/*(N/:t))
+    compadd -- ${apps:#(Packages|Restore)}
+  else
+    _files
+  fi
 }
 
 _tsd_assets() {
