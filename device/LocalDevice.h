@@ -27,9 +27,9 @@ struct DeviceOptions {
   /// Gets each message as it is written, under the log's own lock. Null: nobody listens, and messages are not
   /// formatted.
   std::function<void(const LogRecord&)> log;
-  /// Told of every file operation of the plug-in that failed, and of every property list that it could not read, since
-  /// the plug-in ignores some silently: the operation, the path and the reason in one line. From any thread. May be
-  /// null.
+  /// Told of every file operation of the plug-in that failed, and of every property list, or entry of one, that it
+  /// could not read, since the plug-in ignores some silently: the operation, the path and the reason in one line. From
+  /// any thread. May be null.
   std::function<void(std::string_view operation, std::string_view path, std::string_view reason)> fileFailed;
   std::vector<JournalListener> journals;
   std::vector<InjectionRule> rules;

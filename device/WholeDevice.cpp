@@ -61,10 +61,7 @@ class WholeDevice final : public LocalDevice {
             }),
         _process(_boundary, *_files, options.mainBundleIdentifier),
         _fileSystem(_boundary, *_files, options.fileFailed),
-        _propertyLists(_boundary,
-                       [failed = options.fileFailed](std::string_view path, std::string_view reason) {
-                         if (failed) failed("reading the property list", path, reason);
-                       }),
+        _propertyLists(_boundary, options.fileFailed),
         _systemLog(_boundary, options.log),
         _support(_boundary, _systemLog),
         _deviceService(

@@ -145,6 +145,19 @@ class Places(tsd_folder.Folder):
         self.assertRegex(self.tsd("sync", "dev", "host").stderr,
                          rf"{path.name}: reading the property list failed: byte \d+: ")
 
+    def test_entries_of_another_type_are_told(self):
+        metadata = {"vantorId": 7, "is-auto-download": True}
+        write = lambda path, value: path.write_bytes(plistlib.dumps(value))
+        write(pathlib.Path("host", self.apps[0], "HarluneMetadata.plist"), metadata)
+        write(pathlib.Path("host/Restore/RestoreApplications.plist"), {
+            app: {"HarluneMetadata": plistlib.dumps({**metadata, "title": app})} for app in self.apps})
+        said = r'HarluneMetadata.plist: reading an entry failed: "vantorId" is no text\n'
+        for command in (["sync", "dev", "host", "--progress", "none"], ["query", "dev", "vantor-ids"], ["backup", "dev"]):
+            self.assertRegex(self.tsd(*command).stderr, said)
+        self.tsd("init", "another")
+        self.assertIn(f'RestoreApplications.plist: {self.apps[0]}: its "HarluneMetadata": "vantorId" is no text\n',
+                      self.tsd("restore", "another", "host", "--progress", "none").stderr)
+
     def test_a_setting_that_nobody_set(self):
         store = sqlite3.connect("dev/device.db")
         value = plistlib.dumps("20000", fmt=plistlib.FMT_BINARY)

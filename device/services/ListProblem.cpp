@@ -30,7 +30,40 @@ std::string problemOfDemotedApps(const platform::Dictionary& list) {
   return {};
 }
 
+const Value& entryOf(const Value& list, std::string_view key) {
+  static const Value absent{};
+  return list.dictionary() ? (*list.dictionary())[key] : absent;
+}
+
+bool isOfKind(const Value& value, Value::Kind kind) {
+  // A number may be of either kind.
+  return value.isAbsent() || value.kind() == kind ||
+         (kind == Value::Kind::integer && value.kind() == Value::Kind::real);
+}
+
 }  // namespace
+
+std::string problemOfStoreMetadata(const Value& metadata) {
+  using Kind = Value::Kind;
+  constexpr std::string_view downloadKey = "com.vantor.HarluneStore.downloadInfo";
+  const Value& download = entryOf(metadata, downloadKey);
+  const Value& account = entryOf(download, "accountInfo");
+  struct Place {
+    const Value& list;
+    std::string_view key;
+    Kind kind;
+  };
+  for (const Place& each : {Place{metadata, "title", Kind::string}, Place{metadata, "itemName", Kind::string},
+                            Place{metadata, "bundleVersion", Kind::string}, Place{metadata, "vantorId", Kind::string},
+                            Place{metadata, downloadKey, Kind::dictionary},
+                            Place{download, "accountInfo", Kind::dictionary}, Place{account, "VantorID", Kind::string},
+                            Place{account, "DSPersonID", Kind::integer}, Place{account, "AltDSID", Kind::string}}) {
+    if (isOfKind(entryOf(each.list, each.key), each.kind)) continue;
+    const char* wanted = each.kind == Kind::string ? "text" : each.kind == Kind::dictionary ? "dictionary" : "number";
+    return '"' + std::string(each.key) + "\" is no " + wanted;
+  }
+  return {};
+}
 
 std::string problemOfList(std::string_view path, const Value& list) {
   if (isOneOf(path, {platform::todoListPath, platform::lastSyncListPath}))
@@ -41,6 +74,10 @@ std::string problemOfList(std::string_view path, const Value& list) {
   if (!isDictionary) return {};
   if (!list.dictionary()) return "it is not a dictionary";
   return path == platform::demotedAppsPath ? problemOfDemotedApps(*list.dictionary()) : "";
+}
+
+std::string problemOfEntry(std::string_view path, const Value& list) {
+  return nameOf(path) == platform::storeMetadataFileName ? problemOfStoreMetadata(list) : "";
 }
 
 bool maySeemMissing(std::string_view path) {

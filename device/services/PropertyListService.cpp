@@ -26,7 +26,9 @@ Value PropertyListService::propertyListWithData(Bytes bytes, ErrorRef* error) {
     const std::string problem = !value.isAbsent() ? problemOfList(file.path(), value)
                                 : reason          ? reason->description()
                                                   : "no reason given";
-    if (!problem.empty()) _unreadable(file.path(), problem);
+    if (!problem.empty()) _unreadable("reading the property list", file.path(), problem);
+    const std::string passedOver = problem.empty() ? problemOfEntry(file.path(), value) : "";
+    if (!passedOver.empty()) _unreadable(readingAnEntry, file.path(), passedOver);
   }
   platform::setError(error, std::move(reason));
   return value;

@@ -13,8 +13,9 @@ namespace device {
 class PropertyListService final : public platform::PropertyListSerialization {
  public:
   /// Told of every file that is not the list it ought to be, as the plug-in passes over some in silence: its path and
-  /// the reason. From any thread. May be null.
-  using Unreadable = std::function<void(std::string_view path, std::string_view reason)>;
+  /// the reason; what was being done is "reading the property list", or `readingAnEntry` of one that is used
+  /// without it. From any thread. May be null.
+  using Unreadable = std::function<void(std::string_view operation, std::string_view path, std::string_view reason)>;
   PropertyListService(Boundary& boundary, Unreadable unreadable)
       : _boundary(boundary), _unreadable(std::move(unreadable)) {}
 

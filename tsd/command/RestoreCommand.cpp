@@ -1,6 +1,7 @@
 #include <algorithm>
 #include <optional>
 
+#include "device/services/ListProblem.h"
 #include "platform/DeviceNames.h"
 #include "platform/DevicePaths.h"
 #include "platform/OBNumbers.h"
@@ -34,7 +35,8 @@ struct RestoreList {
   std::vector<RestoredApp> apps;
 };
 
-RestoredApp readEntry(std::string_view id, const Value& entry) {
+/// Adds what is passed over in silence in its metadata to the problems.
+RestoredApp readEntry(std::string_view id, const Value& entry, std::vector<std::string>& problems) {
   RestoredApp app;
   app.id = id;
   app.name = id;
@@ -42,19 +44,28 @@ RestoredApp readEntry(std::string_view id, const Value& entry) {
   auto bytes = fields ? (*fields)["HarluneMetadata"].data() : std::nullopt;
   Value metadata = bytes ? plist::read(platform::Bytes(*bytes)) : Value();
   if (const auto* facts = metadata.dictionary()) {
+    if (auto problem = device::problemOfStoreMetadata(metadata); !problem.empty())
+      problems.push_back(app.id + ": its \"HarluneMetadata\": " + problem);
     if (auto title = (*facts)["title"].string()) app.name = *title;
     if (auto version = (*facts)["bundleVersion"].string()) app.version = *version;
   }
   return app;
 }
 
-RestoreList readRestoreList(const std::string& folder) {
+RestoreList readRestoreList(const std::string& folder, Console& console) {
+  constexpr std::size_t mostNamed = 5;
   RestoreList list;
-  const Value root = readHostList(folder + "/" + std::string(restoreListName), Value::Kind::dictionary);
+  std::vector<std::string> problems;
+  const std::string path = folder + "/" + std::string(restoreListName);
+  const Value root = readHostList(path, Value::Kind::dictionary);
   const auto* entries = root.dictionary();
   list.exists = entries != nullptr;
   if (!entries) return list;
-  for (const auto& entry : *entries) list.apps.push_back(readEntry(entry.key, entry.value));
+  for (const auto& entry : *entries) list.apps.push_back(readEntry(entry.key, entry.value, problems));
+  for (std::size_t place = 0; place < std::min(problems.size(), mostNamed); ++place)
+    console.message(path + ": " + problems[place]);
+  if (problems.size() > mostNamed)
+    console.message(path + ": " + std::to_string(problems.size() - mostNamed) + " more apps have such metadata");
   return list;
 }
 
@@ -79,7 +90,7 @@ class Restore {
       : _context(context),
         _options(options),
         _folder(options.host + "/" + std::string(restoreName)),
-        _list(readRestoreList(_folder)) {}
+        _list(readRestoreList(_folder, context.console)) {}
 
   ExitCode run();
 

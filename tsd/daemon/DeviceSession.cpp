@@ -1,6 +1,7 @@
 #include "tsd/daemon/DeviceSession.h"
 
 #include "device/boundary/Journal.h"
+#include "device/services/ListProblem.h"
 #include "tsd/CommandError.h"
 #include "tsd/StartThread.h"
 #include "tsd/history/LogLine.h"
@@ -62,7 +63,8 @@ void DeviceSession::complain(std::string_view operation, std::string_view path, 
   ++failures->second.count;
   if (isIcon) return;
   if (isFirst) _context.console.message(text);
-  if (_complaint.empty()) _complaint = text;
+  // What the list has else is used.
+  if (_complaint.empty() && operation != device::readingAnEntry) _complaint = text;
 }
 
 void DeviceSession::tellRepeatedFailures() {

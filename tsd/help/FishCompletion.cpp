@@ -78,7 +78,7 @@ std::string functionsOf(const OptionTable& table) {
       "function __tsd_removes\n  set -l words (commandline -opc)\n  test \"$words[3]\" = remove\nend\n"
       "function __tsd_host_apps\n  set -l words (commandline -opc)\n"
       "  for path in $words[4]/Packages/*.pkg $words[4]/*/\n"
-      "    string match -rg '([^/]*?)(?:\\.pkg|/)$' -- $path | string match -vr '^(Packages|Restore)$'\n  end\nend\n"
+      "    string match -rg '([^/]*?)(?:\\.pkg|/)$' -- $path | string match -v -r '^(Packages|Restore)$'\n  end\nend\n"
       "function __tsd_rules\n  set -l point (string match -rg '^([^=]*=)' -- (commandline -ct))\n"
       "  if test -n \"$point\"\n    string join \\n -- $point";
   text += "{";

@@ -10,6 +10,7 @@
 #include "device/install/AppIdentifier.h"
 #include "device/screen/IconImage.h"
 #include "device/screen/IconLayout.h"
+#include "device/services/ListProblem.h"
 #include "platform/TodoOperation.h"
 #include "plist/ElementLines.h"
 #include "plist/PropertyList.h"
@@ -28,6 +29,7 @@ using Weight = Finding::Weight;
 
 namespace {
 
+constexpr const char* passedOver = "it is passed over: leave it out, or write one";
 constexpr int iconSize = 120;  // any: whether it can be drawn does not depend on it
 
 /// The number in "line 3: …", which is cut off; 0 without one.
@@ -183,6 +185,19 @@ void HostCheck::checkPackage(const std::string& app, const std::string& version,
   }
 }
 
+void HostCheck::checkMetadata(const std::string& app, const std::string& folder) {
+  const List metadata = readList(folder + "/" + std::string(platform::storeMetadataFileName), Kind::dictionary,
+                                 Weight::note, "leave it out, or write a dictionary");
+  const std::string problem = device::problemOfStoreMetadata(metadata.value);
+  if (problem.empty()) return;
+  std::size_t place = 0, line = 0;
+  for (const auto& entry : *metadata.value.dictionary()) {
+    if (problem.find('"' + std::string(entry.key) + '"') == 0) line = metadata.lineOf(place);
+    ++place;
+  }
+  add({Weight::note, metadata.path, line, app, problem, passedOver});
+}
+
 void HostCheck::checkAppFolder(const std::string& app) {
   const std::string folder = _host + "/" + app;
   struct stat facts {};
@@ -193,8 +208,7 @@ void HostCheck::checkAppFolder(const std::string& app) {
   }
   const std::string manifestPath = folder + "/Info.plist";
   const List manifest = readList(manifestPath, Kind::dictionary, Weight::note, addAgain());
-  readList(folder + "/" + std::string(platform::storeMetadataFileName), Kind::dictionary, Weight::note,
-           "leave it out, or write a dictionary");
+  checkMetadata(app, folder);
   std::string iconName;
   if (const auto* fields = manifest.value.dictionary()) {
     if (auto id = (*fields)["KBBundleIdentifier"].string(); id && *id != app)
@@ -260,6 +274,8 @@ void HostCheck::checkRestoreList() {
       tell(Weight::problem, "it is passed over: it has no \"HarluneMetadata\" with data", addToRestore());
     } else if (const Value read = plist::read(platform::Bytes(*metadata)); !read.dictionary()) {
       tell(Weight::problem, "its \"HarluneMetadata\" is no dictionary", addToRestore());
+    } else if (auto problem = device::problemOfStoreMetadata(read); !problem.empty()) {
+      tell(Weight::note, "its \"HarluneMetadata\": " + problem, passedOver);
     } else if (!(*read.dictionary())["title"].string() && !(*read.dictionary())["itemName"].string()) {
       tell(Weight::note, "its metadata have neither a \"title\" nor an \"itemName\": its placeholder has no name",
            "write one of them");

@@ -48,6 +48,7 @@ class HostCheck {
   void checkTodoList();
   void checkTodoEntry(const List& list, std::size_t place);
   void checkPackage(const std::string& app, const std::string& version, const std::string& list, std::size_t line);
+  void checkMetadata(const std::string& app, const std::string& folder);
   void checkAppFolder(const std::string& app);
   void checkLayout();
   void checkRestoreList();
