@@ -116,6 +116,7 @@ class WholeDevice final : public LocalDevice {
     std::set<std::string_view> known;
     for (const auto& [id, app] : _records.state().apps) known.insert(id);
     for (const auto& [id, outcome] : _records.state().outcomes) known.insert(id);
+    status.apps.reserve(known.size());
     for (auto id : known) status.apps.push_back(*_records.state().status(id));
     status.home = _records.state().homeOrder();
     status.pages = _records.state().layout.pages;

@@ -12,6 +12,7 @@ CoordinatorRef OpenCoordinators::find(std::string_view app) const {
 
 std::vector<CoordinatorStatus> OpenCoordinators::statuses() const {
   std::vector<CoordinatorStatus> result;
+  result.reserve(_open.size());
   for (const auto& [app, coordinator] : _open) {
     const auto& held = coordinator->state.record;
     CoordinatorStatus status{app, coordinator->kind, coordinator->creator};

@@ -79,7 +79,8 @@ ExitCode runSync(const CommandContext& context, const SyncOptions& options) {
 
   std::vector<SyncReport> reports;
   while (reports.size() < options.repeat) {
-    reports.push_back(SyncRun({context, options, session, daemon, queue, watch, verdicts, progress, stop}).run(wanted));
+    const SyncParts parts{context, options, session, daemon, queue, watch, verdicts, progress, stop};
+    reports.push_back(SyncRun(parts, wanted).run());
     if (reports.back().code == ExitCode::cancelled || reports.back().code == ExitCode::deadline) break;
   }
   stop.letFinish();

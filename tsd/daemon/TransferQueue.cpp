@@ -93,6 +93,7 @@ void TransferQueue::finish() {
   _expects = false;
   for (const auto& wish : std::exchange(_wishes, {})) answer(wish, false, *_device);
   _changed.wait(_mutex, [this]() REQUIRES(_mutex) { return _working == 0; });
+  _transfers.clear();
 }
 
 TransferQueue::Result TransferQueue::result(const std::string& identifier) const {

@@ -28,6 +28,7 @@ std::optional<Outcome> outcomeOf(Kind kind) {
 Verdicts::Verdicts() : _story([this](const AppEvent& event) { _heard.push_back(event); }) {}
 
 void Verdicts::hear(const device::CallRecord& record) {
+  ++_count;
   _story.hear(record);
   bool declined = !record.app.empty() && device::Boundary::isDeclined(record.error);
   if (_heard.empty() && !declined) return;
@@ -74,16 +75,16 @@ void Verdicts::take(const AppEvent& event) {
       _removalsRestricted = event.text;
       break;
     case Kind::chosen:
-      _verdicts[event.app].exception = event;
+      _verdicts[event.app].exception = std::make_shared<const AppEvent>(event);
       break;
     case Kind::updates:
       _verdicts[event.app].updates = true;
       break;
     case Kind::pathRefused:
-      _verdicts[event.app].pathRefused = event;
+      _verdicts[event.app].pathRefused = std::make_shared<const AppEvent>(event);
       break;
     case Kind::markFailed:
-      _verdicts[event.app].markFailed = event;
+      _verdicts[event.app].markFailed = std::make_shared<const AppEvent>(event);
       break;
     case Kind::restoreDeclined:
       _restoreDeclined = event;
@@ -94,7 +95,7 @@ void Verdicts::take(const AppEvent& event) {
       break;
     case Kind::prepared:
     case Kind::restored:
-      _verdicts[event.app].last = event;
+      _verdicts[event.app].last = std::make_shared<const AppEvent>(event);
       break;
     case Kind::transferFailed:
       _endings.push_back({event.app, Outcome::failed, event.fact.empty() ? event.text : event.fact});
@@ -104,12 +105,12 @@ void Verdicts::take(const AppEvent& event) {
       break;
     case Kind::removed:
     case Kind::removalFailed:
-      if (!_declined.count(event.app)) _verdicts[event.app].removal = event;
+      if (!_declined.count(event.app)) _verdicts[event.app].removal = std::make_shared<const AppEvent>(event);
       break;
     default:
       // The plug-in takes it for a failure there, but its turn never came.
       if (_declined.count(event.app)) break;
-      if (outcomeOf(event.kind)) _verdicts[event.app].last = event;
+      if (outcomeOf(event.kind)) _verdicts[event.app].last = std::make_shared<const AppEvent>(event);
   }
 }
 

@@ -1,6 +1,9 @@
 #pragma once
 
+#include <atomic>
+#include <cstdint>
 #include <map>
+#include <memory>
 #include <optional>
 #include <set>
 #include <string>
@@ -18,17 +21,19 @@ namespace tsd {
 /// so that they give the same reasons. `hear` runs under the journal's lock; questions come from any thread.
 class Verdicts {
  public:
+  /// Shared and mostly null, as there is a verdict for each of many apps.
+  using EventRef = std::shared_ptr<const AppEvent>;
   struct Verdict {
-    std::optional<AppEvent> last;       // what settles its install
-    std::optional<AppEvent> removal;    // how its removal ended; may be heard before or after the end of its install
-    std::optional<AppEvent> exception;  // the rule that it passed although it could have been stopped
-    std::optional<AppEvent> pathRefused;
-    std::optional<AppEvent> markFailed;
+    EventRef last;       // what settles its install
+    EventRef removal;    // how its removal ended; may be heard before or after the end of its install
+    EventRef exception;  // the rule that it passed although it could have been stopped
+    EventRef pathRefused;
+    EventRef markFailed;
     bool updates = false;
     bool isAwaited = false;  // by a restore, even now
 
     /// Why it is not installed. That it was removed first does not answer that.
-    const std::optional<AppEvent>& ofInstall() const {
+    const EventRef& ofInstall() const {
       return !last && removal && removal->kind == AppEvent::Kind::removalFailed ? removal : last;
     }
   };
@@ -44,6 +49,8 @@ class Verdicts {
   /// Forgets everything, for the next run.
   void restart();
 
+  /// How many records it has heard in all.
+  std::uint64_t heard() const { return _count; }
   Verdict of(const std::string& app) const;
   /// Why no app is removed; empty: apps are removed.
   std::string removalsRestricted() const;
@@ -57,6 +64,7 @@ class Verdicts {
 
   std::vector<AppEvent> _heard;  // of one record; as the story, guarded by the journal's lock
   AppStory _story;
+  std::atomic<std::uint64_t> _count = 0;
 
   mutable platform::Mutex _mutex;
   std::map<std::string, Verdict, std::less<>> _verdicts GUARDED_BY(_mutex);

@@ -31,9 +31,8 @@ double secondsSince(std::chrono::steady_clock::time_point start, std::chrono::st
 
 }  // namespace
 
-SyncReport SyncRun::run(const std::vector<TodoEntry>& wanted) {
+SyncReport SyncRun::run() {
   _began = std::chrono::steady_clock::now();
-  _wanted = wanted;
   _parts.watch.restart();
   _parts.verdicts.restart();
   _before = appsOnDevice();
@@ -147,7 +146,7 @@ void SyncRun::awaitOutcomes() {
   auto& events = _parts.session.device().events();
   const auto patience = outcomeBase + std::chrono::seconds(bytes / outcomeBytesPerSecond);
   auto deadline = events.clock().now() + patience;
-  std::uint64_t changes = _parts.watch.changes();
+  std::uint64_t signs = signsOfLife();
   if (!_assets.empty()) _parts.progress.headline("Waiting for the outcomes");
   // On the heap, because a device that never goes quiet must not keep this thread waiting: see below.
   auto quiet = std::make_unique<QuietWatch>(events, _parts.stop);
@@ -155,9 +154,8 @@ void SyncRun::awaitOutcomes() {
   while (!isQuiet && !_parts.stop.requested() && events.clock().now() < deadline) {
     isQuiet = quiet->waitUntil(std::min(deadline, events.clock().now() + displayInterval));
     showOutcomes(isQuiet);
-    // Whatever the device tells of an app is a sign of life.
-    const std::uint64_t now = _parts.watch.changes();
-    if (std::exchange(changes, now) != now) deadline = events.clock().now() + patience;
+    const std::uint64_t now = signsOfLife();
+    if (std::exchange(signs, now) != now) deadline = events.clock().now() + patience;
   }
   if (isQuiet || _parts.stop.requested()) return;
   _deadlinePassed = true;
@@ -202,13 +200,17 @@ std::set<std::string> SyncRun::appsOnDevice() const {
   return ids;
 }
 
+/// Whatever the device tells of an app, and every call between it and the plug-in: when all apps are installed, the
+/// marks of thousands are still to be written.
+std::uint64_t SyncRun::signsOfLife() const { return _parts.watch.changes() + _parts.verdicts.heard(); }
+
 void SyncRun::showOutcomes(bool always) {
   for (const auto& ending : _parts.verdicts.takeEndings())
     _parts.progress.ended(ending.app, wordsOf(ending.outcome), ending.reason, false);
   if (!_isTaken) return;
-  std::uint64_t changes = _parts.watch.changes();
-  if (!always && changes == _changesRead) return;
-  _changesRead = changes;
+  const std::uint64_t signs = signsOfLife();
+  if (!always && signs == _signsShown) return;
+  _signsShown = signs;
   _todo = readTodoList(_parts.session.files());
   for (const auto& entry : _todo) {
     if (entry.operation == platform::todo::installed) _parts.progress.ended(entry.identifier, "installed", "", true);
@@ -221,7 +223,6 @@ void SyncRun::showOutcomes(bool always) {
 
 void SyncRun::fillReport() {
   showOutcomes(true);
-  _report.todo = _todo;
   const SyncFacts facts{
       .device = _parts.session.device(),
       .queue = _parts.queue,
@@ -238,6 +239,7 @@ void SyncRun::fillReport() {
   _report.removed = outcomes.removed();
   for (const auto& app : _report.apps)
     _parts.progress.ended(app.id, wordsOf(app.outcome), app.reason, isInOrder(app.outcome));
+  _report.todo = std::move(_todo);
   _report.seconds = secondsSince(_began, std::chrono::steady_clock::now());
   if (auto last = _parts.watch.lastPlaceholderSeen()) _report.placeholderSeconds = secondsSince(_began, *last);
   _report.code = code();

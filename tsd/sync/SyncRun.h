@@ -37,10 +37,10 @@ struct SyncParts {
 /// One sync from the host's files to its report, on the daemon's thread. Run once.
 class SyncRun {
  public:
-  explicit SyncRun(const SyncParts& parts) : _parts(parts) {}
+  /// `wanted` is the host's todo list, which outlives the run.
+  SyncRun(const SyncParts& parts, const std::vector<TodoEntry>& wanted) : _parts(parts), _wanted(wanted) {}
 
-  /// `wanted` is the host's todo list.
-  SyncReport run(const std::vector<TodoEntry>& wanted);
+  SyncReport run();
 
  private:
   bool pushHost();
@@ -56,20 +56,21 @@ class SyncRun {
   void fillReport();
 
   /// Reads the todo list again if anything changed since, and passes new outcomes to the display.
+  std::uint64_t signsOfLife() const;
   void showOutcomes(bool always);
   std::string whyBroken() const;
   ExitCode code() const;
   std::set<std::string> appsOnDevice() const;
 
   const SyncParts _parts;
+  const std::vector<TodoEntry>& _wanted;
   SyncReport _report;
   std::chrono::steady_clock::time_point _began;
-  std::set<std::string> _before;   // apps on the device
-  std::vector<TodoEntry> _wanted;  // the todo list as the host gave it
+  std::set<std::string> _before;  // apps on the device
   std::vector<platform::TSAssetRef> _assets;
   std::map<std::string, std::string> _reportedReasons;  // of installs that the daemon reported as failed
   std::vector<TodoEntry> _todo;                         // as it was read last
-  std::uint64_t _changesRead = 0;                       // of the watch, when the list was read last
+  std::uint64_t _signsShown = 0;                        // when the list was read last
   bool _isTaken = false;  // the host's list is on the device; before that, what lies there is from an earlier sync
   bool _deadlinePassed = false;
   bool _phase = false;  // how the transfer phase is reported to have ended
