@@ -131,6 +131,12 @@ class Looking(Folder):
         self.assertNotIn("busy", after["status"])
         self.assertRegex(self.tsd("runs", "dev").stdout, "sync +killed$")
         self.assertIn("run 1 (sync): killed", after["why"]["answer"])
+        further = "packages may have come further than is shown"
+        self.assertNotIn(further, self.tsd("status", "dev").stderr)
+        with open("dev/runs/0001-sync/calls.jsonl", "a") as journal:
+            journal.write('{"note":"the journal is cut off here, as it has become too long"}\n')
+        for view in (["status", "dev"], ["home", "dev"], ["why", "dev", app], ["watch", "dev", "--until-idle"]):
+            self.assertEqual(self.tsd(*view).stderr.count(further), 1, view)
         self.sync("dev", "host")
         self.assertEqual(self.tsd("watch", "dev", "--until-idle").stdout,
                          "dev: nobody is changing it; 4 apps: 4 installed.\ndev: 4 apps: 4 installed.\n")

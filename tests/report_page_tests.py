@@ -68,7 +68,8 @@ class ReportPage(Folder):
         pathlib.Path(f"host/Packages/{apps[2]}.pkg").write_bytes(b"no archive")
         self.sync("dev", "host", code=SOME_FAILED)
         self.open()
-        self.assertIn("5 of 6 apps in order, 1 failed", self.text("#sentence"))
+        self.assertEqual(self.text("#sentence"), "The sync is not complete: 5 of 6 apps in order, 1 failed.")
+        self.assertRegex(self.text("#facts"), r"Resultnot completeExit code3Took\d+\.\d\d s$")
         self.assertEqual(self.text("#app-count"), "6 of 6 apps")
         self.type("app-outcome", "failed")
         self.assertEqual(self.text("#app-count"), "1 of 6 apps")
@@ -134,6 +135,19 @@ class ReportPage(Folder):
         unnamed = self.browser.ask("[...document.querySelectorAll('button, input, select')].filter(e => "
                                    "!e.textContent.trim() && !e.ariaLabel && !e.labels?.length).map(e => e.outerHTML)")
         self.assertEqual(unnamed, [])
+        self.settled()
+
+    def test_a_journal_that_was_cut(self):
+        self.make(2)
+        self.sync("dev", "host")
+        path = pathlib.Path("dev/runs/0001-sync/calls.jsonl")
+        lines = path.read_text().splitlines()
+        note = '{"note":"the journal is cut off here, as it has become too long"}'
+        hours = lines[len(lines) // 2].replace('"t":', '"t":72', 1)
+        path.write_text("\n".join([*lines[:len(lines) // 2], hours, note, ""]))
+        self.open()
+        self.assertRegex(self.text("#cut"), r"come to its size limit at \d+ min \d+\.\d{3} s: what came later is not drawn")
+        self.assertNotIn("Took", self.text("#facts"))
         self.settled()
 
     def test_many_apps_take_few_elements(self):

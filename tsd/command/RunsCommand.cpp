@@ -12,16 +12,9 @@ using platform::Value;
 
 namespace {
 
-/// "2024-02-29 12:34:56"
-std::string dayAndTime(const std::string& moment) {
-  std::string text = moment.substr(0, 19);
-  std::replace(text.begin(), text.end(), 'T', ' ');
-  return text;
-}
-
 std::string endText(const RunSummary& run) {
-  if (!run.ended) return wordsOfNoEnd(run);
-  std::string text = run.exitCode ? wordsOfEnd(static_cast<ExitCode>(*run.exitCode)) : run.result;
+  std::string text = endOf(run);
+  if (!run.ended) return text;
   std::string counts = run.counts.text();
   if (!counts.empty()) text += ": " + counts;
   return run.message.empty() ? text : text + ": " + run.message;

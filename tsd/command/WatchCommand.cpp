@@ -9,6 +9,7 @@
 #include <optional>
 #include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "platform/Condition.h"
@@ -130,6 +131,7 @@ class Watch {
   RunProgress _progress;
   const bool _redraws;
   bool _looked = false;
+  bool _isCutTold = false;
   StoreMark _mark{};
   std::optional<DeviceLock::Holder> _holder;
   std::vector<ProgressLine> _lines;
@@ -166,12 +168,16 @@ void Watch::look() {
         drawProgress(headline(), _lines, percentOf(_lines), Console::size(), Console::wantsColours()));
   else if (changed && !_context.options.json)
     print();
+  if (!_redraws && _progress.isCut() && !std::exchange(_isCutTold, true))
+    _context.console.message(_options.device + ": " + notKnownFurther);
   _looked = true;
 }
 
 std::string Watch::headline() const {
   return _options.device + ": " +
-         (_holder ? "process " + _holder->process + " is working on it: " + _holder->command : "nobody is changing it");
+         (_holder ? "process " + _holder->process + " is working on it: " + _holder->command
+                  : "nobody is changing it") +
+         (_redraws && _progress.isCut() ? std::string("; ") + notKnownFurther : "");
 }
 
 std::string Watch::sum() const {

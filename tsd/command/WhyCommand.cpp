@@ -67,17 +67,10 @@ std::string timeText(const AppChapter::Line& line) {
   return text;
 }
 
-/// "2024-02-29 12:34:56"
-std::string dayAndTime(const std::string& moment) {
-  std::string text = moment.substr(0, 19);
-  std::replace(text.begin(), text.end(), 'T', ' ');
-  return text;
-}
-
 std::string headOf(const RunSummary& run) {
   std::string words = "tsd " + run.command;
   for (const auto& argument : run.arguments) words += " " + argument;
-  std::string end = run.ended ? run.result : wordsOfNoEnd(run);
+  std::string end = endOf(run);
   return "\n" + wrappedLine("Run " + std::to_string(run.number) + ", ",
                             dayAndTime(run.began) + ": " + words + " (" + end + ")");
 }

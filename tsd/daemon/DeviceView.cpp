@@ -6,9 +6,10 @@ namespace tsd {
 
 namespace {
 
-RunProgress progressOf(const std::string& device) {
+RunProgress progressOf(const std::string& device, Console& console) {
   RunProgress progress(device);
   progress.refresh();
+  if (progress.isCut()) console.message(device + ": " + notKnownFurther);
   return progress;
 }
 
@@ -24,7 +25,7 @@ std::vector<RunSummary> runsOfDevice(const std::string& folder, const TellProble
 }
 
 DeviceView::DeviceView(const CommandContext& context, const std::string& folder)
-    : DeviceView(context, folder, progressOf(folder)) {}
+    : DeviceView(context, folder, progressOf(folder, context.console)) {}
 
 DeviceView::DeviceView(const CommandContext& context, const std::string& folder, const RunProgress& progress)
     : _holder(DeviceLock::holderOf(folder)),

@@ -21,8 +21,7 @@ KeptRun::KeptRun(const std::string& device, const CommonOptions& options, Consol
   try {
     makeFolder();
     writeSummary(nullptr);
-    _calls.emplace(newFile("/calls.jsonl"), mostBytes,
-                   R"({"note":"the journal is cut off here, as it has become too long"})");
+    _calls.emplace(newFile("/calls.jsonl"), mostBytes, lastLineOfJournal);
     _log.emplace(newFile("/log"), mostBytes, "the log is cut off here because it has become too long");
   } catch (const std::exception& problem) {
     tell(problem.what());

@@ -25,6 +25,8 @@ class KeptRun {
   static constexpr std::size_t most = 20;  // runs kept on a device; the oldest make room
   /// Bytes of a run's journal, and of its log; what exceeds them is left out, and the last line says so.
   static constexpr std::uint64_t mostBytes = std::uint64_t{64} << 20;
+  static constexpr const char* lastLineOfJournal =
+      R"({"note":"the journal is cut off here, as it has become too long"})";
 
   /// `device` is the device's folder, which this process has locked; `console` outlives the run.
   KeptRun(const std::string& device, const CommonOptions& options, Console& console);

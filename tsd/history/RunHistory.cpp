@@ -8,6 +8,8 @@
 
 #include "device/boundary/Journal.h"
 #include "tsd/CommandError.h"
+#include "tsd/history/KeptRun.h"
+#include "tsd/terminal/Output.h"
 
 namespace tsd {
 
@@ -95,6 +97,11 @@ void readOutcomes(const RunSummary& run, const std::string& text, Each&& each) {
 
 const char* wordsOfNoEnd(const RunSummary& run) { return run.isRunning ? "still running" : "killed"; }
 
+std::string endOf(const RunSummary& run) {
+  if (!run.ended) return wordsOfNoEnd(run);
+  return run.exitCode ? wordsOfEnd(static_cast<ExitCode>(*run.exitCode)) : run.result;
+}
+
 std::optional<AppOutcome> outcomeIn(const RunSummary& run, const std::string& app) {
   std::optional<AppOutcome> found;
   readOutcomes(run, device::jsonText(platform::Value(app)), [&](AppOutcome outcome) {
@@ -131,13 +138,16 @@ std::vector<RunSummary> keptRuns(const std::string& device, const TellProblem& t
   return found;
 }
 
-void readJournal(const RunSummary& run, const std::vector<std::string>& texts,
+bool readJournal(const RunSummary& run, const std::vector<std::string>& texts,
                  const std::function<void(const device::CallRecord& record)>& each) {
+  bool isCut = false;
   readLines(run, "/calls.jsonl", [&](const std::string& line) {
     auto isIn = [&line](const std::string& text) { return line.find(text) != std::string::npos; };
+    if (line == KeptRun::lastLineOfJournal) isCut = true;
     if (std::none_of(texts.begin(), texts.end(), isIn)) return;
     if (auto record = device::parseJournalLine(line)) each(*record);
   });
+  return isCut;
 }
 
 }  // namespace tsd

@@ -43,6 +43,8 @@ std::vector<RunSummary> keptRuns(const std::string& device, const TellProblem& t
 
 /// "killed" or "still running", of a run without an end.
 const char* wordsOfNoEnd(const RunSummary& run);
+/// How it ended, or that it did not, for people: "done", "not complete", "killed".
+std::string endOf(const RunSummary& run);
 
 // What follows throws a `CommandError` when a file is there and cannot be read. Lines that are not
 // records, are too long or are nested too deeply are skipped.
@@ -53,7 +55,8 @@ std::optional<AppOutcome> outcomeIn(const RunSummary& run, const std::string& ap
 std::vector<AppOutcome> outcomesIn(const RunSummary& run);
 
 /// Every record of the run's journal whose line contains one of the texts, in order.
-void readJournal(const RunSummary& run, const std::vector<std::string>& texts,
+/// Answers whether the journal had come to its size limit, so that more happened than it says.
+bool readJournal(const RunSummary& run, const std::vector<std::string>& texts,
                  const std::function<void(const device::CallRecord& record)>& each);
 
 }  // namespace tsd

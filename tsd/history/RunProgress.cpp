@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "device/boundary/Journal.h"
+#include "tsd/history/KeptRun.h"
 #include "tsd/history/RunHistory.h"
 
 namespace tsd {
@@ -31,6 +32,7 @@ bool RunProgress::refresh() {
   if (changed) {
     _journal = std::move(journal);
     _read = 0;
+    _isCut = false;
     _fractions.clear();
   }
   auto file = run ? run->files->openForReading(_journal) : nullptr;
@@ -47,6 +49,9 @@ bool RunProgress::refresh() {
       std::size_t begin = lines.rfind('\n', at) + 1;
       take(lines.substr(begin, lines.find('\n', at) - begin));
     }
+    // It is the last line, and the journal is not read beyond it.
+    const std::string_view cut = KeptRun::lastLineOfJournal;
+    if (size > cut.size() && lines.substr(size - 1 - cut.size(), cut.size()) == cut) _isCut = true;
     changed = changed || size > 0;
     _read += size;
     text.erase(0, size);

@@ -12,6 +12,7 @@
 #include "tsd/history/Verdicts.h"
 #include "tsd/picture/HomePages.h"
 #include "tsd/report/ReportJournal.h"
+#include "tsd/terminal/Output.h"
 
 namespace tsd {
 
@@ -106,7 +107,7 @@ Value pair(std::string_view one, const Value& other) {
 class Reading {
  public:
   explicit Reading(const RunSummary& run) : _story([this](const AppEvent& event) { take(event); }) {
-    readJournal(run, {""}, [this](const device::CallRecord& record) {
+    isCut = readJournal(run, {""}, [this](const device::CallRecord& record) {
       _story.hear(record);
       journal.hear(record);
     });
@@ -119,6 +120,7 @@ class Reading {
   }
 
   ReportJournal journal;
+  bool isCut = false;  // the journal has come to its size limit
   std::map<std::string, App> apps;
 
  private:
@@ -191,20 +193,23 @@ Value valueOfHome(const ReportSubject& subject, device::LocalDevice& device) {
   return result;
 }
 
+std::string inUTC(const std::string& moment) { return dayAndTime(moment) + " UTC"; }
+
 std::string endOfRun(const ReportSubject& subject) {
-  if (subject.run.ended) return subject.run.result;
+  if (subject.run.ended) return endOf(subject.run);
   return subject.isRunning && subject.isLast ? "still running" : "killed";
 }
 
-/// "The sync ended as "partial": 5 of 8 apps in order, 2 failed, 1 not allowed."
+/// "The sync is not complete: 5 of 8 apps in order, 2 failed, 1 not allowed."
 std::string sentenceOf(const Reading& reading, const ReportSubject& subject) {
   OutcomeCounts counts;
   for (const auto& [id, app] : reading.apps) counts.add(app.outcome);
+  const std::string end = endOfRun(subject);
   std::string text = "The " + subject.run.command;
-  if (subject.run.ended)
-    text += " ended as \"" + subject.run.result + '"';
+  if (end == "failed")
+    text += " failed";
   else
-    text += endOfRun(subject) == "killed" ? " was killed" : " was still running";
+    text += (end == "done" || end == "not complete" ? " is " : " was ") + end;
   std::string apps = counts.text();
   return text + (apps.empty() ? "." : ": " + apps + ".");
 }
@@ -215,11 +220,11 @@ Value valueOfFacts(const Reading& reading, const ReportSubject& subject) {
   Value facts = Value::makeArray();
   auto add = [&](const char* name, const std::string& value) { facts.array()->append(pair(name, value)); };
   add("Command", words);
-  add("Began", subject.run.began);
-  add("Ended", subject.run.ended.value_or(""));
+  add("Began", inUTC(subject.run.began));
+  add("Ended", subject.run.ended ? inUTC(*subject.run.ended) : "");
   add("Result", endOfRun(subject));
   add("Exit code", subject.run.exitCode ? std::to_string(*subject.run.exitCode) : "");
-  add("Took", std::to_string(reading.journal.end().count() / 1000) + " ms");
+  if (!reading.isCut) add("Took", durationText(static_cast<double>(reading.journal.end().count()) / 1e6));
   return facts;
 }
 
@@ -231,11 +236,11 @@ Value reportDocument(const ReportSubject& subject, device::LocalDevice& device) 
   auto& entries = *document.dictionary();
   entries.set("device", subject.deviceName);
   entries.set("title", "run " + std::to_string(subject.run.number) + ", " + subject.run.command);
-  entries.set("made", currentTimeText());
+  entries.set("made", inUTC(currentTimeText()));
   entries.set("maker", "tsd " + subject.version);
   Value run = Value::makeDictionary();
   run.dictionary()->set("command", subject.run.command);
-  run.dictionary()->set("began", subject.run.began);
+  run.dictionary()->set("began", inUTC(subject.run.began));
   run.dictionary()->set("result", endOfRun(subject));
   run.dictionary()->set("micros", reading.journal.end().count());
   entries.set("run", run);
@@ -250,6 +255,7 @@ Value reportDocument(const ReportSubject& subject, device::LocalDevice& device) 
   entries.set("home", valueOfHome(subject, device));
   entries.set("apps", valueOfApps(reading, subject));
   entries.set("journal", reading.journal.document());
+  entries.set("journalIsCut", reading.isCut);
   Value versions = Value::makeArray();
   versions.array()->append(pair("Program", Value("tsd " + subject.version)));
   versions.array()->append(pair("Plug-in interface", Value(std::to_string(platform::pluginInterfaceVersion))));

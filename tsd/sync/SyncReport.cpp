@@ -1,7 +1,5 @@
 #include "tsd/sync/SyncReport.h"
 
-#include <cstdio>
-
 #include "tsd/terminal/Console.h"
 #include "tsd/terminal/Output.h"
 
@@ -10,12 +8,6 @@ namespace tsd {
 using platform::Value;
 
 namespace {
-
-std::string secondsText(double seconds) {
-  char text[32];
-  std::snprintf(text, sizeof text, "%.2f s", seconds);
-  return text;
-}
 
 std::string listLine(const std::string& title, const std::vector<std::string>& ids) {
   if (ids.empty()) return {};
@@ -65,10 +57,11 @@ std::string SyncReport::text() const {
   text += listLine("Removed from the device", removed);
   if (text.empty() && code == ExitCode::done) text = "Nothing to do.\n";
   if (placeholderSeconds) {
-    text += noteLine("", "The last placeholder was on the home screen after " + secondsText(*placeholderSeconds) + ".");
+    text +=
+        noteLine("", "The last placeholder was on the home screen after " + durationText(*placeholderSeconds) + ".");
   }
   std::string counts = OutcomeCounts(apps).text();
-  return text + noteLine("", "Sync " + wordsOfEnd(code) + " after " + secondsText(seconds) +
+  return text + noteLine("", "Sync " + wordsOfEnd(code) + " after " + durationText(seconds) +
                                  (counts.empty() ? "." : ": " + counts + "."));
 }
 

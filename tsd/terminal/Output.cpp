@@ -4,6 +4,8 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cmath>
+#include <cstdio>
 
 #include "device/boundary/Journal.h"
 #include "tsd/CommandError.h"
@@ -94,6 +96,24 @@ const char* nameOfResult(ExitCode code) {
 std::string wordsOfEnd(ExitCode code) {
   std::string name = nameOfResult(code);
   return name == "partial" ? "not complete" : name;
+}
+
+std::string durationText(double seconds) {
+  char text[48];
+  const auto whole = static_cast<long long>(std::llround(seconds));
+  if (seconds < 60)
+    std::snprintf(text, sizeof text, "%.2f s", seconds);
+  else if (whole < 3600)
+    std::snprintf(text, sizeof text, "%lld min %lld s", whole / 60, whole % 60);
+  else
+    std::snprintf(text, sizeof text, "%lld h %lld min", whole / 3600, whole / 60 % 60);
+  return text;
+}
+
+std::string dayAndTime(const std::string& moment) {
+  std::string text = moment.substr(0, 19);
+  std::replace(text.begin(), text.end(), 'T', ' ');
+  return text;
 }
 
 Value arrayOf(const std::vector<std::string>& texts) {

@@ -22,6 +22,11 @@ const char* nameOfResult(ExitCode code);
 /// The same for people: "done", "not complete", "failed" or "cancelled".
 std::string wordsOfEnd(ExitCode code);
 
+/// A length of time: "4.27 s", "3 min 8 s", "1 h 2 min".
+std::string durationText(double seconds);
+/// "2024-02-29 12:34:56" of "2024-02-29T12:34:56.789Z".
+std::string dayAndTime(const std::string& moment);
+
 /// An array of strings.
 platform::Value arrayOf(const std::vector<std::string>& texts);
 

@@ -17,12 +17,20 @@
     return element;
   };
   const counted = (count, one) => `${count.toLocaleString("en")} ${one}${count === 1 ? "" : "s"}`;
-  const seconds = (micros) => {
-    if (micros < 1000) return `${micros} µs`;
-    if (micros < 1e6) return `${(micros / 1e3).toFixed(micros < 1e4 ? 2 : 1)} ms`;
-    return `${(micros / 1e6).toFixed(micros < 1e8 ? 2 : 1)} s`;
+  /** With so many decimals of a second, where there are minutes. */
+  const minutes = (micros, decimals) => {
+    const whole = Math.floor(micros / 6e7);
+    return `${whole} min ${((micros - whole * 6e7) / 1e6).toFixed(decimals)} s`;
   };
-  const moment = (micros) => `${(micros / 1e6).toFixed(3)} s`;
+  /** Apart from others that are a step away. */
+  const seconds = (micros, step = micros / 100) => {
+    const decimals = (unit) => Math.max(0, Math.min(6, Math.ceil(-Math.log10(Math.max(step, 1) / unit) - 1e-9)));
+    if (micros < 1000) return `${Math.round(micros)} µs`;
+    if (micros < 1e6) return `${(micros / 1e3).toFixed(decimals(1e3))} ms`;
+    if (micros < 6e7) return `${(micros / 1e6).toFixed(decimals(1e6))} s`;
+    return minutes(micros, decimals(1e6));
+  };
+  const moment = (micros) => (micros < 6e7 ? `${(micros / 1e6).toFixed(3)} s` : minutes(micros, 3));
   const tones = {};
   for (const [word, tone] of data.outcomes) tones[word] = tone;
   const toneOf = (outcome) => `tone-${tones[outcome] || "still"}`;
@@ -353,6 +361,12 @@
       at("legend").append(item);
     }
 
+    if (data.journalIsCut) {
+      at("cut").textContent =
+        `The journal of this run has come to its size limit at ${moment(data.run.micros)}: what came later is not drawn, ` +
+        "and a bar that reaches its end may have ended anywhere behind it.";
+    }
+
     const chart = at("chart");
     const canvas = at("canvas");
     const pen = canvas.getContext("2d");
@@ -453,7 +467,7 @@
       pen.fillStyle = faint;
       pen.font = "12px system-ui, sans-serif";
       for (let tick = Math.ceil(from / step) * step; tick <= from + span; tick += step) {
-        const text = tick === 0 ? "0" : seconds(Math.round(tick * 10) / 10);
+        const text = tick === 0 ? "0" : seconds(Math.round(tick * 10) / 10, step);
         if (x(tick) + pen.measureText(text).width < w) pen.fillText(text, x(tick) + 2, 11);
       }
       pen.fillStyle = line;
@@ -462,7 +476,7 @@
         pen.fillStyle = faint;
         pen.fillText("No app took any time.", 10, axis + 20);
       }
-      at("span").textContent = `${seconds(Math.round(from))} to ${seconds(Math.round(from + span))}, ${counted(tracks.length, "app")}`;
+      at("span").textContent = `${from === 0 ? 0 : seconds(from, span / 100)} to ${seconds(from + span, span / 100)}, ${counted(tracks.length, "app")}`;
     };
     const redraw = soon(draw);
     shown.redraw = redraw;
