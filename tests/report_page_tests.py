@@ -83,6 +83,10 @@ class ReportPage(Folder):
         self.assertIn("RVAppInstallCoordinator.error", self.text("#call-list"))
         self.type("call-search", "no such thing anywhere")
         self.assertRegex(self.text("#call-count"), "^0 of ")
+        self.browser.ask("document.documentElement.style.scrollBehavior = 'auto';"
+                         "document.getElementById('timeline').scrollIntoView()")
+        self.browser.ask(FRAME)
+        self.assertEqual(self.text("nav [aria-current]"), "Timeline")
         before = self.text("#span")
         self.browser.ask("document.getElementById('zoom-in').click()")
         self.browser.ask(FRAME)

@@ -164,7 +164,7 @@
     wish.addEventListener("change", () => dress(wish.matches));
     button.addEventListener("click", () => dress(document.documentElement.dataset.theme !== "dark"));
     const links = [...document.querySelectorAll("nav a")];
-    new IntersectionObserver(
+    const sections = new IntersectionObserver(
       (entries) => {
         for (const entry of entries) {
           const link = links.find((each) => each.hash === `#${entry.target.id}`);
@@ -175,7 +175,8 @@
         }
       },
       { rootMargin: "-30% 0px -60%" }
-    ).observe(at("summary"));
+    );
+    for (const link of links) sections.observe(document.querySelector(link.hash));
   };
 
   const drawSummary = () => {
