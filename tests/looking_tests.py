@@ -7,6 +7,7 @@ usage: looking_tests.py TSD [unittest arguments]
 import fcntl
 import os
 import pathlib
+import plistlib
 import pty
 import signal
 import struct
@@ -60,7 +61,7 @@ def on_terminal(columns, *arguments):
 
 
 def columns_of(line):
-    return sum(0 if unicodedata.combining(sign) else 2 if unicodedata.east_asian_width(sign) in "WF" else 1
+    return sum(0 if unicodedata.category(sign) in ("Mn", "Me", "Cf") else 2 if unicodedata.east_asian_width(sign) in "WF" else 1
                for sign in line)
 
 
@@ -82,15 +83,23 @@ class Looking(Folder):
         return answers
 
     def test_lines_keep_to_the_terminal(self):
-        app = self.make(8)[0]
+        apps = self.make(8)
+        names = ["A name that is very much longer than its place", "日本語の名前がとても長い", "حديقة هادئة جدا", "e\u0301" * 30,
+                 "👩\u200d👩\u200d👧 family"]
+        for app, name in zip(apps, names):
+            manifest = pathlib.Path(f"host/{app}/Info.plist")
+            manifest.write_bytes(plistlib.dumps(plistlib.loads(manifest.read_bytes()) | {"KBBundleDisplayName": name}))
         for columns in (40, 80, 160):
             for arguments in (("plan", "dev", "host"), ("sync", "dev", "host"), ("status", "dev"), ("home", "dev"),
-                              ("runs", "dev"), ("why", "dev", app), ("query", "dev", "metrics")):
-                lines = on_terminal(columns, *arguments)
-                self.assertGreater(len(lines), 1, arguments)
-                # An identifier is one word, which is never cut where the person may want to copy it.
-                wide = [line for line in lines if columns_of(line) > columns and len(line.split()) > 1]
-                self.assertEqual(wide, [], f"{' '.join(arguments)} in {columns} columns")
+                              ("runs", "dev"), ("why", "dev", app), ("query", "dev", "metrics"),
+                              ("query", "dev", "accounts"), ("restore", "dev", "host"), ("backup", "dev"),
+                              ("watch", "dev", "--until-idle"), *([("help", "sync")] if columns > 40 else [])):
+                with self.subTest(" ".join(arguments), columns=columns):
+                    lines = on_terminal(columns, *arguments)
+                    self.assertGreater(len(lines), 1, arguments)
+                    # An identifier is one word, which is never cut where the person may want to copy it.
+                    wide = [line for line in lines if columns_of(line) > columns and len(line.split()) > 1]
+                    self.assertEqual(wide, [])
         # A wide one is used.
         self.assertGreater(max(columns_of(line) for line in on_terminal(160, "home", "dev")), 100)
 

@@ -16,7 +16,7 @@ ExitCode runBackup(const CommandContext& context, const DeviceOnlyOptions& optio
     document.dictionary()->set("result", "done");
     writeDocument(document);
   } else {
-    context.report("The apps' store metadata is ready for a backup.\n");
+    context.report(noteLine("", "The apps' store metadata is ready for a backup."));
   }
   return ExitCode::done;
 }

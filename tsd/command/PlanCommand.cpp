@@ -221,7 +221,8 @@ std::string text(const Rehearsal& rehearsal) {
   if (!decisions.empty()) {
     text = front("PLACE", "WHAT", "APP") + "WHY";
     // Where the reasons begin on a line of their own, none stands below it.
-    text = (columnsOf(text) > lineWidth() ? front("PLACE", "WHAT", "APP") : text) + "\n";
+    if (columnsOf(text) > lineWidth()) text = front("PLACE", "WHAT", "APP");
+    text = text.substr(0, text.find_last_not_of(' ') + 1) + "\n";
   }
   std::map<std::string, std::size_t> counts;
   for (const auto& decision : decisions) {

@@ -35,7 +35,7 @@ std::string text(const Value& answer) {
   if (const auto* entries = answer.dictionary()) {
     for (const auto& entry : *entries) text += std::string(entry.key) + " " + describe(entry.value) + "\n";
   } else if (const auto* items = answer.array()) {
-    for (const auto& item : *items) text += printable(describe(item)) + "\n";
+    for (const auto& item : *items) text += noteLine("", describe(item));
   }
   return text.empty() ? "none\n" : text;
 }

@@ -273,7 +273,7 @@ std::string Restore::text(ExitCode code) const {
   const std::vector<AppOutcome> outcomes(_list.apps.begin(), _list.apps.end());
   std::string text;
   if (!_list.apps.empty()) {
-    Table table({{"APP", 12, true}, {"NAME", 6}, {"VERSION", 7}, {"STATE"}, {"OUTCOME"}});
+    Table table({{"APP", 8, true}, {"NAME", 4}, {"VERSION", 3, false, true}, {"STATE", 6, false, true}, {"OUTCOME"}});
     for (const auto& app : _list.apps) {
       table.add({app.id, app.name, app.version, app.state.empty() ? "missing" : app.state, wordsOf(app.outcome)});
     }

@@ -74,7 +74,7 @@ void addCommonOptions(CLI::App* command, Invocation& invocation) {
   command->add_option("--calls", common.calls, "Write the journal of all calls to this file")
       ->option_text("FILE")
       ->group(commonGroup);
-  command->add_option("--inject", invocation.rules, "Inject a fault: POINT[:APP][@N[+]]=ACTION (repeatable)")
+  command->add_option("--inject", invocation.rules, wrapped("Inject a fault: POINT[:APP][@N[+]]=ACTION (repeatable)"))
       ->option_text("RULE")
       ->expected(1)
       ->take_all()
