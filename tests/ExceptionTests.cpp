@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <chrono>
 #include <map>
 #include <set>
@@ -35,7 +36,6 @@ class ThrowingService {
       }
       // What the transaction log makes of a record is inside of the call that records it.
       if (!armed || _inside.empty() || isTransaction(record)) return;
-      if (record.operation == "deallocateMemory") return;  // the device has yet to do it
       if (_of == Of::everyKind && !_kinds.insert(_inside.back() + record.service + record.operation).second) return;
       if (++_seen != _nth) return;
       thrownAt = record.operation;
@@ -240,6 +240,11 @@ void expectRestored(PluginRig& rig, const ThrowingService* service, Around aroun
   if (!losesCoordinator(thrownAt)) {
     EXPECT_EQ(rig.device().status().coordinators.empty(), !isThere(0));
   }
+  for (const auto& record : rig.records()) {
+    if (record.operation != "setPlaceholderPromise" || record.result != Value(true)) continue;
+    const auto messages = rig.messages();  // what a coordinator holds goes with it
+    EXPECT_EQ(std::ranges::count(messages, "D Cancelling placeholder for appBundleIdentifier:" + record.app), 0);
+  }
   expectStepsClosed(rig, thrownAt);
 }
 
@@ -336,6 +341,10 @@ TEST(Exceptions, WhatAServiceStopsIsNamed) {
     EXPECT_EQ(rig.countOf("makeAppInstallObserver"), 1u);  // that threw is not among the records
     const Names stopped = stoppedIn(rig);
     EXPECT_EQ(stopped.size(), service.isTold ? 1u : 0u) << service.thrownAt;
+    for (const auto& record : rig.records()) {
+      if (!record.end || record.operation != "reconcileSync") continue;
+      EXPECT_EQ(record.result, Value(!stopped.contains("reconcileSync"))) << service.thrownAt;
+    }
     named.insert(stopped.begin(), stopped.end());
     return service.seen() >= nth;
   });
@@ -346,7 +355,8 @@ TEST(Exceptions, WhatAServiceStopsIsNamed) {
             "accountsForAssets, assetInstallFailed, assetInstallSucceeded, assetSyncFinishedWithStatus, "
             "assetTransferSucceeded, assetTransferUpdatedProgress, cancelForReason, changeAssetID, "
             "clearSyncData, coordinatorCanceledWithReason, coordinatorDidCompleteSuccessfully, "
-            "coordinatorDidInstallPlaceholder, coordinatorShouldPrioritize, createDirectory, disabledAssetTypes, "
+            "coordinatorDidInstallPlaceholder, coordinatorShouldPrioritize, createDirectory, deallocateMemory, "
+            "disabledAssetTypes, "
             "installedAssetMetrics, installedAssets, logStep, moveItem, outstandingAssetTransfers, "
             "prepareAppForInstallUsingCoordination, prepareAppForRestoreUsingCoordination, prepareForBackup, "
             "reconcileRestoreOfType, reconcileSync, removeItem, removeObserver, setupInstallCoordinatorObserver, "

@@ -130,6 +130,7 @@ TEST_F(ScriptedServices, PlaceholdersMayLackAnything) {
       said("Asset app.bare (pretty=app.bare, version=(null)) prepped with icon (null), at (null), meta at (null), "
            "info at (null), storePid=0, isRestore=n"),
       1u);
+  EXPECT_EQ(_rig.countOf("setIconPromise", "app.bare"), 0u);
 }
 
 TEST_F(ScriptedServices, AnOrderOfNoBytesIsNone) {

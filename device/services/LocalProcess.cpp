@@ -1,6 +1,7 @@
 #include "device/services/LocalProcess.h"
 
 #include <cstdlib>
+#include <memory>
 #include <utility>
 
 #include "device/files/DevicePath.h"
@@ -30,8 +31,9 @@ std::string LocalProcess::textOfErrorNumber(int errorNumber) {
 }
 
 void LocalProcess::deallocateMemory(void* buffer, std::size_t length) {
+  // Whatever is injected, and whoever listens and throws: nobody else has it any more.
+  const std::unique_ptr<void, decltype(&std::free)> given(buffer, &std::free);
   _boundary.call({{"Process", "deallocateMemory"}}, nullptr, {{"length", length}}, [] {});
-  std::free(buffer);  // even where a fault is injected: nobody else has it any more
 }
 
 Value LocalProcess::infoDictionaryOfBundleAtPath(std::string_view path) {
