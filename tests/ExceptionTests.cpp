@@ -12,6 +12,7 @@
 #include "tests/FailingMemory.h"
 #include "tests/RestoreScenario.h"
 #include "tests/ScriptedServices.h"
+#include "tsd/CommandError.h"
 #include "tsd/daemon/PluginLoader.h"
 
 namespace tests {
@@ -345,6 +346,10 @@ TEST(Exceptions, WhatAServiceStopsIsNamed) {
       if (!record.end || record.operation != "reconcileSync") continue;
       EXPECT_EQ(record.result, Value(!stopped.contains("reconcileSync"))) << service.thrownAt;
     }
+    if (stopped.contains("uninstallAppUsingCoordination")) {
+      EXPECT_TRUE(
+          std::ranges::any_of(rig.records(), [](const auto& each) { return matches("step 7/1/2 n *", lineOf(each)); }));
+    }
     named.insert(stopped.begin(), stopped.end());
     return service.seen() >= nth;
   });
@@ -377,6 +382,13 @@ TEST(Exceptions, WhatWantOfMemoryStopsIsNamed) {
     }
     EXPECT_EQ(stoppedIn(rig), Names{name});
   }
+  PluginRig rig;
+  const tsd::PluginLoader plugin(SHIPPED_PLUGIN);
+  {
+    FailingMemory memory(1, Lasts::once);
+    EXPECT_THROW(plugin.create(rig.platform()), tsd::CommandError);
+  }
+  EXPECT_EQ(stoppedIn(rig), Names{"init"});
 }
 
 TEST(Exceptions, AReportThatWasNotUnderstoodIsFollowedByTheNext) {

@@ -102,6 +102,17 @@ TEST(HardCases, ACoordinatorOfAnUnknownAppStillHasTheRestoreStateCleaned) {
   delegate->coordinatorDidCompleteSuccessfully(coordinator);
   EXPECT_EQ(rig.readList(restoreStatePath), records);
   EXPECT_EQ(rig.readList(todoListPath), entries);
+  delegate->coordinatorShouldPrioritize(coordinator);
+  EXPECT_TRUE(rig.transfers().prioritized().empty());
+}
+
+TEST(HardCases, AnAppMayHaveAnEmptyName) {
+  PluginRig rig;
+  Value entries = Value::makeArray();
+  entries.array()->append(dictionaryOf({{"identifier", "app.a"}, {"operation", "install"}, {"name", ""}}));
+  rig.write(todoListPath, binaryList(entries));
+  EXPECT_EQ(rig.daemon().outstandingAssetTransfers().size(), 1u);
+  EXPECT_EQ(rig.countOf("setPlaceholderPromise", "app.a"), 1u);
 }
 
 }  // namespace

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "platform/InstallCoordination.h"
+#include "tests/RestoreScenario.h"
 #include "tests/Scenario.h"
 #include "tests/ScriptedServices.h"
 #include "tsd/daemon/PluginLoader.h"
@@ -163,6 +164,15 @@ TEST_F(ScriptedServices, ADaemonMayEndATransferInsideTheCallThatCancelsIt) {
   EXPECT_EQ(said("E Cannot cancel *"), 0u);
   delegate->coordinatorShouldPrioritize(coordinator);
   EXPECT_EQ(said("Prioritize app.a finished with error (null)"), 1u);
+}
+
+TEST_F(ScriptedServices, AWaitThatCannotBeIsOver) {
+  BrokenClock clock;
+  load({.clock = &clock});
+  writeRestoreLists(_rig, {});
+  EXPECT_TRUE(_client->reconcileRestoreOfType(2));
+  EXPECT_EQ(said("E _waitForPlaceholderInstalls was stopped by an exception: a clock that throws"), 1u);
+  EXPECT_EQ(said("Finished waiting for placeholder installs"), 1u);
 }
 
 }  // namespace

@@ -2,6 +2,7 @@
 
 #include <cstdlib>
 #include <cstring>
+#include <stdexcept>
 
 #include "platform/OBNumbers.h"
 
@@ -50,9 +51,13 @@ void HastyDaemon::cancelAssetTransferForFailedAsset(const platform::TSAssetRef& 
   if (cancelled) cancelled(asset);
 }
 
+bool BrokenClock::waitUntil(platform::Mutex&, platform::Condition&, Instant, const std::function<bool()>&) {
+  throw std::runtime_error("a clock that throws");
+}
+
 platform::Platform scripted(const platform::Platform& whole, const Scripted& services) {
   return {whole.process,
-          whole.clock,
+          services.clock ? *services.clock : whole.clock,
           whole.fileSystem,
           whole.propertyLists,
           whole.systemLog,

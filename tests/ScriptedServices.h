@@ -9,6 +9,7 @@
 #include <utility>
 #include <vector>
 
+#include "platform/Clock.h"
 #include "platform/HomeScreen.h"
 #include "platform/OBApplicationProxy.h"
 #include "platform/OBApplicationWorkspace.h"
@@ -71,8 +72,17 @@ class HastyDaemon final : public platform::TSDeviceService {
   std::vector<std::string> asked{};
 };
 
-/// The platform with others in the place of three services; absent ones stay.
+/// A clock with which nobody can wait.
+class BrokenClock final : public platform::Clock {
+ public:
+  Instant now() override { return {}; }
+  bool waitUntil(platform::Mutex& mutex, platform::Condition& changed, Instant deadline,
+                 const std::function<bool()>& satisfied) override;
+};
+
+/// The platform with others in the place of four services; absent ones stay.
 struct Scripted {
+  platform::Clock* clock = nullptr;
   platform::OBApplicationWorkspace* workspace = nullptr;
   platform::HomeScreen* homeScreen = nullptr;
   platform::TSDeviceService* deviceService = nullptr;
