@@ -39,6 +39,9 @@ class Replay {
           for (const auto& entry : each.entries) each.synced |= entry.place.first == find(path);
         }
         return;
+      case Step::Kind::syncTree:
+        take(Step::Kind::syncDirectory, path.substr(0, path.rfind('/')), {}, {});
+        return syncAllOf(path);
       default:
         return;
     }
@@ -84,6 +87,12 @@ class Replay {
     std::vector<Entry> entries;
     bool synced = false;
   };
+
+  void syncAllOf(const std::string& path) {
+    const Node& node = _nodes[at(path)];
+    take(node.isDirectory ? Step::Kind::syncDirectory : Step::Kind::syncFile, path, {}, {});
+    for (const auto& item : node.items) syncAllOf(path + '/' + item.first);
+  }
 
   int makeNode(bool isDirectory) {
     _nodes.push_back({isDirectory, {}, {}});
@@ -202,9 +211,9 @@ std::unique_ptr<Store> PowerLog::storeAfter(std::size_t count, Rest rest, const 
 }
 
 std::string PowerLog::describe(std::size_t step) const {
-  static constexpr const char* names[] = {"createDirectory", "createFile", "write",  "syncFile",
-                                          "syncDirectory",   "move",       "remove", "touch",
-                                          "storeWrite",      "storeCommit"};
+  static constexpr const char* names[] = {"createDirectory", "createFile", "write",      "syncFile",
+                                          "syncDirectory",   "syncTree",   "move",       "remove",
+                                          "touch",           "storeWrite", "storeCommit"};
   const auto& logged = _steps[step];
   std::string text = names[static_cast<std::size_t>(logged.kind)] + (' ' + logged.path) + ' ' + logged.target;
   for (const auto& change : logged.changes) text += change.kind + ' ' + change.key + "; ";

@@ -2,17 +2,17 @@
 
 #include <fcntl.h>
 #include <grp.h>
+#include <linux/magic.h>
 #include <pwd.h>
 #include <sys/stat.h>
+#include <sys/vfs.h>
+#include <unistd.h>
 
 #include <algorithm>
-#include <atomic>
+#include <array>
 #include <cerrno>
-#include <functional>
 #include <map>
 #include <new>
-#include <system_error>
-#include <thread>
 
 #include "device/files/DevicePath.h"
 #include "platform/Mutex.h"
@@ -175,39 +175,30 @@ int copyContents(int from, const FileInWriting& to) {
   return 0;
 }
 
-/// A flush is mostly waiting, and a disk writes out in one go what is asked for at the same time.
-constexpr std::size_t flushesAtOnce = 8;
+/// So many are flushed one by one, which waits for nobody else's files.
+constexpr std::size_t fewItems = 4;
 
-/// Calls `flush` with each index below `count`, on up to `atOnce` threads. The first error number, after which no more
-/// calls begin.
-int flushAll(std::size_t count, std::size_t atOnce, const std::function<int(std::size_t index)>& flush) {
-  std::atomic<std::size_t> next{0};
-  std::atomic<int> failure{0};
-  auto work = [&] {
-    for (std::size_t i; failure == 0 && (i = next++) < count;) {
-      int number;
-      try {
-        number = flush(i);
-      } catch (const std::bad_alloc&) {
-        number = ENOMEM;
-      }
-      int none = 0;
-      if (number != 0) failure.compare_exchange_strong(none, number);
-    }
-  };
-  {
-    std::vector<std::jthread> others;
-    try {
-      while (others.size() + 1 < std::min(count, atOnce)) others.emplace_back(work);
-    } catch (const std::system_error&) {
-      // Goes on with as many threads as there are.
-    }
-    work();
-  }
-  return failure;
+/// The directory, where one request flushes all of its file system: some take it for nothing, or only for what they
+/// keep here. Held open, so that the system tells of every write that failed from now on.
+FileDescriptor openFlushable(int directory) {
+  constexpr std::array<std::uint32_t, 6> known{EXT4_SUPER_MAGIC, XFS_SUPER_MAGIC, BTRFS_SUPER_MAGIC,
+                                               F2FS_SUPER_MAGIC, TMPFS_MAGIC,     OVERLAYFS_SUPER_MAGIC};
+  struct statfs about;
+  FileDescriptor opened(::openat(directory, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (!opened.isOpen() || ::fstatfs(opened.get(), &about) != 0) return FileDescriptor();
+  const auto type = static_cast<std::uint32_t>(about.f_type);
+  return std::find(known.begin(), known.end(), type) != known.end() ? std::move(opened) : FileDescriptor();
+}
+
+bool areOnOneFileSystem(int one, int other) {
+  struct stat first, second;
+  return ::fstat(one, &first) == 0 && ::fstat(other, &second) == 0 && first.st_dev == second.st_dev;
 }
 
 }  // namespace
+
+DiskFileTree::DiskFileTree(FileDescriptor root, std::shared_ptr<StepWatch> watch)
+    : _root(std::move(root)), _flushable(openFlushable(_root.get())), _watch(std::move(watch)) {}
 
 bool DiskFileTree::removeItem(std::string_view path, ErrorRef* error) {
   DiskPlace place;
@@ -376,6 +367,18 @@ bool DiskFileTree::syncDirectory(std::string_view path, ErrorRef* error) {
   return answerFileOperation(flushDirectory(path), path, error);
 }
 
+bool DiskFileTree::canFlushTree(std::string_view path) const {
+  DiskPlace place;
+  FileDescriptor directory;
+  return _flushable.isOpen() && find(path, place) == 0 && place.openDirectory(directory) == 0 &&
+         areOnOneFileSystem(directory.get(), _flushable.get());
+}
+
+int DiskFileTree::flushTree(std::string_view path) const {
+  return takeStep(_watch.get(), {Step::Kind::syncTree, path},
+                  [&](Step&) { return ::syncfs(_flushable.get()) == 0 ? 0 : errno; });
+}
+
 bool DiskFileTree::syncItem(std::string_view path, ErrorRef* error) {
   auto attributes = attributesOfItem(path, error);
   if (!attributes) return false;
@@ -384,19 +387,22 @@ bool DiskFileTree::syncItem(std::string_view path, ErrorRef* error) {
     bool isDirectory;
   };
   std::vector<Item> items{{std::string(path), attributes->isDirectory}};
+  const std::size_t mostFlushedAlone = attributes->isDirectory && canFlushTree(path) ? fewItems : items.max_size();
   for (std::size_t i = 0; i < items.size(); ++i) {
     if (!items[i].isDirectory) continue;
     std::string directory = path == "/" && i == 0 ? "" : items[i].path;
     auto entries = list(items[i].path, error);
     if (!entries) return false;
     for (const auto& entry : *entries) items.push_back({directory + '/' + entry.name, entry.isDirectory});
+    if (items.size() > mostFlushedAlone) return answerFileOperation(flushTree(path), path, error);
   }
   auto slash = path.rfind('/');
   items.push_back({std::string(slash == 0 ? "/" : path.substr(0, slash)), true});
-  // A watch of the steps needs the same order every time.
-  int failure = flushAll(items.size(), _watch ? 1 : flushesAtOnce, [&](std::size_t i) {
-    return items[i].isDirectory ? flushDirectory(items[i].path) : flushFile(items[i].path);
-  });
+  int failure = 0;
+  for (const auto& item : items) {
+    failure = item.isDirectory ? flushDirectory(item.path) : flushFile(item.path);
+    if (failure != 0) break;
+  }
   return answerFileOperation(failure, path, error);
 }
 

@@ -13,8 +13,7 @@ namespace device {
 class DiskFileTree final : public FileTree {
  public:
   /// `watch`, which may be null, is told of every step.
-  DiskFileTree(FileDescriptor root, std::shared_ptr<StepWatch> watch)
-      : _root(std::move(root)), _watch(std::move(watch)) {}
+  DiskFileTree(FileDescriptor root, std::shared_ptr<StepWatch> watch);
 
   bool removeItem(std::string_view path, platform::ErrorRef* error) override;
   bool createDirectory(std::string_view path, bool withIntermediateDirectories, const platform::Value& attributes,
@@ -48,8 +47,11 @@ class DiskFileTree final : public FileTree {
   int openFile(std::string_view path, FileDescriptor& file) const;
   int flushDirectory(std::string_view path) const;
   int flushFile(std::string_view path) const;
+  bool canFlushTree(std::string_view path) const;
+  int flushTree(std::string_view path) const;
 
   const FileDescriptor _root;
+  const FileDescriptor _flushable;  // the root again, if its file system can be flushed as a whole
   const std::shared_ptr<StepWatch> _watch;
 };
 

@@ -16,6 +16,7 @@ struct Step {
     write,          // what the body leaves in `bytes` has been appended to what was written before
     syncFile,       // the file's content
     syncDirectory,  // the directory's entries
+    syncTree,       // an item with everything in it, and its entry in its directory
     move,
     remove,  // a file, or a directory that is empty
     touch,
