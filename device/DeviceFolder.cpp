@@ -9,7 +9,7 @@
 #include "device/DeviceErrors.h"
 #include "device/DeviceParts.h"
 #include "device/LocalDevice.h"
-#include "device/boundary/InjectedSteps.h"
+#include "device/boundary/DeviceSteps.h"
 #include "device/files/DevicePath.h"
 #include "device/files/DiskFileTree.h"
 #include "device/files/OverlayFileTree.h"
@@ -106,7 +106,7 @@ static bool checkIsDevice(const std::string& folder, ErrorRef* error) {
 std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_ptr<EventQueue> events,
                                         DeviceOptions options, ErrorRef* error) {
   if (!checkIsDevice(folder, error)) return nullptr;
-  auto steps = InjectedSteps::of(options.rules);
+  auto steps = DeviceSteps::of(options.rules, options.journals);
   auto files = openTree(folder, error, steps);
   auto store = files ? openDatabaseStore(folder + databaseName, error, steps) : nullptr;
   if (!store) return nullptr;

@@ -244,7 +244,7 @@ void expectRestored(PluginRig& rig, const ThrowingService* service, Around aroun
   for (const auto& record : rig.records()) {
     if (record.operation != "setPlaceholderPromise" || record.result != Value(true)) continue;
     const auto messages = rig.messages();  // what a coordinator holds goes with it
-    EXPECT_EQ(std::ranges::count(messages, "D Cancelling placeholder for appBundleIdentifier:" + record.app), 0);
+    EXPECT_EQ(std::ranges::count(messages, "Cancelling placeholder for appBundleIdentifier:" + record.app), 0);
   }
   expectStepsClosed(rig, thrownAt);
 }

@@ -107,6 +107,13 @@ struct Boundary::State {
     }
   }
 
+  [[noreturn]] void die() const {
+    for (const auto& journal : journals) {
+      if (journal.handOver) journal.handOver();
+    }
+    kill();
+  }
+
   void write(CallRecord record) {
     platform::Mutex::Lock lock(journalMutex);
     record.number = ++records;
@@ -150,7 +157,8 @@ void Boundary::setDecliner(Decliner decliner) {
 ErrorRef Boundary::declinedError(const std::string& reason) { return platform::makeError("Declined", 1, reason); }
 bool Boundary::isDeclined(const ErrorRef& error) { return error && error->domain() == "Declined"; }
 
-void Boundary::die() {
+void Boundary::die() const { _state->die(); }
+void Boundary::kill() {
   std::raise(SIGKILL);
   std::abort();
 }

@@ -129,6 +129,9 @@ enum class JournalDetail : std::uint8_t { brief, whole };
 struct JournalListener {
   std::function<void(const CallRecord&)> hear;
   JournalDetail detail = JournalDetail::whole;  // at least
+  /// Writes out what was gathered, before something is changed that outlives the process, or the process dies. From any
+  /// thread; throws nothing. Null for a listener that gathers nothing.
+  std::function<void()> handOver{};
 };
 
 /// The one wrapper around every call that crosses between the plug-in and the device, in either direction:
@@ -215,7 +218,9 @@ class Boundary {
   static bool isDeclined(const platform::ErrorRef& error);
 
   /// Ends the process as `kill` does.
-  [[noreturn]] static void die();
+  [[noreturn]] void die() const;
+  /// The same, whatever the journals have gathered.
+  [[noreturn]] static void kill();
 
   /// `kind#number`, the same number for the same object until `forgetObject`, or, given what owns the object, as long
   /// as it lives.

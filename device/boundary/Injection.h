@@ -15,7 +15,7 @@ namespace device {
 ///
 /// POINT is an operation's C++ name, with its class in front and a dot where one name serves several
 /// ("RVPlaceholder.cancelForReason", "writeAtomically"), or "transfer" (each chunk of a package), or "step" (each
-/// single change of a device in a folder, see InjectedSteps.h).
+/// single change of a device in a folder, see DeviceSteps.h).
 /// Without APP every app matches; without N every match, otherwise the N-th only (counted from 1), with a plus sign the
 /// N-th and all after it.
 struct InjectionRule {

@@ -100,7 +100,7 @@ PackageTransfer::Result PackageTransfer::sendChunks(const Way& way, HostFile& pa
     auto bytes = package.read(static_cast<std::size_t>(chunk), &error);
     if (!bytes || !target.write(*bytes, &error))
       return {End::failed, transferError(textOf(error), error), result.bytes};
-    if (ordered && ordered->action == Action::killAfter) device::Boundary::die();
+    if (ordered && ordered->action == Action::killAfter) way.device.boundary().die();
     result.bytes += bytes->size();
     double fraction = size == 0 ? 1 : std::min(1.0, static_cast<double>(result.bytes) / static_cast<double>(size));
     if (!bytes->empty() || size == 0) {

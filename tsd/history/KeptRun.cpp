@@ -1,11 +1,14 @@
 #include "tsd/history/KeptRun.h"
 
+#include <chrono>
+#include <csignal>
 #include <cstdio>
 #include <exception>
 #include <utility>
 
 #include "device/boundary/Journal.h"
 #include "tsd/CommandError.h"
+#include "tsd/StartThread.h"
 #include "tsd/history/LineFile.h"
 #include "tsd/history/LogLine.h"
 #include "tsd/history/RunHistory.h"
@@ -16,6 +19,9 @@ namespace tsd {
 using platform::ErrorRef;
 using platform::Value;
 
+/// For whoever looks at a run while it waits.
+constexpr auto handOverTime = std::chrono::milliseconds(100);
+
 KeptRun::KeptRun(const std::string& device, const CommonOptions& options, Console& console)
     : _options(options), _console(console), _device(device), _began(currentTimeText()) {
   try {
@@ -23,8 +29,36 @@ KeptRun::KeptRun(const std::string& device, const CommonOptions& options, Consol
     writeSummary(nullptr);
     _calls.emplace(newFile("/calls.jsonl"), mostBytes, lastLineOfJournal);
     _log.emplace(newFile("/log"), mostBytes, "the log is cut off here because it has become too long");
+    _thread = startThread([this] { handOverNowAndThen(); });
   } catch (const std::exception& problem) {
     tell(problem.what());
+  }
+}
+
+KeptRun::~KeptRun() {
+  {
+    platform::Mutex::Lock lock(_mutex);
+    _over = true;
+    _changed.notifyAll();
+  }
+  if (_thread.joinable()) _thread.join();
+}
+
+void KeptRun::handOver() noexcept {
+  if (_calls) _calls->handOver();
+  if (_log) _log->handOver();
+}
+
+void KeptRun::handOverNowAndThen() {
+  sigset_t signals;
+  ::sigfillset(&signals);
+  ::pthread_sigmask(SIG_BLOCK, &signals, nullptr);  // they are for whoever stops the command
+  platform::Mutex::Lock lock(_mutex);
+  while (!_over) {
+    _changed.waitFor(_mutex, handOverTime);
+    lock.unlock();
+    handOver();
+    lock.lock();
   }
 }
 
@@ -109,6 +143,7 @@ void KeptRun::end(ExitCode code, const std::string& message) {
   } catch (const std::exception& problem) {
     tell(problem.what());
   }
+  handOver();
   if ((_calls && _calls->failed()) || (_log && _log->failed()))
     tell(_device + _folder + ": not every line could be written");
 }

@@ -5,9 +5,13 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "device/LocalDevice.h"
+#include "platform/Condition.h"
+#include "platform/Mutex.h"
+#include "platform/ThreadSafety.h"
 #include "tsd/CommonOptions.h"
 #include "tsd/ExitCode.h"
 #include "tsd/history/Outcome.h"
@@ -17,9 +21,9 @@
 namespace tsd {
 
 /// The run of a command as the device's folder keeps it, in `runs/NUMBER-COMMAND/`: the call journal with brief values,
-/// the system log, what became of each app, and what was run, when and with what result. Each line is handed to the
-/// system at once, so that the files show what a killed process did last. Nothing here makes a command fail: a
-/// problem is reported once.
+/// the system log, what became of each app, and what was run, when and with what result. Lines are handed to the system
+/// before the device's store or the name of a file changes, and ten times a second, so that the files show what a
+/// killed process did last. Nothing here makes a command fail: a problem is reported once.
 class KeptRun {
  public:
   static constexpr std::size_t most = 20;  // runs kept on a device; the oldest make room
@@ -30,10 +34,15 @@ class KeptRun {
 
   /// `device` is the device's folder, which this process has locked; `console` outlives the run.
   KeptRun(const std::string& device, const CommonOptions& options, Console& console);
+  ~KeptRun();
+  KeptRun(const KeptRun&) = delete;
+  KeptRun& operator=(const KeptRun&) = delete;
 
   /// Both are called under their caller's own lock.
   void hear(const device::CallRecord& record);
   void hear(const device::LogRecord& record);
+  /// Whatever was heard is with the system when it returns. From any thread.
+  void handOver() noexcept;
   /// Notes what became of the apps and, if the run failed as a whole, why; when a run does its work several times, the
   /// last time counts.
   void conclude(const std::vector<AppOutcome>& apps, const std::string& message);
@@ -43,6 +52,7 @@ class KeptRun {
 
  private:
   void makeFolder();
+  void handOverNowAndThen();
   std::unique_ptr<device::FileWriter> newFile(const char* name) const;
   void writeSummary(const ExitCode* code) const;
   /// Throws a `CommandError` that names the file, when the operation has failed.
@@ -61,6 +71,10 @@ class KeptRun {
   std::optional<RunLines> _calls;  // guarded by the journal's lock
   std::optional<RunLines> _log;    // guarded by the system log's lock
   std::string _line;               // of the journal, its memory kept; guarded by the journal's lock
+  platform::Mutex _mutex;
+  platform::Condition _changed;
+  bool _over GUARDED_BY(_mutex) = false;
+  std::thread _thread;
 };
 
 }  // namespace tsd
