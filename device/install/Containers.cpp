@@ -1,8 +1,9 @@
 #include "device/install/Containers.h"
 
+#include <unistd.h>
+
 #include <array>
 #include <cstdint>
-#include <random>
 
 #include "platform/DevicePaths.h"
 #include "plist/PropertyList.h"
@@ -14,16 +15,16 @@ namespace {
 constexpr std::uint64_t maximumIconBytes = std::uint64_t{16} << 20;
 constexpr std::string_view iconName = "Icon.png";
 
-/// Drawn anew for each container, so that no name is ever used twice. The source is slow: every bit of it is used.
-std::string drawName() {
-  std::random_device source;
+/// Drawn anew for each container, so that no name is ever used twice. Nothing when the system has no random numbers.
+std::optional<std::string> drawName() {
+  std::array<unsigned char, 16> drawn{};
+  if (::getentropy(drawn.data(), drawn.size()) != 0) return std::nullopt;
   constexpr char digits[] = "0123456789ABCDEF";
   std::string name;
-  std::uint32_t drawn = 0;
-  for (int i = 0; i < 32; ++i) {
-    if (i % 8 == 0) drawn = source();
-    if (i == 8 || i == 12 || i == 16 || i == 20) name += '-';
-    name += digits[drawn >> i % 8 * 4 & 15];
+  for (std::size_t i = 0; i < drawn.size(); ++i) {
+    if (i == 4 || i == 6 || i == 8 || i == 10) name += '-';
+    name += digits[drawn[i] >> 4];
+    name += digits[drawn[i] & 15];
   }
   return name;
 }
@@ -61,7 +62,9 @@ class FilesSum {
 
 std::optional<std::string> Containers::makeFresh(platform::ErrorRef* error) {
   for (int attempt = 0; attempt < 4; ++attempt) {
-    std::string container = std::string(containersDirectory) + '/' + drawName();
+    const auto name = drawName();
+    if (!name) break;
+    std::string container = std::string(containersDirectory) + '/' + *name;
     if (_files.fileExists(container)) continue;
     if (!_files.createDirectory(container, true, {}, error)) return std::nullopt;
     return container;
