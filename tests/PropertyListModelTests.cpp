@@ -216,6 +216,8 @@ TEST(PropertyListValue, FindsAndRemovesAmongManyKeys) {
     Value expected = removed ? Value() : key < 2000 ? Value(-key) : Value(key);
     ASSERT_EQ(dictionary[std::to_string(key)], expected) << key;
   }
+  dictionary.set("1994", Value());
+  EXPECT_FALSE(dictionary.contains("1994"));
   EXPECT_EQ(dictionary.begin()->key, "1000");
   EXPECT_EQ((dictionary.end() - 1)->key, "1995");
 }
@@ -234,7 +236,8 @@ TEST(PropertyListValue, ConvertsNothing) {
                                          {0.0, false, "0"},
                                          {std::numeric_limits<double>::quiet_NaN(), true, "nan"},
                                          {Value::makeData("ab"), false, "<2 bytes>"},
-                                         {Date{1.5}, false, "2001-01-01T00:00:01Z"}}) {
+                                         {Date{1.5}, false, "2001-01-01T00:00:01Z"},
+                                         {Date{1e20}, false, "1e+20 s from 2001-01-01T00:00:00Z"}}) {
     EXPECT_EQ(row.value.boolValue(), row.flag) << row.text;
     EXPECT_EQ(platform::describe(row.value), row.text);
   }

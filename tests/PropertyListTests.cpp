@@ -128,7 +128,7 @@ TEST(PropertyList, RefusesXML) {
       {xml("<true>x</true>")},
       {xml("<string><true/></string>")},
       {xml("<dict><true/></dict>"), malformed, "without a key"},
-      {xml("<dict><key>lost</key></dict>"), malformed, "\"lost\" without a value"},
+      {xml("<dict><key>lost key</key></dict>"), malformed, "the key \"lost key\" without a value"},
       {xml("<dict><key>a</key><key>b</key><true/></dict>")},
       {xml("<dict><key>\n</key><true/>\n<key>\n</key><true/></dict>"), duplicateKey, "\"?\""},
       {xml("<integer/>"), malformed, "integer"},
@@ -217,6 +217,8 @@ TEST(PropertyList, RefusesBinary) {
       {binary({"\x14" + bigEndian(1, 8) + bigEndian(0, 8)}), outOfRange},
       {binary({"\x14" + bigEndian(~0ull, 8) + bigEndian(0, 8)}), outOfRange},
       {binary({"\x21\0\0"s})},
+      {binary({"\x23\0\0"s}), malformed, "real runs past"},
+      {binary({"\x33\0\0"s}), malformed, "date runs past"},
       {binary({date(NAN)}), outOfRange},
       {binary({date(infinity)}), outOfRange},
       {binary({date(-63113904001)}), outOfRange},
@@ -229,6 +231,7 @@ TEST(PropertyList, RefusesBinary) {
       {binary({"\x61\xdc\0"s})},
       {binary({"\x5f"}), malformed, "without a count"},
       {binary({"\x5f\x14" + std::string(16, '\0')})},
+      {binary({"\x5f\x13\0"s}), malformed, "string runs past"},
       {binary({"\xaf\x13" + bigEndian(~0ull, 8)}), malformed, "array runs past"},
       {binary({"\xdf\x13" + bigEndian(1ull << 63, 8)}), malformed, "dictionary runs past"},
       {binary({"\xa1\0"s}), malformed, "contains itself"},
@@ -254,9 +257,11 @@ TEST(PropertyList, RefusesBinary) {
                                                          "a container that contains itself",
                                                          "a date cannot have this size",
                                                          "a date outside the years 1 to 9999",
+                                                         "a date runs past the objects",
                                                          "a dictionary key that is not a string",
                                                          "a dictionary runs past the objects",
                                                          "a real cannot have this size",
+                                                         "a real runs past the objects",
                                                          "a reference to object 0 of 0",
                                                          "a reference to object 1 of 1",
                                                          "a reference to object 5 of 1",
@@ -295,7 +300,9 @@ Bytes nestedBinary(int depth) {
 }
 
 TEST(PropertyList, LimitsDepth) {
-  expectRejected({{nestedXML(513), ErrorCode::tooDeep, "512"}, {nestedBinary(513), ErrorCode::tooDeep, "512"}});
+  for (const Bytes& tooDeep : {nestedXML(513), nestedBinary(513)}) {
+    expectRejected({{tooDeep, ErrorCode::tooDeep, "containers more than 512 deep"}});
+  }
   expectRejected({{nestedXML(100000), ErrorCode::tooDeep}, {nestedBinary(60000), ErrorCode::tooDeep}});
   Value deepest = read(nestedXML(512));
   EXPECT_EQ(deepest, read(nestedBinary(512)));
@@ -435,6 +442,13 @@ TEST(PropertyList, WritesCompactly) {
   EXPECT_EQ(writeXML(list.array()->begin()[0]),
             "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n<dict>\n\t<key>key</key>\n"
             "\t<string>key</string>\n</dict>\n</plist>\n");
+  Value nested = Value::makeArray();
+  nested.array()->append(list.array()->begin()[0]);
+  Value whole = Value::makeDictionary();
+  whole.dictionary()->set("list", nested);
+  EXPECT_NE(writeXML(whole)->find("\t<array>\n\t\t<dict>\n\t\t\t<key>key</key>\n\t\t\t<string>key</string>\n"
+                                  "\t\t</dict>\n\t</array>\n</dict>\n"),
+            Bytes::npos);
   // One string, three dictionaries, the array; one byte for each reference and offset.
   Bytes bytes = writeBinary(list).value();
   EXPECT_EQ(bytes.size(), 8 + 4 + 3 * 3 + 4 + 5 + 32u);
