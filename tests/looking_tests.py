@@ -33,6 +33,9 @@ class Stuck:
         for line in self.calls:
             if until in line:
                 break
+        # What the device keeps of the run is handed over a moment later.
+        while not any(until in kept.read_text() for kept in pathlib.Path(arguments[0]).glob("runs/*/calls.jsonl")):
+            assert self.process.poll() is None
         os.kill(self.process.pid, signal.SIGSTOP)
         # The signal is sent by then; its threads stand still only when this returns.
         os.waitid(os.P_PID, self.process.pid, os.WSTOPPED)

@@ -105,9 +105,8 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
     };
   }
   if (kept) {
-    options.journals.push_back(
-        {[kept](const device::CallRecord& record) { kept->hear(record); }, device::JournalDetail::brief,
-         [kept] { kept->handOver(); }});
+    options.journals.push_back({[kept](const device::CallRecord& record) { kept->hear(record); },
+                                device::JournalDetail::brief, [kept] { kept->handOver(); }});
   }
   if (_calls) {
     options.journals.push_back(
