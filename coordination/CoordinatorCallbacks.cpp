@@ -65,11 +65,11 @@ void AppsClient::coordinatorCanceledWithReason(const CoordinatorRef& coordinator
   if (!bundleIdentifier) return;
   bool alreadyCancelled = false;
   contained(_platform, "coordinatorCanceledWithReason", [&] {
-    SerialQueue::Block block(_accessQueue);
+    SerialQueue::Block block(_accessQueue, _platform.clock);
     alreadyCancelled = !_userCancelledApps.insert(*bundleIdentifier);
   });
   {
-    SerialQueue::Block block(_restoreQueue);
+    SerialQueue::Block block(_restoreQueue, _platform.clock);
     if (_stopAwaitingPlaceholder(*bundleIdentifier)) {
       say(_platform, "RC cancelled coordinator for restoring app bundle %{public}@ _restoringPlaceholderCount %lld",
           *bundleIdentifier, _restoringPlaceholderCount.load());

@@ -30,7 +30,7 @@ std::shared_ptr<AppsClient> AppsClient::init(const Platform& platform) try {
       platform.systemLog.createHandle("com.vantor.appinstallation", "tsd.appsync"));
   if (!isDaemonProcess(platform)) return client;
   {
-    SerialQueue::Block block(client->_restoreQueue);
+    SerialQueue::Block block(client->_restoreQueue, platform.clock);
     client->_finishedWaitingForPlaceHolderInstalls = true;
   }
   platform.notifications.KBNotificationCenterAddObserver(

@@ -29,7 +29,7 @@ static Dictionary* firstEntry(Array& todoList, std::optional<std::string_view> i
 }
 
 void AppsClient::changeAssetID(std::optional<std::string_view> identifier, std::string_view toDo) {
-  SerialQueue::Block block(_listFilesQueue);
+  SerialQueue::Block block(_listFilesQueue, _platform.clock);
   Value todoList = _loadPlist(_platform, todoListPath);
   if (!todoList.array()) return;
   Dictionary* entry = firstEntry(*todoList.array(), identifier);

@@ -15,7 +15,7 @@ namespace appsync {
 using namespace platform;
 
 AppsClient::StagingArea AppsClient::_takeStagingArea(ErrorRef* error) {
-  SerialQueue::Block block(_listFilesQueue);
+  SerialQueue::Block block(_listFilesQueue, _platform.clock);
   _platform.fileSystem.removeItem(workArea);
   if (!_platform.fileSystem.createDirectory(pluginDirectory, true, {}, error)) {
     say(_platform, "can't create work area");

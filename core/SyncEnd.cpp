@@ -27,7 +27,7 @@ void AppsClient::assetTransferEndedWithSuccess(bool success) try {
     Mutex::Lock lock(_transferStateGuard);
     _outstandingDuctoTransfers.clear();
   }
-  SerialQueue::Block block(_accessQueue);
+  SerialQueue::Block block(_accessQueue, _platform.clock);
   _updatingApps.clear();
   _userCancelledApps.clear();
 } catch (...) {
@@ -82,7 +82,7 @@ static void clearUninstalledApps(const Platform& platform) {
 void AppsClient::clearSyncData() try {
   say(_platform, "blasting work area");
   {
-    SerialQueue::Block block(_listFilesQueue);
+    SerialQueue::Block block(_listFilesQueue, _platform.clock);
     _platform.fileSystem.removeItem(pluginDirectory);
   }
   say(_platform, "Uninstalling all placeholder apps");

@@ -18,6 +18,9 @@ class Clock {
   /// Since an arbitrary origin; never goes back.
   using Instant = std::chrono::time_point<std::chrono::steady_clock, Duration>;
 
+  /// Waits for another thread that is at work, for as long as that takes: no time passes for it.
+  static constexpr Instant noDeadline = Instant::max();
+
   virtual ~Clock() = default;
 
   virtual Instant now() = 0;

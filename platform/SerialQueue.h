@@ -4,15 +4,17 @@
 #include <string>
 #include <thread>
 
+#include "platform/Clock.h"
+#include "platform/Condition.h"
 #include "platform/Mutex.h"
 #include "platform/ThreadSafety.h"
 
 namespace platform {
 
 /// A serial queue that is only ever used synchronously: one block at a time runs on it, on the caller's own
-/// thread, and the caller waits for its turn. A block is a scope:
+/// thread, and the caller waits for its turn on the device's clock, as for everything else. A block is a scope:
 ///
-///     SerialQueue::Block block(_accessQueue);
+///     SerialQueue::Block block(_accessQueue, _platform.clock);
 ///
 /// Entering a queue from a block that already runs on it would wait for itself for ever; it ends the process
 /// with a message that names the queue instead.
@@ -27,7 +29,7 @@ class CAPABILITY("queue") SerialQueue {
   /// The scope that runs on the queue. Keep it short: nothing in it may wait for another block of this queue.
   class SCOPED_CAPABILITY Block {
    public:
-    explicit Block(SerialQueue& queue) ACQUIRE(queue) : _queue(queue) { _queue.enter(); }
+    Block(SerialQueue& queue, Clock& clock) ACQUIRE(queue) : _queue(queue) { _queue.enter(clock); }
     ~Block() RELEASE() { _queue.leave(); }
     Block(const Block&) = delete;
     Block& operator=(const Block&) = delete;
@@ -37,11 +39,13 @@ class CAPABILITY("queue") SerialQueue {
   };
 
  private:
-  void enter() ACQUIRE();
+  void enter(Clock& clock) ACQUIRE();
   void leave() RELEASE();
 
   const std::string _label;
   Mutex _mutex;
+  Condition _left;
+  bool _busy GUARDED_BY(_mutex) = false;
   std::atomic<std::thread::id> _running;
 };
 

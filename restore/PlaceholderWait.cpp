@@ -17,7 +17,7 @@ bool AppsClient::_stopAwaitingPlaceholder(std::string_view bundleIdentifier) {
 }
 
 void AppsClient::shiftwellSetPlaceHolderPromiseForRestoreAppBundle(std::string_view bundleIdentifier) {
-  SerialQueue::Block block(_restoreQueue);
+  SerialQueue::Block block(_restoreQueue, _platform.clock);
   if (!_placeholdersForRestoringApps.insert(bundleIdentifier)) return;
   _restorePlaceHoldersWaitGroup.enter();
   ++_restoringPlaceholderCount;
@@ -26,14 +26,14 @@ void AppsClient::shiftwellSetPlaceHolderPromiseForRestoreAppBundle(std::string_v
 }
 
 void AppsClient::shiftwellCancelledCoordinatorForRestoreAppBundle(std::string_view bundleIdentifier) {
-  SerialQueue::Block block(_restoreQueue);
+  SerialQueue::Block block(_restoreQueue, _platform.clock);
   if (!_stopAwaitingPlaceholder(bundleIdentifier)) return;
   say(_platform, "Shiftwell cancelled coordinator for restoring app bundle %{public}@ _restoringPlaceholderCount %lld",
       bundleIdentifier, _restoringPlaceholderCount.load());
 }
 
 void AppsClient::rcDidInstallPlaceHolderForAppBundle(std::optional<std::string_view> bundleIdentifier) {
-  SerialQueue::Block block(_restoreQueue);
+  SerialQueue::Block block(_restoreQueue, _platform.clock);
   if (_finishedWaitingForPlaceHolderInstalls) return;
   if (bundleIdentifier && _stopAwaitingPlaceholder(*bundleIdentifier)) {
     say(_platform, "RC finished installing placeholder for %{public}@, _restoringPlaceholderCount %lld",
@@ -52,7 +52,7 @@ void AppsClient::_waitForPlaceholderInstalls() {
     // Outside the queue, on which the reports run that it waits for.
     _restorePlaceHoldersWaitGroup.wait(_platform.clock, deadline);
   });
-  SerialQueue::Block block(_restoreQueue);
+  SerialQueue::Block block(_restoreQueue, _platform.clock);
   say(_platform, "Finished waiting for placeholder installs");
   _finishedWaitingForPlaceHolderInstalls = true;
 }

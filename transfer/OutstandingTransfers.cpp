@@ -243,12 +243,12 @@ void AppsClient::OutstandingTransfers::giveUp(const std::string& identifier) {
 }
 
 bool AppsClient::_addUpdatingApp(std::string_view identifier) {
-  SerialQueue::Block block(_accessQueue);
+  SerialQueue::Block block(_accessQueue, _platform.clock);
   return _updatingApps.insert(identifier);
 }
 
 bool AppsClient::_removeUpdatingApp(std::string_view identifier) {
-  SerialQueue::Block block(_accessQueue);
+  SerialQueue::Block block(_accessQueue, _platform.clock);
   return _updatingApps.erase(identifier);
 }
 

@@ -18,7 +18,7 @@ Value AppsClient::_restoreStatePropertyForKey(std::string_view key, std::string_
 }
 
 void AppsClient::cleanRestoreStateForIdentifier(std::optional<std::string_view> identifier) {
-  SerialQueue::Block block(_listFilesQueue);
+  SerialQueue::Block block(_listFilesQueue, _platform.clock);
   auto bytes = _platform.fileSystem.readFile(restoreStatePath);
   if (!bytes) return;
   ErrorRef error;

@@ -16,7 +16,7 @@ void AppsClient::assetTransferUpdatedProgress(const TSAssetRef& asset, double pr
   say(_platform, "finished transferring %lf for %{public}@", progress, identifier);
   bool existingApp = false;
   {
-    SerialQueue::Block block(_accessQueue);
+    SerialQueue::Block block(_accessQueue, _platform.clock);
     existingApp = _updatingApps.contains(identifier);
   }
   updateTransferProgressForApp(asset, existingApp);
@@ -31,7 +31,7 @@ void AppsClient::assetTransferSucceeded(const TSAssetRef& asset, bool succeeded,
   bool existingApp = false;
   bool userCancelled = false;
   {
-    SerialQueue::Block block(_accessQueue);
+    SerialQueue::Block block(_accessQueue, _platform.clock);
     existingApp = _updatingApps.erase(identifier);
     userCancelled = _userCancelledApps.erase(identifier);
   }

@@ -116,9 +116,13 @@ class HandDrivenQueue final : public ManualEventQueue {
       return _queue._now;
     }
 
-    bool waitUntil(platform::Mutex& mutex, platform::Condition&, Instant deadline,
+    bool waitUntil(platform::Mutex& mutex, platform::Condition& changed, Instant deadline,
                    const std::function<bool()>& satisfied) override REQUIRES(mutex) {
       release();
+      if (deadline == noDeadline) {
+        changed.wait(mutex, satisfied);
+        return true;
+      }
       Waiting waiting(_queue);
       while (!satisfied()) {
         if (now() >= deadline) return false;

@@ -14,6 +14,7 @@ void CountdownClock::runAheadTo(Instant instant) {
 
 bool CountdownClock::waitUntil(platform::Mutex& mutex, platform::Condition& changed, Instant deadline,
                                const std::function<bool()>& satisfied) {
+  if (deadline == noDeadline) return _clock.waitUntil(mutex, changed, deadline, satisfied);
   // A stop request cannot wake a thread that waits for something else.
   constexpr auto lookInterval = std::chrono::milliseconds(100);
   long long told = 0;
