@@ -29,7 +29,7 @@ Keeps the apps of a phone in step with the list of a desktop host: the plug-in
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_NAME libapplicationsync-dev)
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_SECTION libdevel)
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_DEPENDS "${library_package} (= ${PROJECT_VERSION})")
-set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_RECOMMENDS "libexpat1-dev, libgtest-dev, pkg-config")
+set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_RECOMMENDS "libexpat1-dev, libzstd-dev, libgtest-dev, pkg-config")
 set(CPACK_COMPONENT_DEVELOPMENT_DESCRIPTION "application plug-in of a sync daemon - what hosts are built with
 The interfaces that a host of the plug-in implements, the value types, a
 property-list codec, a suite of tests of the interfaces' contracts, and a

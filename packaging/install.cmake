@@ -14,8 +14,11 @@ list(TRANSFORM private_headers APPEND "\\.h$")
 list(JOIN private_headers "|" private_headers)
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/platform DESTINATION ${header_folder} COMPONENT development
         FILES_MATCHING PATTERN *.h REGEX "/(${private_headers})" EXCLUDE)
+set(record_headers RecordingPlatform.h Replay.h Operation.h Show.h Sink.h)
 install(FILES ${CMAKE_SOURCE_DIR}/plist/PropertyList.h DESTINATION ${header_folder}/plist COMPONENT development)
-install(TARGETS platform plist EXPORT ApplicationSync ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT development)
+list(TRANSFORM record_headers PREPEND ${CMAKE_SOURCE_DIR}/record/)
+install(FILES ${record_headers} DESTINATION ${header_folder}/record COMPONENT development)
+install(TARGETS platform plist record EXPORT ApplicationSync ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT development)
 install(EXPORT ApplicationSync NAMESPACE ApplicationSync:: FILE ApplicationSyncTargets.cmake
         DESTINATION ${config_folder} COMPONENT development)
 

@@ -17,6 +17,7 @@ ALLOWED = {
     "restore": PLUGIN + ["restore/"],
     "placeholder": PLUGIN + ["placeholder/"],
     "plist": ["platform/", "plist/"],
+    "record": ["platform/", "plist/", "record/"],
     "contract": ["platform/", "contract/"],
 }
 # The rooms of a folder, each of which may also include the rooms before it; the folder's own files come last, but for
@@ -29,7 +30,7 @@ ROOMS = {
                   "services", "screen"],
     },
     "tsd": {
-        "may": ["platform/", "plist/", "device/"],
+        "may": ["platform/", "plist/", "device/", "record/"],
         "headers": ["CommandError.h", "CommonOptions.h", "ExitCode.h", "OptionTable.h", "StartThread.h"],
         "rooms": ["terminal", "conduit", "host", "picture", "sample", "help", "history", "report", "stopping",
                   "daemon", "sync", "command"],
@@ -43,12 +44,13 @@ for _folder, _house in ROOMS.items():
     ALLOWED[_folder] = _seen + [f"{_folder}/"]
 # What is built for testing may include everything of the product, but not one another's; and of the plug-in nothing,
 # which is loaded. Benchmarks measure what it is made of.
-AROUND = ["platform/", "plist/", "device/", "tsd/", "contract/", "tests/"]
+AROUND = ["platform/", "plist/", "device/", "record/", "tsd/", "contract/", "tests/"]
 ALLOWED |= {"tests": AROUND, "fuzz": AROUND + ["fuzz/"], "bench": AROUND + ["core/", "bench/"]}
 # Folders that may use the operating system's own headers; the others use the standard library alone.
-SYSTEM = ["device", "tsd", "tests", "fuzz", "bench"]
+SYSTEM = ["device", "record", "tsd", "tests", "fuzz", "bench"]
 # Library header: the folders that may include it.
 LIBRARIES = {
+    r"zstd\.h": ["record", "tests"],
     r"expat\.h": ["plist", "bench"],
     r"sqlite3\.h": ["device", "tests"],
     r"archive(_entry)?\.h": ["device", "tsd", "tests"],

@@ -47,7 +47,7 @@ def check_headers(prefix):
     included = {name for path in include.rglob("*.h") for name in re.findall(r'#include "(.+)"', path.read_text())}
     for problem in [f"{name} is included but not installed" for name in included - headers]:
         sys.exit(problem)
-    if "platform/Plugin.h" not in headers or any(not re.match("platform/|plist/PropertyList.h", name) for name in headers):
+    if "platform/Plugin.h" not in headers or any(not re.match("platform/|record/|plist/PropertyList.h", name) for name in headers):
         sys.exit(f"not the headers that a host needs: {sorted(headers)}")
 
 

@@ -11,7 +11,7 @@ import tempfile
 import unittest
 
 TSD = None
-DONE, FAILED, USAGE, SOME_FAILED, CANCELLED, DEADLINE, BUSY = range(7)
+DONE, FAILED, USAGE, SOME_FAILED, CANCELLED, DEADLINE, BUSY, DIFFERS = range(8)
 
 ONE_LINE = r"\Atsd: [^\n]*{}[^\n]*\n\Z"
 

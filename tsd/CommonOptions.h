@@ -20,6 +20,7 @@ struct CommonOptions {
   std::string log;     // file for the system log; empty: none
   std::string calls;   // file for the call journal; empty: none
   std::string trace;   // file for the timeline; empty: none
+  std::string record;  // file for the recording; empty: none
   std::string plugin;  // file of the plug-in; empty: the file beside the program
   std::vector<device::InjectionRule> rules;
 };

@@ -11,6 +11,7 @@ enum class ExitCode : int {
   cancelled = 4,   // by a signal
   deadline = 5,    // a deadline passed before everything awaited had happened
   busy = 6,        // another process holds the device
+  differs = 7,     // a replay differs from its recording
 };
 
 }  // namespace tsd

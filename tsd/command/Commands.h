@@ -46,6 +46,19 @@ ExitCode runClear(const CommandContext& context, const DeviceOnlyOptions& option
 
 ExitCode runSync(const CommandContext& context, const SyncOptions& options);
 
+struct ReplayOptions {
+  std::string file;
+  bool goOn = false;
+  std::vector<std::string> ignored;  // "messages", "steps"
+};
+ExitCode runReplay(const CommandContext& context, const ReplayOptions& options);
+
+struct RecordingOptions {
+  std::string action;  // "show"
+  std::string file;
+};
+ExitCode runRecording(const CommandContext& context, const RecordingOptions& options);
+
 struct PlanOptions {
   std::string device;
   std::string host;
@@ -99,6 +112,7 @@ struct SetOptions {
   std::string device;
   std::vector<std::string> settings;  // KEY=VALUE; none: the settings are only shown
 };
+std::vector<std::string> settingWords();
 ExitCode runSet(const CommandContext& context, const SetOptions& options);
 
 struct UninstallOptions {

@@ -1,7 +1,9 @@
 #include "tsd/command/LastWords.h"
 
+#include <malloc.h>
 #include <unistd.h>
 
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
@@ -46,5 +48,22 @@ void sayWithoutMemory(const char* text) {
 }
 
 void endWithMessageWithoutMemory() { usualEnd = std::set_terminate(end); }
+
+/// One heap for all threads, and large blocks by themselves: what one thread has given back the next one takes, so that
+/// a list costs what it holds and not what it ever held.
+static void shareOneHeap() {
+#ifdef M_ARENA_MAX
+  ::mallopt(M_ARENA_MAX, 1);
+  ::mallopt(M_MMAP_THRESHOLD, 1 << 20);
+#endif
+}
+
+void prepareProcess() {
+  // A reader that goes away must not end a sync in the middle, nor a file that may not grow: that is a full disk.
+  std::signal(SIGPIPE, SIG_IGN);
+  std::signal(SIGXFSZ, SIG_IGN);
+  endWithMessageWithoutMemory();
+  shareOneHeap();
+}
 
 }  // namespace tsd

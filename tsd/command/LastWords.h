@@ -10,4 +10,7 @@ void sayWithoutMemory(const char* text);
 /// leaves that is killed. Every other such exception ends it as before, by a signal.
 void endWithMessageWithoutMemory();
 
+/// What a process of this program has to be before it does anything: see there.
+void prepareProcess();
+
 }  // namespace tsd

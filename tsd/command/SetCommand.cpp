@@ -83,4 +83,20 @@ ExitCode runSet(const CommandContext& context, const SetOptions& options) {
   return show(context, session.device(), keys, false);
 }
 
+std::vector<std::string> settingWords() {
+  return {"app-installation=allowed",
+          "app-installation=forbidden",
+          "app-removal=allowed",
+          "app-removal=forbidden",
+          "icon-size=",
+          "backup-placeholders=yes",
+          "backup-placeholders=no",
+          "backup-error=yes",
+          "backup-error=no",
+          "device-service-prioritize=yes",
+          "device-service-prioritize=no",
+          "device-service-cancel=yes",
+          "device-service-cancel=no"};
+}
+
 }  // namespace tsd

@@ -1,9 +1,6 @@
-#include <malloc.h>
-
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <charconv>
-#include <csignal>
 #include <cstdint>
 #include <cstdio>
 #include <exception>
@@ -185,16 +182,26 @@ void addPack(CLI::App& program, Invocation& invocation) {
 }
 
 template <class Options>
-void addDeviceCommand(CLI::App& program, Invocation& invocation, const char* name, const char* description,
-                      ExitCode (*run)(const CommandContext&, const Options&)) {
+CLI::App* addDeviceCommand(CLI::App& program, Invocation& invocation, const char* name, const char* description,
+                           ExitCode (*run)(const CommandContext&, const Options&)) {
   auto options = std::make_shared<Options>();
-  addDevice(addCommand(program, invocation, name, description, run, options), options->device);
+  auto* command = addCommand(program, invocation, name, description, run, options);
+  addDevice(command, options->device);
+  return command;
 }
 
 void addTrace(CLI::App* command, Invocation& invocation) {
   command
       ->add_option("--trace", invocation.common.trace,
                    wrapped("Write a timeline to this file, in the trace event format that timeline viewers open"))
+      ->option_text("FILE");
+}
+
+/// Of commands that drive the plug-in.
+void addRecord(CLI::App* command, Invocation& invocation) {
+  command
+      ->add_option("--record", invocation.common.record,
+                   wrapped("Record what the plug-in is told and does into this file, for 'tsd replay'"))
       ->option_text("FILE");
 }
 
@@ -213,9 +220,7 @@ void addSync(CLI::App& program, Invocation& invocation) {
           "false), completedAssetParts (a number), path (relative, absolute, none, recorded or a text), or "
           "just stall: progress without an end (repeatable)"));
   asset->option_text("ASSET")->expected(1)->take_all();
-  invocation.words[asset] = {
-      "isDownload=true", "isDownload=false", "isRestore=true", "isRestore=false", "completedAssetParts=",
-      "path=relative",   "path=absolute",    "path=none",      "path=recorded",   "stall"};
+  invocation.words[asset] = assetReportWords();
   auto* endPhase = command->add_option_function<std::string>(
       "--end-phase", [options](const std::string& text) { options->endPhase = text == "success"; },
       wrapped("How the transfer phase is reported to have ended, whatever happened"));
@@ -225,6 +230,7 @@ void addSync(CLI::App& program, Invocation& invocation) {
   addNumber<std::size_t>(command, "--repeat", options->repeat, "Syncs in a row, with one plug-in object (1)", 1,
                          1000000);
   addTrace(command, invocation);
+  addRecord(command, invocation);
   addNumber<std::size_t>(command, "--transfers", options->transfers, "Packages sent at the same time (2)", 1, 256);
 }
 
@@ -244,6 +250,7 @@ void addRestore(CLI::App& program, Invocation& invocation) {
   addHost(command, options->host);
   addNumber(command, "--type", options->type, "Type of the restore, 0 to 3; 2 and 3 bring apps back (2)", 0, 3);
   addTrace(command, invocation);
+  addRecord(command, invocation);
   command->add_flag("--in-daemon", options->inDaemon,
                     wrapped("Run in the daemon's own process, not the migration component's"));
 }
@@ -291,6 +298,31 @@ void addQuery(CLI::App& program, Invocation& invocation) {
   takeOneOf(invocation, question, {"metrics", "accounts", "vantor-ids", "disabled-asset-types"})
       ->required()
       ->option_text(" ");
+  addRecord(command, invocation);
+}
+
+void addRecordingFile(CLI::App* command, std::string& file) {
+  command->add_option("FILE", file, "The recording")->required()->check(checkFile)->option_text(" ");
+}
+
+void addReplay(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<ReplayOptions>();
+  auto* command = addCommand(program, invocation, "replay", "Tell a recording to the plug-in, and compare what it does",
+                             runReplay, options);
+  addRecordingFile(command, options->file);
+  command->add_flag("--go-on", options->goOn, wrapped("Go on behind a difference, and list all of them"));
+  auto* ignore = command->add_option("--ignore", options->ignored,
+                                     wrapped("What is not compared: messages, or steps of the transaction log "
+                                             "(repeatable)"));
+  takeOneOf(invocation, ignore, {"messages", "steps"})->option_text("WHAT")->expected(1)->take_all();
+}
+
+void addRecording(CLI::App& program, Invocation& invocation) {
+  auto options = std::make_shared<RecordingOptions>();
+  auto* command = addCommand(program, invocation, "recording", "Look into a recording", runRecording, options);
+  auto* action = command->add_option("ACTION", options->action, wrapped("show: every call, as a line"));
+  takeOneOf(invocation, action, {"show"})->required()->option_text(" ");
+  addRecordingFile(command, options->file);
 }
 
 void addSet(CLI::App& program, Invocation& invocation) {
@@ -304,19 +336,7 @@ void addSet(CLI::App& program, Invocation& invocation) {
                                "backup-placeholders, device-service-prioritize, device-service-cancel = yes or no; "
                                "backup-error = no or yes. Without any the settings are shown"))
           ->option_text("...");
-  invocation.words[settings] = {"app-installation=allowed",
-                                "app-installation=forbidden",
-                                "app-removal=allowed",
-                                "app-removal=forbidden",
-                                "icon-size=",
-                                "backup-placeholders=yes",
-                                "backup-placeholders=no",
-                                "backup-error=yes",
-                                "backup-error=no",
-                                "device-service-prioritize=yes",
-                                "device-service-prioritize=no",
-                                "device-service-cancel=yes",
-                                "device-service-cancel=no"};
+  invocation.words[settings] = settingWords();
 }
 
 void addUninstall(CLI::App& program, Invocation& invocation) {
@@ -363,12 +383,6 @@ void addStore(CLI::App& program, Invocation& invocation) {
   command->add_flag("--system-bundle", install.systemBundle, "Registered as a system bundle");
   command->add_flag_callback(
       "--no-coordinator", [&install] { install.createsCoordinator = false; }, "Without a coordinator");
-}
-
-/// The wrapped text on one line again.
-std::string unwrapped(std::string text) {
-  std::replace(text.begin(), text.end(), '\n', ' ');
-  return text;
 }
 
 OptionEntry entryOf(const CLI::Option& option, const Invocation& invocation) {
@@ -438,12 +452,17 @@ void addManual(CLI::App& program, Invocation& invocation) {
       ->option_text(" ");
 }
 
+std::vector<std::string> namesOfCommands(const CLI::App& program) {
+  std::vector<std::string> names;
+  for (const auto* each : program.get_subcommands({})) names.push_back(each->get_name());
+  return names;
+}
+
 void addHelp(CLI::App& program, Invocation& invocation) {
   auto name = std::make_shared<std::string>();
   auto* command = program.add_subcommand("help", "Tell what the program or a subcommand does");
-  std::vector<std::string> names;
-  for (const auto* each : program.get_subcommands({})) names.push_back(each->get_name());
-  takeOneOf(invocation, command->add_option("COMMAND", *name, "A subcommand"), names)->option_text(" ");
+  takeOneOf(invocation, command->add_option("COMMAND", *name, "A subcommand"), namesOfCommands(program))
+      ->option_text(" ");
   command->callback([&program, &invocation, name] {
     invocation.common.command = "help";
     invocation.run = [&program, name](const CommandContext&) {
@@ -478,8 +497,13 @@ void addCommands(CLI::App& program, Invocation& invocation) {
   addWatch(program, invocation);
   addReport(program, invocation);
   addQuery(program, invocation);
-  addDeviceCommand(program, invocation, "backup", "Make the apps' store metadata ready for a backup", runBackup);
-  addDeviceCommand(program, invocation, "clear", "Forget all sync data and placeholders", runClear);
+  for (auto* command :
+       {addDeviceCommand(program, invocation, "backup", "Make the apps' store metadata ready for a backup", runBackup),
+        addDeviceCommand(program, invocation, "clear", "Forget all sync data and placeholders", runClear)}) {
+    addRecord(command, invocation);
+  }
+  addReplay(program, invocation);
+  addRecording(program, invocation);
   addSet(program, invocation);
   addUninstall(program, invocation);
   addStore(program, invocation);
@@ -517,17 +541,12 @@ ExitCode carryOut(Invocation& invocation, Console& console) {
 /// The subcommand's name when the first argument is one.
 std::string commandNamed(CLI::App& program, int count, char** arguments) {
   if (count < 2) return {};
-  for (const auto* command : program.get_subcommands({})) {
-    if (command->get_name() == arguments[1]) return arguments[1];
-  }
-  return {};
+  const auto names = namesOfCommands(program);
+  return std::find(names.begin(), names.end(), arguments[1]) == names.end() ? std::string() : arguments[1];
 }
 
 bool asksForJson(int count, char** arguments) {
-  for (int i = 1; i < count; ++i) {
-    if (std::string(arguments[i]) == "--json") return true;
-  }
-  return false;
+  return std::find(arguments, arguments + count, std::string("--json")) != arguments + count;
 }
 
 ExitCode run(int count, char** arguments) {
@@ -539,10 +558,8 @@ ExitCode run(int count, char** arguments) {
   std::string message;
   try {
     if (count > 1 && arguments[1][0] != '-' && command.empty()) {
-      std::vector<std::string> names;
-      for (const auto* each : program.get_subcommands({})) names.push_back(each->get_name());
       throw CommandError(ExitCode::usage, "there is no subcommand '" + std::string(arguments[1]) + "'" +
-                                              didYouMean(arguments[1], names));
+                                              didYouMean(arguments[1], namesOfCommands(program)));
     }
     invocation.common.arguments.assign(arguments + std::min(count, 2), arguments + count);
     program.parse(count, arguments);
@@ -562,24 +579,11 @@ ExitCode run(int count, char** arguments) {
   return ExitCode::usage;
 }
 
-/// One heap for all threads, and large blocks by themselves: what one thread has given back the next one takes, so that
-/// a list costs what it holds and not what it ever held.
-void shareOneHeap() {
-#ifdef M_ARENA_MAX
-  ::mallopt(M_ARENA_MAX, 1);
-  ::mallopt(M_MMAP_THRESHOLD, 1 << 20);
-#endif
-}
-
 }  // namespace
 }  // namespace tsd
 
 int main(int count, char** arguments) {
-  // A reader that goes away must not end a sync in the middle, nor a file that may not grow: that is a full disk.
-  std::signal(SIGPIPE, SIG_IGN);
-  std::signal(SIGXFSZ, SIG_IGN);
-  tsd::endWithMessageWithoutMemory();
-  tsd::shareOneHeap();
+  tsd::prepareProcess();
   try {
     return static_cast<int>(tsd::run(count, arguments));
   } catch (const std::bad_alloc&) {

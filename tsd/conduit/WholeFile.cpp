@@ -61,4 +61,13 @@ void writeWholeFile(const std::string& path, platform::BytesView content) {
   throw CommandError(path + ": " + std::strerror(problem));
 }
 
+platform::Bytes readWholeFile(const std::string& path) {
+  constexpr std::size_t largest = std::size_t{4} << 30;
+  platform::ErrorRef error;
+  auto file = HostFile::open("", path, &error);
+  auto bytes = file ? file->readRest(largest, &error) : std::nullopt;
+  if (!bytes) throw CommandError(path + ": " + (error ? error->description() : "cannot be read"));
+  return std::move(*bytes);
+}
+
 }  // namespace tsd

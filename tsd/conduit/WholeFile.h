@@ -10,4 +10,7 @@ namespace tsd {
 /// followed. Throws a `CommandError` that names the file, also when that name belongs to anything but a regular file.
 void writeWholeFile(const std::string& path, platform::BytesView content);
 
+/// The content of a file of the host. Throws a `CommandError` that names it.
+platform::Bytes readWholeFile(const std::string& path);
+
 }  // namespace tsd

@@ -73,4 +73,9 @@ void addAssetReport(AssetReports& reports, std::string_view text) {
   }
 }
 
+std::vector<std::string> assetReportWords() {
+  return {"isDownload=true", "isDownload=false", "isRestore=true", "isRestore=false", "completedAssetParts=",
+          "path=relative",   "path=absolute",    "path=none",      "path=recorded",   "stall"};
+}
+
 }  // namespace tsd

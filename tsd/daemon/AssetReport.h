@@ -5,6 +5,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace tsd {
 
@@ -31,5 +32,8 @@ using AssetReports = std::map<std::string, AssetReport, std::less<>>;
 
 /// Adds what one `APP:KEY=VALUE,…` says. Throws a usage `CommandError` that names what is not understood.
 void addAssetReport(AssetReports& reports, std::string_view text);
+
+/// What can stand behind an app's identifier there.
+std::vector<std::string> assetReportWords();
 
 }  // namespace tsd

@@ -18,6 +18,7 @@ DeviceSession::DeviceSession(const CommandContext& context, const Setup& setup) 
   if (!context.options.log.empty()) _log.emplace(context.options.log);
   if (!context.options.calls.empty()) _calls.emplace(context.options.calls);
   if (!context.options.trace.empty()) _trace.emplace(context.options.trace);
+  openRecording();
   platform::ErrorRef error;
   _device = setup.use == DeviceUse::copy
                 ? device::openDeviceCopy(setup.folder, device::makeManualEventQueue(), deviceOptions(setup), &error)
@@ -37,6 +38,9 @@ DeviceSession::~DeviceSession() {
     _context.console.message(_context.options.calls + ": not every line could be written");
   if (_trace && _trace->failed())
     _context.console.message(_context.options.trace + ": not every line could be written");
+  if (!_recording) return;
+  _recording->finish();
+  if (_recording->failed()) _context.console.message(_context.options.record + ": not everything could be recorded");
 }
 
 void DeviceSession::unloadPlugin() {
@@ -103,6 +107,9 @@ device::DeviceOptions DeviceSession::deviceOptions(const Setup& setup) {
       if (_log) _log->write(logLine(record));
       if (kept) kept->hear(record);
     };
+  } else if (_sink) {
+    // The plug-in makes its messages when somebody listens.
+    options.log = [](const device::LogRecord&) {};
   }
   if (kept) {
     options.journals.push_back({[kept](const device::CallRecord& record) { kept->hear(record); },
@@ -146,12 +153,26 @@ platform::TSClient& DeviceSession::loadPlugin(const StopSignal& stop, CountdownC
   return makeClient(*_platform);
 }
 
+/// What a run begins with may be long gone when it is recorded, so the file is made before anything is done.
+void DeviceSession::openRecording() {
+  const std::string& file = _context.options.record;
+  if (file.empty()) return;
+  platform::ErrorRef error;
+  _sink = record::makeFileSink(file, &error);
+  if (!_sink) throw CommandError(textOf(error));
+}
+
 platform::TSClient& DeviceSession::makeClient(const platform::Platform& platform) {
   if (!_loader) {
     const std::string& chosen = _context.options.plugin;
     _loader.emplace(chosen.empty() ? PluginLoader::defaultFile() : chosen);
   }
-  _client = _loader->create(platform);
+  if (!_sink) {
+    _client = _loader->create(platform);
+    return *_client;
+  }
+  _recording = record::recordingPlatform(platform, _sink, {.threadName = device::currentThreadName});
+  _client = _recording->makeClient([this](const platform::Platform& recorded) { return _loader->create(recorded); });
   return *_client;
 }
 

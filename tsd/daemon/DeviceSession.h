@@ -15,6 +15,7 @@
 #include "platform/Platform.h"
 #include "platform/TSClient.h"
 #include "platform/ThreadSafety.h"
+#include "record/RecordingPlatform.h"
 #include "tsd/daemon/CommandContext.h"
 #include "tsd/daemon/DeviceLock.h"
 #include "tsd/daemon/PluginLoader.h"
@@ -66,6 +67,7 @@ class DeviceSession {
 
  private:
   platform::TSClient& makeClient(const platform::Platform& platform);
+  void openRecording();
   device::DeviceOptions deviceOptions(const Setup& setup);
   /// A file operation of the plug-in has failed. One of a kind is told at once, and how many there were at the end;
   /// what costs an icon alone is only counted. From any thread.
@@ -78,6 +80,7 @@ class DeviceSession {
   std::optional<LineFile> _log;
   std::optional<LineFile> _calls;
   std::optional<TraceFile> _trace;
+  std::shared_ptr<record::Sink> _sink;  // of the recording, if there is one
   platform::Mutex _mutex;
   struct Failures {
     std::string first;
@@ -89,6 +92,7 @@ class DeviceSession {
   std::unique_ptr<device::LocalDevice> _device;
   std::optional<CountdownClock> _clock;
   std::optional<platform::Platform> _platform;  // the device's with that clock
+  std::unique_ptr<record::RecordingPlatform> _recording;
   std::shared_ptr<platform::TSClient> _client;
 };
 

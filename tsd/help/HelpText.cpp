@@ -16,6 +16,7 @@ const std::vector<ExitCodeEntry>& exitCodes() {
       {ExitCode::cancelled, "cancelled by a signal"},
       {ExitCode::deadline, "a deadline passed"},
       {ExitCode::busy, "the device is in use"},
+      {ExitCode::differs, "a replay differs"},
   };
   return codes;
 }
@@ -71,6 +72,11 @@ std::string wrapped(const std::string& text, std::size_t width) {
     start = end + 1;
   }
   return result;
+}
+
+std::string unwrapped(std::string text) {
+  std::replace(text.begin(), text.end(), '\n', ' ');
+  return text;
 }
 
 }  // namespace tsd

@@ -18,4 +18,7 @@ std::vector<PointEntry> pointEntries();
 /// Broken into lines for the right column of a help text on a terminal of 80 columns, or of another width.
 std::string wrapped(const std::string& text, std::size_t width = 50);
 
+/// The wrapped text on one line again.
+std::string unwrapped(std::string text);
+
 }  // namespace tsd

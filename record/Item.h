@@ -1,0 +1,169 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+#include "platform/Value.h"
+
+namespace record {
+
+/// What an argument or an answer of a call is written as: one item, which says itself what it is, so that a recording
+/// is read, shown and redacted without knowing the call. Numbers are in groups of seven bits, the lowest first.
+enum class Tag : std::uint8_t {
+  absent,
+  no,
+  yes,
+  number,      // from 0 on
+  negative,    // -1 - n
+  real,        // 8 bytes
+  text,        // length, bytes
+  data,        // length, bytes
+  date,        // 8 bytes, seconds
+  list,        // count, items
+  dictionary,  // count, then a text and an item each
+  error,       // domain, code, description, underlying: four items
+  object,      // kind, number, flags; facts follow if the flags say so
+  packed,      // length, an item in so many bytes: one that is large
+};
+
+/// What an object is. The numbers stand in recordings; new kinds come at the end.
+enum class ObjectKind : std::uint8_t {
+  client,
+  coordinator,
+  promise,
+  placeholder,
+  attributes,
+  metadata,
+  options,
+  observer,
+  registration,
+  account,
+  asset,
+  proxy,
+  log,
+  manager,
+  url,
+  bundle,
+  image,
+  destination,
+  callback,
+  buffer,
+};
+constexpr std::size_t objectKindCount = 20;
+const char* nameOf(ObjectKind kind);
+
+/// An object as an item: the same number for the same object throughout a recording.
+struct ObjectMention {
+  static constexpr std::uint8_t isNew = 1;     // seen for the first time
+  static constexpr std::uint8_t hasFacts = 2;  // what it is made of follows, as one item: of assets, proxies, buffers
+
+  ObjectKind kind;
+  std::uint64_t number;
+  std::uint8_t flags;
+};
+
+/// Items deeper than this are refused; no value of a document is nested so deeply.
+constexpr std::size_t deepestItem = 1100;
+/// From so many bytes on an item of many parts is packed.
+constexpr std::size_t packedFrom = 4096;
+
+/// Appends items to a buffer.
+class ItemWriter {
+ public:
+  const std::string& bytes() const { return _bytes; }
+  std::string take() { return std::move(_bytes); }
+  void clear() { _bytes.clear(); }
+
+  void absent() { tag(Tag::absent); }
+  void boolean(bool value) { tag(value ? Tag::yes : Tag::no); }
+  void number(std::uint64_t value) {
+    tag(Tag::number);
+    varint(value);
+  }
+  void signedNumber(std::int64_t value) {
+    if (value >= 0) return number(static_cast<std::uint64_t>(value));
+    tag(Tag::negative);
+    varint(static_cast<std::uint64_t>(-1 - value));
+  }
+  void real(double value);
+  void text(std::string_view text) { sized(Tag::text, text); }
+  void data(platform::BytesView bytes) { sized(Tag::data, bytes); }
+  void date(double seconds);
+  void list(std::size_t count) {
+    tag(Tag::list);
+    varint(count);
+  }
+  void dictionary(std::size_t count) {
+    tag(Tag::dictionary);
+    varint(count);
+  }
+  void error() { tag(Tag::error); }
+  void object(const ObjectMention& mention);
+  void packed(std::string_view item) { sized(Tag::packed, item); }
+  void value(const platform::Value& value);
+
+  /// Packs what was written from `begin` on, one item, if it has become large.
+  void packFrom(std::size_t begin);
+  /// Bytes that are items already.
+  void items(std::string_view bytes) { _bytes.append(bytes); }
+
+ private:
+  void tag(Tag tag) { _bytes.push_back(static_cast<char>(tag)); }
+  void varint(std::uint64_t value);
+  void sized(Tag as, std::string_view bytes) {
+    tag(as);
+    varint(bytes.size());
+    _bytes.append(bytes);
+  }
+  void fixed(double value);
+  void bareValue(const platform::Value& value);
+
+  std::string _bytes;
+};
+
+void appendVarint(std::string& bytes, std::uint64_t value);
+
+/// Reads items from bytes that outlive it. Whatever the bytes are, it reads nothing outside them and throws a
+/// `RecordingError` at what no item can be.
+class ItemReader {
+ public:
+  explicit ItemReader(std::string_view bytes) : _rest(bytes) {}
+
+  bool atEnd() const { return _rest.empty(); }
+  std::string_view rest() const { return _rest; }
+  Tag peek() const;
+
+  /// True, and past it, when an absent item comes.
+  bool takeAbsent();
+  bool boolean();
+  std::uint64_t number();
+  std::int64_t signedNumber();
+  double real();
+  std::string_view text();
+  platform::BytesView data();
+  double date();
+  std::size_t list();
+  std::size_t dictionary();
+  void error();
+  ObjectMention object();
+  platform::Value value();
+
+  /// Steps into a packed item, if one comes: `inside` then reads it and this goes on behind it. Otherwise this itself.
+  ItemReader& unpacked(ItemReader& inside);
+  std::string_view packedBytes();
+  /// Past one item; answers its bytes.
+  std::string_view skip(std::size_t depth = 0);
+  std::uint64_t varint();
+  std::string_view bytes(std::uint64_t count);
+  Tag tag();
+
+ private:
+  void expect(Tag wanted, const char* what);
+  double fixed();
+
+  std::string_view _rest;
+};
+
+}  // namespace record

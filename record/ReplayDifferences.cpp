@@ -1,0 +1,155 @@
+#include <algorithm>
+#include <utility>
+
+#include "record/CallText.h"
+#include "record/Replayer.h"
+
+/// How a call that is not the recorded one is taken.
+namespace record {
+
+namespace {
+/// How far ahead a call is looked for that comes too early.
+constexpr std::size_t farthestAhead = 2048;
+constexpr std::size_t mostDifferences = 1000;
+
+bool isCall(const Event& event) { return event.kind == EventKind::call; }
+}  // namespace
+
+const char* nameOf(Difference::Kind kind) {
+  switch (kind) {
+    case Difference::Kind::otherArguments:
+      return "other arguments";
+    case Difference::Kind::otherResult:
+      return "another result";
+    case Difference::Kind::missing:
+      return "a missing call";
+    case Difference::Kind::additional:
+      return "an additional call";
+    case Difference::Kind::standing:
+      return "a wait without an end";
+  }
+  return "";
+}
+
+/// True when the recording has an answer to the call, which is then the next to come for this thread.
+bool Replayer::match(Player& player, const Operation& operation, const std::string& arguments) {
+  const Event* next = head();
+  if (!next) {
+    passTurn();
+    return false;
+  }
+  if (isCall(*next) && isOf(*next, operation) && next->payload == arguments) {
+    pop();
+    return true;
+  }
+  const std::string came = callLine({operation.service, operation.name, operation.parameters}, arguments);
+  if (auto place = findAhead(player, &operation, arguments)) {
+    skipTo(player, *place, came);
+    if (isOver()) return false;
+    _ahead.erase(_ahead.begin() + static_cast<std::ptrdiff_t>(*findAhead(player, &operation, arguments)));
+    ++_result.events;
+    return true;
+  }
+  if (isCall(*next) && isOf(*next, operation)) {
+    differ(Difference::Kind::otherArguments, player, next, came);
+    if (isOver()) return false;
+    pop();
+    return true;
+  }
+  differ(Difference::Kind::additional, player, next, came).of = operation.of;
+  return false;
+}
+
+/// The place of that call of the thread in the rest of what it is inside of; without an operation, of its return.
+std::optional<std::size_t> Replayer::findAhead(const Player& player, const Operation* operation,
+                                               const std::string& arguments) {
+  int depth = 0;
+  for (std::size_t place = 0; place < farthestAhead; ++place) {
+    while (_ahead.size() <= place) {
+      Event event;
+      if (!_reader.next(event)) return std::nullopt;
+      if (!isIgnored(event)) _ahead.push_back(std::move(event));
+    }
+    const Event& event = _ahead[place];
+    if (event.thread != player.number) continue;
+    if (depth == 0 && event.kind == EventKind::leave) return operation ? std::nullopt : std::optional(place);
+    if (depth == 0 && operation && isCall(event) && isOf(event, *operation) && event.payload == arguments) return place;
+    depth += event.kind == EventKind::call || event.kind == EventKind::enter ? 1 : -1;
+  }
+  return std::nullopt;
+}
+
+/// The plug-in left out what the thread did before that place. What others did meanwhile stays.
+void Replayer::skipTo(const Player& player, std::size_t place, std::string_view came) {
+  int depth = 0;
+  for (std::size_t at = 0; at < place;) {
+    if (_ahead[at].thread != player.number) {
+      ++at;
+      continue;
+    }
+    const bool opens = isCall(_ahead[at]) || _ahead[at].kind == EventKind::enter;
+    if (depth == 0 && opens) {
+      differ(Difference::Kind::missing, player, &_ahead[at], std::string(came));
+      if (isOver()) return;
+    }
+    depth += opens ? 1 : -1;
+    _ahead.erase(_ahead.begin() + static_cast<std::ptrdiff_t>(at));
+    --place;
+  }
+}
+
+std::vector<std::string> Replayer::standing() const {
+  std::vector<std::string> lines;
+  for (const auto& player : _players) {
+    std::string line = player->number < _reader.threads().size() ? _reader.threads()[player->number] : "?";
+    if (player->inside.empty()) line += ": outside the plug-in";
+    const char* separator = ": in ";
+    for (const auto& operation : player->inside) {
+      line += separator + operation.service + "." + operation.name;
+      separator = ", in ";
+    }
+    lines.push_back(std::move(line));
+  }
+  return lines;
+}
+
+Difference& Replayer::differ(Difference::Kind kind, const Player& player, const Event* expected, std::string came) {
+  Difference difference;
+  difference.kind = kind;
+  difference.came = std::move(came);
+  difference.standing = standing();
+  difference.thread = player.number < _reader.threads().size() ? _reader.threads()[player.number] : "";
+  if (!player.inside.empty()) difference.inside = player.inside.back().service + "." + player.inside.back().name;
+  if (expected) {
+    const OperationName name = nameOfEvent(*expected);
+    difference.event = expected->number;
+    difference.of = expected->kind == EventKind::call ? classOf(name) : OperationClass::service;
+    const bool returns = expected->kind == EventKind::leave || expected->kind == EventKind::answer;
+    difference.expected = returns ? resultLine(name, expected->payload) : callLine(name, expected->payload);
+  }
+  _result.differences.push_back(std::move(difference));
+  if (!_options.goOn || _result.differences.size() == mostDifferences) {
+    _messenger = &player;
+    end();
+  }
+  return _result.differences.back();
+}
+
+/// The plug-in is listened to until the first message behind a difference: the one that it would have written.
+std::optional<std::string> Replayer::afterEnd(const Operation& operation, const std::string& arguments) {
+  const std::string_view name = operation.name;
+  if (std::string_view(operation.service) != "LogHandle") return std::nullopt;
+  ItemWriter answer;
+  if (name == "isEnabled") {
+    answer.boolean(true);
+    return answer.take();
+  }
+  ItemReader reader(arguments);
+  reader.object();
+  reader.number();
+  _result.differences.back().message = reader.text();
+  _messenger = nullptr;
+  return std::nullopt;
+}
+
+}  // namespace record

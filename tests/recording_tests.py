@@ -1,0 +1,101 @@
+#!/usr/bin/env python3
+"""What is recorded replays: whole, cut anywhere, with many threads; and what a plug-in does differently is told.
+
+usage: recording_tests.py TSD [unittest arguments]
+"""
+
+import pathlib
+import random
+import re
+
+import tsd_folder
+from tsd_folder import DIFFERS, DONE, FAILED, SOME_FAILED, Folder, says
+
+
+class Recordings(Folder):
+    def record(self, *arguments, code=DONE, name="recording"):
+        self.tsd(*arguments, "--record", name, "--progress", "none", code=code)
+        return name
+
+    def replayed(self, name="recording"):
+        """How many events were replayed, all of them as recorded."""
+        report = self.document("replay", name)
+        self.assertEqual((report["result"], report["differences"]), ("done", []))
+        return report
+
+    def test_every_command_that_drives_the_plug_in(self):
+        apps = self.make(6, "dev", "--demo")
+        lines = [["restore", "dev", "host"], ["sync", "dev", "host", "--transfers", "1"],
+                 ["sync", "dev", "host", "--repeat", "2"],
+                 *(["query", "dev", each] for each in ("metrics", "accounts", "vantor-ids", "disabled-asset-types")),
+                 ["backup", "dev"], ["clear", "dev"]]
+        for number, line in enumerate(lines):
+            with self.subTest(line):
+                name = f"recording-{number}"
+                # An app of the demonstration is damaged.
+                self.record(*line, code=SOME_FAILED if line[0] == "sync" else DONE, name=name)
+                report = self.replayed(name)
+                self.assertTrue(report["whole"])
+                self.assertGreater(report["events"], 10)
+        shown = self.document("recording", "show", "recording-1")
+        self.assertTrue(set(apps) & set(shown["apps"]))
+        self.assertRegex(self.tsd("recording", "show", "recording-1").stdout,
+                         r"(?m)^\d+ daemon < TSClient\.reconcileSync\(.*progressCallback callback#\d+, true\)$")
+
+    def test_sixteen_packages_in_flight_replay_every_time(self):
+        self.make(24)
+        name = self.record("sync", "dev", "host", "--transfers", "16")
+        events = {self.replayed(name)["events"] for _ in range(100)}
+        self.assertEqual(len(events), 1)
+        self.assertIn("transfer-16", self.tsd("recording", "show", name).stdout)
+
+    def test_cut_anywhere(self):
+        self.make(2)
+        whole = pathlib.Path(self.record("sync", "dev", "host")).read_bytes()
+        chance = random.Random(7)
+        places = {0, 1, 5, 8, 9, 10, 11, len(whole) - 1} | {chance.randrange(len(whole)) for _ in range(60)}
+        last = 0
+        for place in sorted(places):
+            pathlib.Path("cut").write_bytes(whole[:place])
+            report = self.replayed("cut")
+            self.assertGreaterEqual(report["events"], last)
+            last = report["events"]
+            # The last bytes only say that nothing follows.
+            self.assertEqual(report["whole"], place > len(whole) - 8 and report["whole"], place)
+        self.assertGreater(last, 100)
+
+    def test_what_is_no_recording(self):
+        self.make(1)
+        whole = bytearray(pathlib.Path(self.record("sync", "dev", "host")).read_bytes())
+        for name, content, words in (("text", b"hello, world", "this is no recording"),
+                                     ("later", bytes(whole[:8]) + b"\x63" + bytes(whole[9:]), "version 99"),
+                                     ("damaged", bytes(whole[:400]) + b"\xff" * 64 + bytes(whole[464:]), "event")):
+            pathlib.Path(name).write_bytes(content)
+            self.assertRegex(self.tsd("replay", name, code=FAILED).stderr, says(name))
+            self.assertIn(words, self.tsd("replay", name, code=FAILED).stderr)
+            self.assertIn(words, self.tsd("recording", "show", name, code=FAILED).stderr)
+
+    def test_another_plug_in(self):
+        """A build that says something else, that is told to go on, and one whose messages nobody compares."""
+        self.make(3)
+        name = self.record("sync", "dev", "host")
+        library = pathlib.Path(tsd_folder.TSD).with_name("libApplicationSync.so").read_bytes()
+        old, new = b"getting installed assets", b"getting installed thingies"[:24]
+        self.assertIn(old, library)
+        pathlib.Path("other.so").write_bytes(library.replace(old, new))
+        page = self.tsd("replay", name, "--plugin", "other.so", code=DIFFERS).stdout
+        self.assertRegex(page, r"in TSClient\.installedAssets: other arguments\n *expected .*" + old.decode() +
+                         r".*\n *came .*" + new.decode())
+        self.assertRegex(page, r"(?m)^ *thread +daemon: in TSClient.installedAssets")
+        differences = self.document("replay", name, "--plugin", "other.so", "--go-on", code=DIFFERS)["differences"]
+        self.assertEqual({each["kind"] for each in differences}, {"other arguments"})
+        self.assertEqual(self.document("replay", name, "--plugin", "other.so", "--ignore", "messages")["differences"], [])
+        # Another order of services' calls is not ignored with them.
+        old, new = b"ApplicationsSync.plist-debug", b"ApplicationsSync.plist-other"
+        pathlib.Path("other.so").write_bytes(library.replace(old, new))
+        report = self.document("replay", name, "--plugin", "other.so", "--ignore", "messages", code=DIFFERS)
+        self.assertIn("FileSystem.", report["differences"][0]["expected"])
+
+
+if __name__ == "__main__":
+    tsd_folder.main()
