@@ -33,7 +33,7 @@ install(FILES ${CMAKE_BINARY_DIR}/packaging/ApplicationSyncConfig.cmake
         DESTINATION ${config_folder} COMPONENT development)
 
 file(RELATIVE_PATH prefix_from_pkgconfig /${pkgconfig_folder} /)
-foreach(name applicationsync applicationsync-plist)
+foreach(name applicationsync applicationsync-plist applicationsync-record)
   configure_file(${CMAKE_CURRENT_LIST_DIR}/${name}.pc.in ${CMAKE_BINARY_DIR}/packaging/${name}.pc @ONLY)
   install(FILES ${CMAKE_BINARY_DIR}/packaging/${name}.pc DESTINATION ${pkgconfig_folder} COMPONENT development)
 endforeach()

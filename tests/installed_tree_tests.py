@@ -83,12 +83,18 @@ def main():
 
     # With pkg-config.
     environment = dict(os.environ, PKG_CONFIG_PATH=str(next(prefix.glob("lib*/**/pkgconfig"))))
-    flags = run("pkg-config", "--cflags", "--libs", "applicationsync-plist", env=environment).split()
+    flags = run("pkg-config", "--cflags", "--libs", "applicationsync-record", env=environment).split()
     plugin = run("pkg-config", "--variable=plugin", "applicationsync", env=environment).strip()
     sources = [path for path in example.glob("*.cpp") if path.name != "contract.cpp"]
     run(settings["CMAKE_CXX_COMPILER"], "-std=c++20", f'-DPLUGIN="{plugin}"', "-o", work / "with-pkg-config", *sources,
         *flags, "-ldl")
     check_daemon(work / "with-pkg-config")
+
+    # A daemon that records itself, replayed without its device.
+    run(work / "daemon/minimal-daemon", library, work / "daemon.recording", code=3)
+    replayed = run(prefix / "bin/tsd", "replay", work / "daemon.recording")
+    if not replayed.endswith("events replayed, as recorded.\n"):
+        sys.exit(f"the daemon's recording: {replayed}")
 
     # The program finds the plug-in beside which it is installed, and has its pages and completions.
     run(prefix / "bin/tsd", "sample", "host", cwd=fresh(work / "run"))

@@ -1,6 +1,6 @@
 // A host of the plug-in with a device of its own: loads the plug-in and syncs two apps, one of which never arrives.
 //
-// usage: minimal-daemon [libApplicationSync.so]
+// usage: minimal-daemon [libApplicationSync.so [RECORDING]]
 
 #include <dlfcn.h>
 
@@ -10,6 +10,7 @@
 
 #include "TinyDevice.h"
 #include "platform/Plugin.h"
+#include "record/RecordingPlatform.h"
 
 // Once per process. The library is never unloaded: completion handlers may outlive the plug-in object.
 std::shared_ptr<platform::TSClient> loadPlugin(const char* file, const platform::Platform& device) {
@@ -84,7 +85,14 @@ int main(int count, char** arguments) {
   files.writeAtomically(std::string(staging) + "/ApplicationsSync.plist", todoList);
 
   const char* library = count > 1 ? arguments[1] : PLUGIN;
-  auto plugin = loadPlugin(library, device.platform());
+  std::unique_ptr<record::RecordingPlatform> recording;
+  std::shared_ptr<platform::TSClient> plugin;
+  if (count > 2) {
+    recording = record::recordingPlatform(device.platform(), record::makeFileSink(arguments[2]));
+    plugin = recording->makeClient([&](const platform::Platform& recorded) { return loadPlugin(library, recorded); });
+  } else {
+    plugin = loadPlugin(library, device.platform());
+  }
   if (!plugin) {
     std::fprintf(stderr, "%s: no plug-in of this interface's version\n", library);
     return 1;
