@@ -3,7 +3,7 @@
 
 .DEFAULT_GOAL := help
 .PHONY: help build build-all demo test check asan tsan tsan-clang clang debug arm64 coverage sweep kill-sweep error-sweep full-disk \
-        power-loss simulate mutants fuzz bench deb interface format clean packages check-packages fuzz-packages \
+        power-loss simulate mutants recordings fuzz bench deb interface format clean packages check-packages fuzz-packages \
         deb-packages arm64-packages coverage-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
@@ -93,6 +93,9 @@ mutants: packages ## faults planted in a copy of the sources, for the tests to f
 	@python3 tests/mutants.py build/mutants
 	@python3 tests/random_mutants.py build/mutants --area $(or $(AREA),plugin) --count $(or $(COUNT),100) \
 	  --seed $(or $(SEED),1)
+
+recordings: build ## the recordings that the tests replay, made anew; tells which ones the plug-in answers differently
+	@python3 tests/make_recordings.py build/release/bin/tsd tests/recordings
 
 fuzz: fuzz-packages ## looks for inputs that break something: make fuzz RUNS=1000000 TARGETS=xml_list
 	@$(call PRESET,fuzz,$(addprefix fuzz_,$(or $(TARGETS),$(notdir $(wildcard fuzz/seeds/*))) seeds))

@@ -6,10 +6,22 @@ usage: recording_tests.py TSD [unittest arguments]
 
 import pathlib
 import random
-import re
 
 import tsd_folder
 from tsd_folder import DIFFERS, DONE, FAILED, SOME_FAILED, Folder, says
+
+
+class Corpus(Folder):
+    """What `make recordings` made: a difference is a change of behaviour, to be explained where they are made anew."""
+
+    def test_every_recording(self):
+        recordings = sorted((pathlib.Path(__file__).parent / "recordings").glob("*.recording"))
+        self.assertGreater(len(recordings), 15)
+        self.assertLess(sum(path.stat().st_size for path in recordings), 2 << 20)
+        for path in recordings:
+            with self.subTest(path.name):
+                report = self.document("replay", str(path))
+                self.assertTrue(report["whole"])
 
 
 class Recordings(Folder):
