@@ -104,6 +104,11 @@ char* Arena::allocateShared(std::size_t size) {
   return bytes;
 }
 
+void Arena::giveBackShared(std::size_t size) noexcept {
+  _sharedNext -= size;
+  _sharedLeft += size;
+}
+
 std::string_view Arena::copy(std::string_view bytes) {
   if (bytes.empty()) return {"", 0};
   char* block = static_cast<char*>(allocate(bytes.size()));

@@ -32,6 +32,8 @@ class Arena {
 
   /// Bytes that several values may point to.
   char* allocateShared(std::size_t size);
+  /// The last so many of the shared bytes that were allocated last are not needed after all.
+  void giveBackShared(std::size_t size) noexcept;
   std::string_view copy(std::string_view bytes);
 
  private:

@@ -21,6 +21,8 @@ class ValueBuilder {
   BytesView input() const noexcept { return _arena->input(); }
   /// Room for text that is not in the input as it is; any number of values may point to it.
   char* allocateText(std::size_t size) { return _arena->allocateShared(size); }
+  /// The last so many bytes of the room that was asked for last are not needed after all.
+  void giveBackText(std::size_t size) noexcept { _arena->giveBackShared(size); }
 
   /// `kept` lies in the input or in allocated text.
   static Value string(std::string_view kept) noexcept { return Value(Value::Kind::string, kept); }
@@ -36,7 +38,9 @@ class ValueBuilder {
 
   /// Completes a dictionary whose entries are in their places. Answers the number of an entry whose key an
   /// earlier one has; such a dictionary must not be handed out.
-  std::optional<std::size_t> seal(Dictionary& dictionary);
+  static std::optional<std::size_t> seal(Dictionary& dictionary);
+  /// The same for keys that are known to differ.
+  static void sealUnlike(Dictionary& dictionary);
 
   /// The document's outermost value. The builder is used up.
   Value finish(const Value& root);

@@ -3,6 +3,8 @@
 #include <array>
 #include <cstdint>
 
+#include "plist/BigEndian.h"
+
 namespace plist {
 namespace {
 
@@ -21,6 +23,36 @@ constexpr std::array<std::uint8_t, 256> meanings = [] {
 
 std::uint8_t meaning(char character) { return meanings[static_cast<unsigned char>(character)]; }
 
+/// What a character means at each place of a group of four, already shifted there, or `noDigit`.
+constexpr std::uint32_t noDigit = 0x80000000;
+using Digits = std::array<std::uint32_t, 256>;
+constexpr std::array<Digits, 4> digits = [] {
+  std::array<Digits, 4> tables{};
+  for (std::size_t place = 0; place < 4; ++place) {
+    for (std::size_t character = 0; character < 256; ++character) {
+      std::uint32_t bits = meanings[character];
+      tables[place][character] = bits < 64 ? bits << (18 - 6 * place) : noDigit;
+    }
+  }
+  return tables;
+}();
+
+/// The 24 bits of four characters.
+inline std::uint32_t group(const char* at) {
+  auto digit = [at](std::size_t place) { return digits[place][static_cast<unsigned char>(at[place])]; };
+  return digit(0) | digit(1) | digit(2) | digit(3);
+}
+
+/// Reads whole groups as long as there is nothing else, and moves both places behind them. Writes up to two bytes more
+/// than it says, which the characters that it leaves over have room for.
+void readGroups(const char*& from, const char* end, char*& to) {
+  for (; end - from >= 12; from += 8, to += 6) {
+    std::uint64_t first = group(from), second = group(from + 4);
+    if ((first | second) & noDigit) return;
+    writeBigEndian(to, first << 40 | second << 16, 8);
+  }
+}
+
 }  // namespace
 
 void writeBase64(std::string_view bytes, char* at) {
@@ -33,29 +65,32 @@ void writeBase64(std::string_view bytes, char* at) {
   }
 }
 
-std::optional<std::size_t> base64Bytes(std::string_view text) {
-  std::size_t digits = 0, pads = 0;
-  for (char character : text) {
-    std::uint8_t bits = meaning(character);
-    if (bits == space) continue;
-    if (bits == invalid || (pads && bits != padding)) return {};
-    ++(bits == padding ? pads : digits);
-  }
-  if (pads > 2 || (digits + pads) % 4) return {};
-  return digits * 3 / 4;
-}
-
-void readBase64(std::string_view text, char* at) {
+std::optional<std::size_t> readBase64(std::string_view text, char* to) {
+  const char *from = text.data(), *const end = from + text.size();
+  char* const start = to;
   std::uint32_t bits = 0;
-  int count = 0;
-  for (char character : text) {
-    std::uint8_t digit = meaning(character);
-    if (digit > 63) continue;
+  std::size_t count = 0, pads = 0;  // of the present group
+  while (from != end) {
+    if (count + pads == 0) {
+      readGroups(from, end, to);
+      if (from == end) break;
+    }
+    std::uint8_t digit = meaning(*from++);
+    if (digit == space) continue;
+    if (digit == invalid || (pads && digit != padding)) return {};
+    if (digit == padding) {
+      ++pads;
+      continue;
+    }
     bits = bits << 6 | digit;
-    if ((count += 6) < 8) continue;
-    count -= 8;
-    *at++ = static_cast<char>(bits >> count & 0xff);
+    if (++count < 4) continue;
+    for (int shift : {16, 8, 0}) *to++ = static_cast<char>(bits >> shift & 0xff);
+    count = 0;
   }
+  if (pads > 2 || (count + pads) % 4) return {};
+  if (count > 1) *to++ = static_cast<char>(bits >> (6 * count - 8) & 0xff);
+  if (count > 2) *to++ = static_cast<char>(bits >> 2 & 0xff);
+  return static_cast<std::size_t>(to - start);
 }
 
 }  // namespace plist

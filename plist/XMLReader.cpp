@@ -7,8 +7,10 @@
 #include <cstring>
 #include <memory>
 #include <new>
+#include <optional>
 #include <string>
 #include <type_traits>
+#include <utility>
 #include <vector>
 
 #include "platform/DateText.h"
@@ -93,7 +95,47 @@ struct ParserDeleter {
 };
 using Parser = std::unique_ptr<std::remove_pointer_t<XML_Parser>, ParserDeleter>;
 
+constexpr std::string_view dataTag = "<data>";
+
+/// What stands between such a tag and the next one, which ends the element.
+struct LongData {
+  std::size_t begin, end;
+};
+
+/// The next of them from the byte `at` on that is worth finding: surely one that is twice as long as a block. Mostly
+/// nothing is looked at but the first tag of each block.
+std::optional<LongData> nextLongData(std::string_view input, std::size_t at) {
+  constexpr std::size_t block = 256;
+  while (input.size() - at > block) {
+    if (input.substr(at, block).find('<') != input.npos) {
+      at += block;
+      continue;
+    }
+    std::size_t before = input.rfind('<', at), end = input.find('<', at + block);
+    if (end == input.npos) break;
+    if (before != input.npos && input.substr(before).starts_with(dataTag) && input.substr(end).starts_with("</data")) {
+      return LongData{before + dataTag.size(), end};
+    }
+    at = end;
+  }
+  return {};
+}
+
+/// How many lines end in the text, as the parser counts them.
+std::size_t lineEnds(std::string_view text) {
+  std::size_t count = 0;
+  char before = 0;
+  for (char character : text) {
+    count += character == '\r' || (character == '\n' && before != '\r');
+    before = character;
+  }
+  return count;
+}
+
 /// Reads one document.
+///
+/// Long data is not shown to the parser: no rule of XML concerns text that is base64. Behind the tag <data> the parser
+/// goes on with </data>.
 ///
 /// The parser hands out text in pieces of its own copy of the input. Where the pieces of a text follow one another
 /// there, as they nearly always do, the text is taken from the input itself. What has been read of the open containers
@@ -124,6 +166,9 @@ class XMLReader {
 
   void setHandlers();
   void parse();
+  XML_Status parsePiece(std::size_t from, std::size_t end);
+  bool passOver(LongData found);
+  std::size_t place() const;
   const char* inInput(std::string_view piece);
   template <class Event>
   static void deliver(void* reader, Event event);
@@ -140,6 +185,7 @@ class XMLReader {
   Value real(std::string_view text);
   Value date(std::string_view text);
   Value data(std::string_view text);
+  std::optional<std::string_view> decoded(std::string_view text);
   Value array(std::size_t first);
   Value dictionary(std::size_t first);
   void fail(ErrorCode code, const std::string& description);
@@ -147,8 +193,11 @@ class XMLReader {
   ValueBuilder _builder;
   std::string_view _input;
   Parser _parser;
-  const char* _copy = nullptr;  // where the parser's copy of the input begins, as far as it goes
+  std::string_view _copy;   // what the parser holds of the input, from the piece's first text on
+  std::size_t _copyAt = 0;  // where that begins in the input
   bool _knowsCopy = false;
+  std::vector<std::string_view> _passedOver;  // of the input, not shown to the parser
+  std::size_t _passedOverSize = 0;
   std::vector<Container> _open;
   std::vector<PendingEntry> _pending;
   Element _leaf = Element::none;  // the element without children that is open
@@ -156,6 +205,8 @@ class XMLReader {
   std::string_view _text;         // of the leaf: in the input, or all of _textBuffer
   bool _textInInput = true;
   std::string _textBuffer;
+  std::size_t _dataBegin = 0;                // where the text of the last data begins, if its tag is plain
+  std::optional<std::string_view> _decoded;  // of the data that is open, if its text was passed over
   platform::ErrorRef _error;
 };
 
@@ -208,17 +259,21 @@ static ErrorCode codeOf(XML_Error reason) {
   return reason == XML_ERROR_UNKNOWN_ENCODING ? ErrorCode::unsupported : ErrorCode::malformed;
 }
 
-/// All at once, as far as the parser takes it: each further piece would have it count the lines of the one before,
-/// and begin anew at the start of whatever was cut.
+/// In as few pieces as can be: each further one has the parser count the lines of the one before, and begin anew at the
+/// start of whatever was cut. So a first cut that was none between a tag and its data is the last.
 void XMLReader::parse() {
-  constexpr std::size_t most = std::size_t{1} << 30;
   XML_Status status = XML_STATUS_OK;
-  for (std::size_t at = 0; status == XML_STATUS_OK && at < _input.size(); at += most) {
-    std::size_t size = std::min(_input.size() - at, most);
-    // Behind the first piece the copy begins anywhere: text is taken from the parser then.
-    if (at > 0) _copy = nullptr;
-    status = XML_Parse(_parser.get(), _input.data() + at, static_cast<int>(size), at + size == _input.size());
+  std::size_t at = 0;
+  while (status == XML_STATUS_OK) {
+    std::optional<LongData> found = nextLongData(_input, at);
+    // In a CDATA section a tag is text, and a cut would show in what is said of that.
+    if (!found || _input.substr(at, found->begin - at).find("<![") != _input.npos) break;
+    status = parsePiece(at, found->begin);
+    at = found->begin;
+    if (status != XML_STATUS_OK || _leaf != Element::data || _dataBegin != at || !passOver(*found)) break;
+    at = found->end;
   }
+  if (status == XML_STATUS_OK && !_error) status = parsePiece(at, _input.size());
   if (_error) return;
   if (status != XML_STATUS_OK) {
     XML_Error reason = XML_GetErrorCode(_parser.get());
@@ -228,9 +283,35 @@ void XMLReader::parse() {
   }
 }
 
+/// The input from one byte to another, as much at a time as the parser takes.
+XML_Status XMLReader::parsePiece(std::size_t from, std::size_t end) {
+  constexpr std::size_t most = std::size_t{1} << 30;
+  XML_Status status = XML_STATUS_OK;
+  for (std::size_t size; status == XML_STATUS_OK && from < end; from += size) {
+    size = std::min(end - from, most);
+    _knowsCopy = false;
+    status = XML_Parse(_parser.get(), _input.data() + from, static_cast<int>(size), from + size == _input.size());
+  }
+  return status;
+}
+
+/// Decodes the data that was just opened. False if it is not plain base64: the parser has to see it then.
+bool XMLReader::passOver(LongData found) {
+  deliver(this, [found](XMLReader& self) {
+    std::string_view text = self._input.substr(found.begin, found.end - found.begin);
+    self._decoded = self.decoded(text);
+    if (!self._decoded) return;
+    self._passedOver.push_back(text);
+    self._passedOverSize += text.size();
+  });
+  return _decoded.has_value();
+}
+
 void XMLReader::fail(ErrorCode code, const std::string& description) {
   if (_error) return;
-  _error = failure(code, "line " + std::to_string(XML_GetCurrentLineNumber(_parser.get())) + ": " + description);
+  std::size_t line = XML_GetCurrentLineNumber(_parser.get());
+  for (std::string_view text : _passedOver) line += lineEnds(text);
+  _error = failure(code, "line " + std::to_string(line) + ": " + description);
   XML_StopParser(_parser.get(), XML_FALSE);
 }
 
@@ -265,6 +346,7 @@ void XMLReader::open(Element element) {
     _open.push_back({element, _pending.size(), false, {}});
     return;
   }
+  if (element == Element::data) _dataBegin = place() + dataTag.size();
   _leaf = element;
   _takesText = element != Element::trueValue && element != Element::falseValue;
   _text = {};
@@ -289,18 +371,24 @@ void XMLReader::text(std::string_view piece) {
   _text = _textBuffer;
 }
 
+/// Where in the input the present event begins.
+std::size_t XMLReader::place() const {
+  return static_cast<std::size_t>(XML_GetCurrentByteIndex(_parser.get())) + _passedOverSize;
+}
+
 /// Where the piece lies in the input. Null if it does not: the parser made it from a reference, a line end of two
 /// characters, or another encoding.
 const char* XMLReader::inInput(std::string_view piece) {
   if (!_knowsCopy) {
     int offset = 0, size = 0;
     const char* context = XML_GetInputContext(_parser.get(), &offset, &size);
-    XML_Index index = XML_GetCurrentByteIndex(_parser.get());
     _knowsCopy = true;
-    _copy = context && index == offset ? context : nullptr;
+    // From the event on: what the parser holds before that need not follow one another in the input.
+    _copy = context ? std::string_view(context + offset, static_cast<std::size_t>(size - offset)) : std::string_view();
+    _copyAt = place();
   }
-  std::size_t at = reinterpret_cast<std::uintptr_t>(piece.data()) - reinterpret_cast<std::uintptr_t>(_copy);
-  return _copy && at < _input.size() && piece.size() <= _input.size() - at ? _input.data() + at : nullptr;
+  std::size_t at = reinterpret_cast<std::uintptr_t>(piece.data()) - reinterpret_cast<std::uintptr_t>(_copy.data());
+  return at < _copy.size() && piece.size() <= _copy.size() - at ? _input.data() + _copyAt + at : nullptr;
 }
 
 /// The leaf's text, where it stays as long as the document's values.
@@ -337,7 +425,7 @@ void XMLReader::endLeaf() {
     case Element::date:
       return add(date(trimmed(_text)));
     case Element::data:
-      return add(data(_text));
+      return add(_decoded ? ValueBuilder::data(*std::exchange(_decoded, {})) : data(_text));
     default:
       return add(Value(_leaf == Element::trueValue));
   }
@@ -406,14 +494,19 @@ Value XMLReader::date(std::string_view text) {
 }
 
 Value XMLReader::data(std::string_view text) {
-  std::optional<std::size_t> size = base64Bytes(text);
-  if (!size) {
-    fail(ErrorCode::malformed, "<data> that is not base64");
-    return {};
-  }
-  char* bytes = _builder.allocateText(*size);
-  readBase64(text, bytes);
-  return ValueBuilder::data({bytes, *size});
+  if (auto bytes = decoded(text)) return ValueBuilder::data(*bytes);
+  fail(ErrorCode::malformed, "<data> that is not base64");
+  return {};
+}
+
+/// The bytes that the text stands for. Nothing if it is not base64.
+std::optional<std::string_view> XMLReader::decoded(std::string_view text) {
+  std::size_t room = base64Room(text);
+  char* bytes = _builder.allocateText(room);
+  std::optional<std::size_t> size = readBase64(text, bytes);
+  _builder.giveBackText(room - size.value_or(0));
+  if (!size) return {};
+  return std::string_view(bytes, *size);
 }
 
 Value XMLReader::array(std::size_t first) {
