@@ -209,7 +209,7 @@ class Dictionary {
   friend class Array;
   friend class ValueBuilder;
 
-  static constexpr std::size_t linearLimit = 8;
+  static constexpr std::size_t linearLimit = 64;
 
   explicit Dictionary(Arena* arena) noexcept : _arena(arena) {}
   std::size_t find(std::string_view key) const noexcept;

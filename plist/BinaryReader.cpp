@@ -8,7 +8,6 @@
 #include <new>
 #include <string>
 #include <unordered_map>
-#include <vector>
 
 #include "platform/DateText.h"
 #include "platform/ValueBuilder.h"
@@ -44,8 +43,8 @@ class BinaryReader {
  private:
   /// The contents of an object: `count` items from the byte `at` on.
   struct Extent {
-    std::size_t at;
-    std::size_t count;
+    std::size_t at = 0;
+    std::size_t count = 0;
   };
   /// The last dictionary at some depth. The entries of a list mostly have the same keys.
   struct Keys {
@@ -56,27 +55,39 @@ class BinaryReader {
 
   bool readTrailer();
   Value object(std::uint64_t number, std::size_t from);
+  Value objectAt(std::size_t at, std::uint64_t number);
   Value simple(std::size_t at, unsigned low);
   Value integer(std::size_t at, unsigned low);
   Value real(std::size_t at, unsigned low);
   Value date(std::size_t at, unsigned low);
   Value data(std::size_t at, unsigned low);
-  Value array(std::size_t at, unsigned low, std::uint64_t number);
-  Value dictionary(std::size_t at, unsigned low, std::uint64_t number);
+  [[gnu::noinline]] Value array(std::size_t at, unsigned low, std::uint64_t number);
+  [[gnu::noinline]] Value dictionary(std::size_t at, unsigned low, std::uint64_t number);
   bool readKeys(Dictionary& dictionary, std::size_t at, std::size_t from);
-  std::optional<std::string_view> key(std::uint64_t number, std::size_t from);
-  std::optional<std::string_view> ascii(std::size_t at, unsigned low);
-  std::optional<std::string_view> utf16(std::size_t at, unsigned low);
+  Value text(std::size_t at);
+  bool key(std::size_t from, std::string_view& text);
+  bool otherKey(std::size_t at, std::string_view& text);
+  bool shortASCII(std::size_t at, unsigned marker);
+  bool ascii(std::size_t at, unsigned low, std::string_view& text);
+  bool utf16(std::size_t at, unsigned low, std::string_view& text);
 
   bool find(std::uint64_t number, std::size_t from, std::size_t& at);
   bool extent(std::size_t at, unsigned low, std::size_t itemSize, const char* what, Extent& extent);
   bool fits(std::size_t at, std::size_t size, const char* what);
   bool enter(std::size_t at, std::uint64_t number, std::size_t nodes);
   bool spendText(std::size_t at, std::size_t size);
-  std::uint64_t number(std::size_t from) const { return readBigEndian(_bytes.data() + from, _referenceSize); }
+  /// The number that begins at the byte, of a size that goes with the shift: behind everything that is read there is
+  /// the trailer, so eight bytes can be had anywhere.
+  std::uint64_t number(std::size_t from, unsigned shift) const {
+    return readBigEndian(_bytes.data() + from, 8) >> shift;
+  }
+  std::uint64_t number(std::size_t from) const { return number(from, _referenceShift); }
   Value reference(std::size_t from) { return object(number(from), from); }
-  unsigned byte(std::size_t at) const { return static_cast<unsigned char>(_bytes[at]); }
-  bool fail(ErrorCode code, std::size_t at, const std::string& description);
+  unsigned byte(std::size_t at) const { return static_cast<unsigned char>(_bytes.data()[at]); }
+  bool fail(ErrorCode code, std::size_t at, std::string_view description);
+  bool fail(std::size_t at, const char* what, const char* problem);
+  bool failReference(std::uint64_t number, std::size_t from);
+  bool failOffset(std::uint64_t number);
 
   ValueBuilder _builder;
   std::string_view _bytes;
@@ -84,9 +95,11 @@ class BinaryReader {
   std::uint64_t _objectCount = 0;
   unsigned _offsetSize = 0;
   unsigned _referenceSize = 0;
+  unsigned _offsetShift = 0, _referenceShift = 0;
   std::size_t _nodesLeft;
   std::size_t _textLeft;
-  std::vector<std::uint64_t> _path;                              // the containers around the present object
+  std::array<std::uint64_t, maximumDepth> _path;                 // the containers around the present object
+  std::size_t _depth = 0;                                        // how many
   std::array<Keys, 4> _lastKeys;                                 // by depth
   std::unordered_map<std::size_t, std::string_view> _converted;  // UTF-16 strings by the byte they are at
   platform::ErrorRef _error;
@@ -122,31 +135,40 @@ bool BinaryReader::readTrailer() {
     return fail(ErrorCode::malformed, at + 8, "more objects than the offset table has room for");
   }
   _objectsEnd = table;
+  _offsetShift = 64 - 8 * _offsetSize;
+  _referenceShift = 64 - 8 * _referenceSize;
   return true;
 }
 
-bool BinaryReader::fail(ErrorCode code, std::size_t at, const std::string& description) {
-  if (!_error) _error = failure(code, "byte " + std::to_string(at) + ": " + description);
+// Where something fails nothing is put together, so that the functions that go through every object stay small.
+bool BinaryReader::fail(ErrorCode code, std::size_t at, std::string_view description) {
+  if (!_error) _error = failure(code, "byte " + std::to_string(at) + ": " + std::string(description));
   return false;
+}
+
+bool BinaryReader::fail(std::size_t at, const char* what, const char* problem) {
+  return fail(ErrorCode::malformed, at, std::string(what) + problem);
+}
+
+bool BinaryReader::failReference(std::uint64_t number, std::size_t from) {
+  return fail(ErrorCode::malformed, from,
+              "a reference to object " + std::to_string(number) + " of " + std::to_string(_objectCount));
+}
+
+bool BinaryReader::failOffset(std::uint64_t number) {
+  return fail(ErrorCode::malformed, _objectsEnd + number * _offsetSize,
+              "object " + std::to_string(number) + " lies outside the objects");
 }
 
 /// Where the object begins to which the byte `from` refers.
 inline bool BinaryReader::find(std::uint64_t number, std::size_t from, std::size_t& at) {
-  if (number >= _objectCount) {
-    return fail(ErrorCode::malformed, from,
-                "a reference to object " + std::to_string(number) + " of " + std::to_string(_objectCount));
-  }
-  std::uint64_t offset = readBigEndian(_bytes.data() + _objectsEnd + number * _offsetSize, _offsetSize);
-  if (offset < headerSize || offset >= _objectsEnd) {
-    return fail(ErrorCode::malformed, _objectsEnd + number * _offsetSize,
-                "object " + std::to_string(number) + " lies outside the objects");
-  }
-  at = offset;
-  return true;
+  if (number >= _objectCount) return failReference(number, from);
+  at = this->number(_objectsEnd + number * _offsetSize, _offsetShift);
+  return (at >= headerSize && at < _objectsEnd) || failOffset(number);
 }
 
 inline bool BinaryReader::fits(std::size_t at, std::size_t size, const char* what) {
-  return size <= _objectsEnd - at || fail(ErrorCode::malformed, at, std::string(what) + " runs past the objects");
+  return size <= _objectsEnd - at || fail(at, what, " runs past the objects");
 }
 
 /// Where the items of an object are whose marker, with `low` as its low half, is at the byte `at`.
@@ -155,14 +177,15 @@ inline bool BinaryReader::extent(std::size_t at, unsigned low, std::size_t itemS
   std::size_t from = at + 1;
   if (low == 15) {
     unsigned marker = from < _objectsEnd ? byte(from) : 0;
-    if (marker < 0x10 || marker > 0x13) return fail(ErrorCode::malformed, from, std::string(what) + " without a count");
+    if (marker < 0x10 || marker > 0x13) return fail(from, what, " without a count");
     unsigned size = 1u << (marker & 3);
     if (!fits(++from, size, what)) return false;
     count = readBigEndian(_bytes.data() + from, size);
     from += size;
   }
-  if (count > (_objectsEnd - from) / itemSize) {
-    return fail(ErrorCode::malformed, at, std::string(what) + " runs past the objects");
+  // Not more than there are bytes, so it can be multiplied.
+  if (count > _objectsEnd - from || count * itemSize > _objectsEnd - from) {
+    return fail(at, what, " runs past the objects");
   }
   extent = {from, count};
   return true;
@@ -176,21 +199,27 @@ inline bool BinaryReader::spendText(std::size_t at, std::size_t size) {
 
 /// Enters a container, which adds so many nodes.
 bool BinaryReader::enter(std::size_t at, std::uint64_t number, std::size_t nodes) {
-  if (std::find(_path.begin(), _path.end(), number) != _path.end()) {
+  if (std::find(_path.begin(), _path.begin() + _depth, number) != _path.begin() + _depth) {
     return fail(ErrorCode::malformed, at, "a container that contains itself");
   }
-  if (_path.size() == maximumDepth) {
+  if (_depth == maximumDepth) {
     return fail(ErrorCode::tooDeep, at, "containers more than " + std::to_string(maximumDepth) + " deep");
   }
   if (nodes > _nodesLeft) return fail(ErrorCode::tooLarge, at, "shared containers make the document too large");
   _nodesLeft -= nodes;
-  _path.push_back(number);
+  _path[_depth++] = number;
   return true;
 }
 
-Value BinaryReader::object(std::uint64_t number, std::size_t from) {
-  std::size_t at;
+inline Value BinaryReader::object(std::uint64_t number, std::size_t from) {
+  std::size_t at = 0;
   if (!find(number, from, at)) return {};
+  unsigned marker = byte(at);
+  if (shortASCII(at, marker)) return ValueBuilder::string({_bytes.data() + at + 1, marker & 15});
+  return objectAt(at, number);
+}
+
+Value BinaryReader::objectAt(std::size_t at, std::uint64_t number) {
   unsigned marker = byte(at), low = marker & 15;
   switch (marker >> 4) {
     case 0x0:
@@ -204,11 +233,8 @@ Value BinaryReader::object(std::uint64_t number, std::size_t from) {
     case 0x4:
       return data(at, low);
     case 0x5:
-      if (auto text = ascii(at, low)) return ValueBuilder::string(*text);
-      return {};
     case 0x6:
-      if (auto text = utf16(at, low)) return ValueBuilder::string(*text);
-      return {};
+      return text(at);
     case 0x8:
       fail(ErrorCode::unsupported, at, "a UID, which a property list cannot hold");
       return {};
@@ -284,32 +310,49 @@ Value BinaryReader::data(std::size_t at, unsigned low) {
   return ValueBuilder::data(_bytes.substr(bytes.at, bytes.count));
 }
 
-inline std::optional<std::string_view> BinaryReader::ascii(std::size_t at, unsigned low) {
-  Extent bytes;
-  if (!extent(at, low, 1, "a string", bytes) || !spendText(at, bytes.count)) return {};
-  std::string_view text = _bytes.substr(bytes.at, bytes.count);
-  if (isASCII(text)) return text;
-  fail(ErrorCode::malformed, at, "an ASCII string with other characters");
+Value BinaryReader::text(std::size_t at) {
+  std::string_view text;
+  unsigned marker = byte(at);
+  if (marker >> 4 == 5 ? ascii(at, marker & 15, text) : utf16(at, marker & 15, text)) return ValueBuilder::string(text);
   return {};
 }
 
-std::optional<std::string_view> BinaryReader::utf16(std::size_t at, unsigned low) {
+/// Whether there is what most objects are: an ASCII string of less than 15 characters, behind its marker. Anything
+/// else, what is wrong with it included, is left to the functions for all strings.
+inline bool BinaryReader::shortASCII(std::size_t at, unsigned marker) {
+  const std::size_t from = at + 1, size = marker & 15;
+  if (marker >> 4 != 5 || size == 15 || size > _objectsEnd - from || size > _textLeft) return false;
+  // All bytes of the text and no others: the first eight and the last, or as many as there are.
+  const char* text = _bytes.data() + from;
+  std::uint64_t bits = readBigEndian(text, 8);
+  bits = size >= 8 ? bits | readBigEndian(text + size - 8, 8) : bits & ~(~std::uint64_t{0} >> (8 * size));
+  if (bits & 0x8080808080808080) return false;
+  _textLeft -= size;
+  return true;
+}
+
+bool BinaryReader::ascii(std::size_t at, unsigned low, std::string_view& text) {
+  Extent bytes;
+  if (!extent(at, low, 1, "a string", bytes) || !spendText(at, bytes.count)) return false;
+  text = _bytes.substr(bytes.at, bytes.count);
+  return isASCII(text) || fail(ErrorCode::malformed, at, "an ASCII string with other characters");
+}
+
+bool BinaryReader::utf16(std::size_t at, unsigned low, std::string_view& text) {
   if (auto known = _converted.find(at); known != _converted.end()) {
-    if (!spendText(at, known->second.size())) return {};
-    return known->second;
+    text = known->second;
+    return spendText(at, text.size());
   }
   Extent units;
-  if (!extent(at, low, 2, "a string", units)) return {};
-  std::string_view text = _bytes.substr(units.at, units.count * 2);
-  std::optional<std::size_t> size = utf8Size(text, ByteOrder::big);
-  if (!size) {
-    fail(ErrorCode::malformed, at, "a UTF-16 string with half a surrogate pair");
-    return {};
-  }
-  if (!spendText(at, *size)) return {};
+  if (!extent(at, low, 2, "a string", units)) return false;
+  std::string_view written = _bytes.substr(units.at, units.count * 2);
+  std::optional<std::size_t> size = utf8Size(written, ByteOrder::big);
+  if (!size) return fail(ErrorCode::malformed, at, "a UTF-16 string with half a surrogate pair");
+  if (!spendText(at, *size)) return false;
   char* converted = _builder.allocateText(*size);
-  writeUTF8(text, ByteOrder::big, converted);
-  return _converted[at] = std::string_view(converted, *size);
+  writeUTF8(written, ByteOrder::big, converted);
+  text = _converted[at] = {converted, *size};
+  return true;
 }
 
 Value BinaryReader::array(std::size_t at, unsigned low, std::uint64_t number) {
@@ -321,7 +364,7 @@ Value BinaryReader::array(std::size_t at, unsigned low, std::uint64_t number) {
     ::new (places + index) Value(reference(items.at + index * _referenceSize));
     if (_error) return {};
   }
-  _path.pop_back();
+  --_depth;
   return ValueBuilder::contained(array);
 }
 
@@ -336,7 +379,7 @@ Value BinaryReader::dictionary(std::size_t at, unsigned low, std::uint64_t numbe
     ::new (&places[index].value) Value(reference(from + index * _referenceSize));
     if (_error) return {};
   }
-  _path.pop_back();
+  --_depth;
   return ValueBuilder::contained(dictionary);
 }
 
@@ -345,21 +388,19 @@ bool BinaryReader::readKeys(Dictionary& dictionary, std::size_t at, std::size_t 
   std::size_t count = dictionary.size();
   const char* references = _bytes.data() + from;
   Dictionary::Entry* places = ValueBuilder::places(dictionary);
-  Keys& last = _lastKeys[_path.size() % _lastKeys.size()];
+  Keys& last = _lastKeys[_depth % _lastKeys.size()];
   bool same = last.dictionary && last.dictionary->size() == count &&
               std::memcmp(last.references, references, count * _referenceSize) == 0;
   if (same) {
     if (!spendText(at, last.text)) return false;
     const Dictionary::Entry* known = last.dictionary->begin();
     for (std::size_t index = 0; index < count; ++index) ::new (&places[index].key) std::string_view(known[index].key);
-    if (count > 8) _builder.seal(dictionary);
+    ValueBuilder::sealUnlike(dictionary);
     return true;
   }
   std::size_t before = _textLeft;
   for (std::size_t index = 0; index < count; ++index, from += _referenceSize) {
-    std::optional<std::string_view> text = key(number(from), from);
-    if (!text) return false;
-    ::new (&places[index].key) std::string_view(*text);
+    if (!key(from, *::new (&places[index].key) std::string_view)) return false;
   }
   if (auto twice = _builder.seal(dictionary)) {
     return fail(ErrorCode::duplicateKey, at, "the key " + quoted(places[*twice].key) + " appears twice");
@@ -368,14 +409,20 @@ bool BinaryReader::readKeys(Dictionary& dictionary, std::size_t at, std::size_t 
   return true;
 }
 
-std::optional<std::string_view> BinaryReader::key(std::uint64_t number, std::size_t from) {
-  std::size_t at;
-  if (!find(number, from, at)) return {};
+inline bool BinaryReader::key(std::size_t from, std::string_view& text) {
+  std::size_t at = 0;
+  if (!find(number(from), from, at)) return false;
   unsigned marker = byte(at);
-  if (marker >> 4 == 5) return ascii(at, marker & 15);
-  if (marker >> 4 == 6) return utf16(at, marker & 15);
-  fail(ErrorCode::malformed, at, "a dictionary key that is not a string");
-  return {};
+  if (!shortASCII(at, marker)) return otherKey(at, text);
+  text = {_bytes.data() + at + 1, marker & 15};
+  return true;
+}
+
+bool BinaryReader::otherKey(std::size_t at, std::string_view& text) {
+  unsigned marker = byte(at);
+  if (marker >> 4 == 5) return ascii(at, marker & 15, text);
+  if (marker >> 4 == 6) return utf16(at, marker & 15, text);
+  return fail(ErrorCode::malformed, at, "a dictionary key that is not a string");
 }
 
 }  // namespace

@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <bit>
 #include <cmath>
 #include <limits>
@@ -170,6 +171,74 @@ TEST(PropertyList, RefusesXML) {
       {"\xff\xfe<\0p\0\x3d\xd8>\0"s, malformed, "UTF-16"},
       {"\0<\0p\0l"s},
   });
+}
+
+// Which the parser does not see: what comes behind has to be the same text on the same line.
+TEST(PropertyList, ReadsLongData) {
+  std::string line(76, 'x'), lines, raw;
+  for (const char* end : {"\n", "\r\n", "\r", " \t\n"}) {
+    for (int count = 0; count < 10; ++count) lines += line + end;
+  }
+  for (int count = 0; count < 40 * 76 / 4; ++count) raw += "\xc7\x1c\x71";
+  auto sized = [](std::size_t size) { return "<" + std::to_string(size) + " bytes>"; };
+  using enum ErrorCode;
+  const std::string data = "<data>" + lines + "</data>", all = sized(raw.size());
+  const std::string oneLine = "<data>" + std::string(1000, 'x') + "</data>";
+  EXPECT_EQ(read(xml(data)).data(), raw);
+  expectAccepted({
+      {xml("<array><string>a\n b</string>" + data + "<string>c\n d</string>" + data +
+           "<string>e&amp;f</string></array>"),
+       "(a\n b, " + all + ", c\n d, " + all + ", e&f)"},
+      {xml("<data>" + lines + "AA==\n</data>"), sized(raw.size() + 1)},
+      {xml("<data>" + lines + "&#65;AA<!-- -->=</data>"), sized(raw.size() + 2)},
+      {"<?xml version='1.0' encoding='ISO-8859-1'?>" + xml("<array>" + data + "<string>\xe9</string></array>"),
+       "(" + all + ", é)"},
+      // Tags that are none, and what follows them.
+      {xml("<array><!--" + data + "-->" + data + "<true/></array>"), "(" + all + ", 1)"},
+      {xml("<data>AAAA<!--" + data + "--></data>"), "<3 bytes>"},
+      {xml("<array><string><![CDATA[" + oneLine + "]]></string>" + data + "</array>"),
+       "(" + oneLine + ", " + all + ")"},
+  });
+  expectRejected({
+      {xml("<data>" + lines + "A</data>"), malformed, "line 41: <data> that is not base64"},
+      {xml("<data>" + lines + "=AAA</data>"), malformed, "line 41: <data> that is not base64"},
+      {xml("<data>" + lines + "\x80</data>"), malformed, "line 41: not well-formed"},
+      {xml("<data>" + lines + "</array>"), malformed, "line 41: mismatched tag"},
+      {xml("<data>" + lines + "</data"), malformed, "line 41: not well-formed"},
+      {"<plist><data>" + lines, malformed, "line 41: no element found"},
+      {xml("<array>" + data + "\n" + data + "x</array>"), malformed, "line 82: text \"x\" between values"},
+      {xml("<array><![CDATA[" + oneLine + "]]></array>"), malformed, "text \"<data>xx"},
+      {xml("<array>" + data + "<data>\n" + lines + "</data><null/></array>"), malformed,
+       "line 82: no element is named"},
+  });
+}
+
+// However it is found out: keys of every length, in dictionaries of every width at which that changes.
+TEST(PropertyList, FindsAKeyThatAppearsTwice) {
+  for (unsigned width : {2u, 8u, 9u, 40u, 64u, 65u, 200u}) {
+    for (std::size_t length : {3, 4, 7, 8, 9, 14, 15, 40}) {
+      auto key = [length](unsigned number) {
+        std::string digits = std::to_string(1000 + number);
+        std::string text = length < 4 ? digits.substr(1) : std::string(length - 4, 'k') + digits;
+        return (length < 15 ? std::string(1, static_cast<char>(0x50 + length)) : "\x5f\x10" + bigEndian(length, 1)) +
+               text;
+      };
+      std::string dictionary = "\xdf\x10" + bigEndian(width, 1);
+      for (unsigned number = 0; number < width; ++number) dictionary += bigEndian(number + 1, 2);
+      for (unsigned number = 0; number < width; ++number) dictionary += bigEndian(width + 1, 2);
+      std::vector<std::string> objects = {dictionary};
+      for (unsigned number = 0; number < width; ++number) objects.push_back(key(number));
+      objects.emplace_back("\x09");
+      Value value = read(binary(objects, 2));
+      ASSERT_TRUE(value.dictionary()) << width << " keys of " << length;
+      for (const auto& entry : *value.dictionary()) ASSERT_EQ(&(*value.dictionary())[entry.key], &entry.value);
+      EXPECT_FALSE(value.dictionary()->contains("kkk"));
+      objects[width] = key(width / 2 - 1);
+      ErrorRef error;
+      EXPECT_TRUE(read(binary(objects, 2), &error).isAbsent()) << width << " keys of " << length;
+      EXPECT_NE(error->description().find("appears twice"), std::string::npos) << error->describe();
+    }
+  }
 }
 
 TEST(PropertyList, TakesBinary) {
