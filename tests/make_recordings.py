@@ -34,10 +34,16 @@ LINES = [
     ("cancelled", "sync fourth host --transfers 1 --inject setAppAssetPromise:FIRST=cancel=SECOND"),
     ("prioritized", "sync fifth host --transfers 1 --inject setInstallOptions:SECOND=prioritize=FIRST"),
     ("phase-failed", "sync sixth host --transfers 1 --asset FIRST:isDownload=false --end-phase failed"),
+    ("cancelled-and-again", "sync ninth host --transfers 1 --repeat 2 --inject transfer:FIRST@1=cancel=FIRST"),
+    ("", "store tenth FIRST"),
+    ("the-stores-own", "sync tenth host --transfers 1"),
+    ("no-work-area", "sync eleventh host --transfers 1 --inject moveItem=fail"),
+    ("no-directory", "sync phone host --transfers 1 --inject createDirectory=fail"),
+    ("restore-failed", "restore twelfth host --inject setPlaceholderPromise@2=fail"),
     ("restore", "restore seventh host"),
     ("restore-in-daemon", "restore eighth host --in-daemon"),
 ]
-DEVICES = "phone other third fourth fifth sixth seventh eighth".split()
+DEVICES = "phone other third fourth fifth sixth seventh eighth ninth tenth eleventh twelfth".split()
 
 
 def main():
