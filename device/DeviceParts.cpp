@@ -61,7 +61,7 @@ bool isDeviceStore(Store& store, ErrorRef* error) {
 bool fillDeviceParts(FileTree& files, Store& store, ErrorRef* error) {
   // The record comes last: only with it the parts are a device.
   return makeDeviceDirectories(files, error) && syncDirectories(files, error) &&
-         store.commit({{"device", "version", storeVersion}}, error);
+         store.commit({{"device", "version", storeVersion}, {"device", "closed", true}}, error);
 }
 
 bool makeDeviceParts(FileTree& files, Store& store, ErrorRef* error) {

@@ -95,8 +95,9 @@ class LocalDevice {
   /// next. Whoever waits for their outcomes is told nothing. From any thread; returns at once.
   virtual void putOffInstalls() = 0;
 
-  /// Stores what is in memory only: how far transfers have come, and the state of notifications that the store refused
-  /// before. False with an error when it still refuses. Destroying a device does the same.
+  /// Stores what is in memory only: that it is open, how far transfers have come, and the state of notifications that
+  /// the store refused before. False with an error when it still refuses. Destroying a device does the same, and then
+  /// notes that it is closed. To be called before anything is done to its files from outside.
   virtual bool flush(platform::ErrorRef* error = nullptr) = 0;
 };
 

@@ -1,3 +1,4 @@
+#include <exception>
 #include <set>
 #include <utility>
 
@@ -5,6 +6,7 @@
 #include "device/LocalDevice.h"
 #include "device/boundary/DeviceServiceBoundary.h"
 #include "device/coordination/LocalCoordinator.h"
+#include "device/install/Containers.h"
 #include "device/install/InstallEngine.h"
 #include "device/records/AppRecords.h"
 #include "device/records/Settings.h"
@@ -90,6 +92,7 @@ class WholeDevice final : public LocalDevice {
   ~WholeDevice() override {
     _events->stop();
     WholeDevice::flush(nullptr);
+    if (_recovers && !_engine.putsOff()) noteClosed();
   }
 
   bool load(ErrorRef* error) {
@@ -163,6 +166,22 @@ class WholeDevice final : public LocalDevice {
   bool flush(ErrorRef* error) override {
     _engine.flush();
     return _records.flush(error);
+  }
+
+  /// What the next opening need not look after, if everything is on disk.
+  void noteClosed() noexcept try {
+    {
+      Lock lock(_records);
+      if (_records.saysClosed()) return;
+    }
+    ErrorRef error;
+    if (!_files->isTidy() || !_files->syncItem(containersDirectory, &error)) return;
+    ChangeSet changes;
+    changes.setClosed();
+    Lock lock(_records);
+    _records.commit(std::move(changes), &error);
+  } catch (const std::exception&) {
+    // It is looked after, then.
   }
 
   void keepNotificationState(const std::string& name, std::uint64_t state) {

@@ -88,6 +88,11 @@ class DeviceRig {
   device::ManualEventQueue& events() { return *_events; }
   /// As a process that ends and another that comes. What was not delivered is lost.
   void reopen();
+  /// The same of one that has no time left to note that it is closed.
+  void endSuddenly() {
+    device().putOffInstalls();
+    reopen();
+  }
   /// Somebody else does `what` in the middle of the next such file operation.
   void meanwhile(const char* operation, std::function<void()> what);
   /// From now on the store takes nothing.

@@ -5,13 +5,17 @@ usage: command_line_tests.py TSD [unittest arguments]
 """
 
 import collections
+import contextlib
 import fcntl
+import glob
 import json
 import os
 import pathlib
 import re
 import shutil
+import sqlite3
 import subprocess
+import tempfile
 
 import tsd_folder
 from tsd_folder import BUSY, DONE, FAILED, USAGE, Folder, says, tree_of
@@ -111,10 +115,21 @@ def c_library():
     return re.search(r"\S+/libc\.so\.6$", pathlib.Path("/proc/self/maps").read_text(), re.MULTILINE)[0]
 
 
+def records_of(store):
+    """What the store remembers, in whatever order its file has it."""
+    with tempfile.TemporaryDirectory() as folder:
+        for file in glob.glob(glob.escape(store) + "*"):
+            shutil.copy(file, folder)
+        with contextlib.closing(sqlite3.connect(folder + "/device.db")) as database:
+            return set(database.execute("SELECT kind, key, value FROM records"))
+
+
 def picture():
     """All but the locks, which tell who holds them, and the runs that are kept."""
-    return {name: content for name, content in tree_of(".").items()
-            if not {"lock", "runs"} & set(name.split("/"))}
+    files = {name: content for name, content in tree_of(".").items()
+             if not {"lock", "runs"} & set(name.split("/"))}
+    return {name: records_of(name) if name == "dev/device.db" else content for name, content in files.items()
+            if not name.startswith("dev/device.db-")}
 
 
 class CommandLines(Folder):

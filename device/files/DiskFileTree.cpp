@@ -200,11 +200,16 @@ bool areOnOneFileSystem(int one, int other) {
 DiskFileTree::DiskFileTree(FileDescriptor root, std::shared_ptr<StepWatch> watch)
     : _root(std::move(root)), _flushable(openFlushable(_root.get())), _watch(std::move(watch)) {}
 
+bool DiskFileTree::answerChange(int failure, std::string_view path, ErrorRef* error) {
+  if (failure != 0 && failure != ENOENT) _isTidy = false;
+  return answerFileOperation(failure, path, error);
+}
+
 bool DiskFileTree::removeItem(std::string_view path, ErrorRef* error) {
   DiskPlace place;
   int failure = find(path, place);
   if (failure == 0) failure = place.remove();
-  return answerFileOperation(failure, path, error);
+  return answerChange(failure, path, error);
 }
 
 int DiskFileTree::makeDirectory(std::string_view path, bool intermediates, const Value& attributes) const {
@@ -242,7 +247,7 @@ bool DiskFileTree::copyItem(std::string_view from, std::string_view to, ErrorRef
   int failure = find(to, destination);
   if (failure == 0)
     failure = destination.replaceFile([&](const FileInWriting& file) { return copyContents(source.get(), file); });
-  return answerFileOperation(failure, to, error);
+  return answerChange(failure, to, error);
 }
 
 bool DiskFileTree::fileExists(std::string_view path, bool* isDirectory) {
@@ -266,7 +271,7 @@ bool DiskFileTree::putFile(std::string_view path, BytesView contents, const Valu
   int failure = find(path, place);
   if (failure == 0) failure = place.replaceFile([&](const FileInWriting& file) { return writeWhole(file, contents); });
   if (failure == 0) applyAttributes(place, attributes);
-  return answerFileOperation(failure, path, error);
+  return answerChange(failure, path, error);
 }
 
 int DiskFileTree::openFile(std::string_view path, FileDescriptor& file) const {
@@ -299,7 +304,7 @@ bool DiskFileTree::writeAtomically(std::string_view path, BytesView contents, Er
     });
   }
   if (failure == 0 && durability == Durability::lasting) failure = place.syncDirectory();
-  return answerFileOperation(failure, path, error);
+  return answerChange(failure, path, error);
 }
 
 int DiskFileTree::utimes(std::string_view path, int& errorNumber) {

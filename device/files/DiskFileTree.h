@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <memory>
 
 #include "device/files/DiskPlace.h"
@@ -37,8 +38,12 @@ class DiskFileTree final : public FileTree {
   std::unique_ptr<FileReader> openForReading(std::string_view path, platform::ErrorRef* error) override;
   bool syncDirectory(std::string_view path, platform::ErrorRef* error) override;
   bool syncItem(std::string_view path, platform::ErrorRef* error) override;
+  bool isTidy() const override { return _isTidy; }
 
  private:
+  /// The answer of a change that cleans up after itself, or removes something: whether that worked is not known when it
+  /// failed.
+  bool answerChange(int failure, std::string_view path, platform::ErrorRef* error);
   int find(std::string_view path, DiskPlace& place) const { return find(path, false, place); }
   int find(std::string_view path, bool makeDirectories, DiskPlace& place) const {
     return DiskPlace::find(_root, path, makeDirectories, _watch.get(), place);
@@ -53,6 +58,7 @@ class DiskFileTree final : public FileTree {
   const FileDescriptor _root;
   const FileDescriptor _flushable;  // the root again, if its file system can be flushed as a whole
   const std::shared_ptr<StepWatch> _watch;
+  std::atomic<bool> _isTidy{true};
 };
 
 }  // namespace device

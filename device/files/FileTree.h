@@ -65,6 +65,8 @@ class FileTree : public platform::FileSystem {
   virtual bool syncDirectory(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
   /// Makes a file's content durable, or all that is in a directory, and its entry in the directory that it is in.
   virtual bool syncItem(std::string_view path, platform::ErrorRef* error = nullptr) = 0;
+  /// False once an operation may have left something behind that it should have removed.
+  virtual bool isTidy() const { return true; }
 };
 
 /// The prefix of the temporary names that `writeAtomically` and the removal of a directory use; leftovers are removed

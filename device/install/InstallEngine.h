@@ -84,6 +84,7 @@ class InstallEngine {
   bool installFromPackage(std::string_view packagePath, platform::ErrorRef* error) EXCLUDES(recordsGuard);
   /// See `LocalDevice`.
   void putOffInstalls() { _putsOff = true; }
+  bool putsOff() const { return _putsOff; }
 
  private:
   bool edit(Coordinator& coordinator, const std::function<bool(CoordinatorRecord&)>& edit, platform::ErrorRef* error)

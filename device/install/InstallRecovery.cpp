@@ -28,11 +28,13 @@ void InstallRecovery::run(AppRecords::Loaded loaded, bool recovers) {
     for (const auto& [id, app] : _parts.records.state().apps) containers.insert(app.container);
   }
   if (!recovers) return;
-  _parts.containers.removeAllBut(containers);
-  removeTemporaryFiles(_parts.files);
+  if (!loaded.closed) {
+    _parts.containers.removeAllBut(containers);
+    removeTemporaryFiles(_parts.files);
+  }
   for (const auto& path : loaded.leftovers) removePackage(_parts, path);
   for (const auto& coordinator : interrupted) installAppAsset(_parts, coordinator);
-  removeLostPlaceholders();
+  if (!loaded.closed) removeLostPlaceholders();
 }
 
 bool InstallRecovery::isWhole(const AppRecord& placeholder) {

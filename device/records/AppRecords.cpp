@@ -13,6 +13,9 @@ namespace {
 
 using platform::Value;
 
+constexpr char deviceKind[] = "device";
+constexpr char closedKey[] = "closed";
+
 platform::OBApplicationProxyRef makeProxy(const AppRecord& app) {
   auto proxy = std::make_shared<platform::OBApplicationProxy>();
   proxy->bundleIdentifier = app.id;
@@ -174,6 +177,7 @@ void ChangeSet::setNotificationState(std::string_view name, std::uint64_t state)
 
 void ChangeSet::addLeftover(std::string_view path) { add({"leftover", std::string(path), true}, nullptr); }
 void ChangeSet::removeLeftover(std::string_view path) { add({"leftover", std::string(path), {}}, nullptr); }
+void ChangeSet::setClosed() { add({deviceKind, closedKey, true}, nullptr); }
 
 std::optional<AppRecords::Loaded> AppRecords::load(platform::ErrorRef* error) {
   Loaded loaded;
@@ -219,6 +223,10 @@ bool AppRecords::take(const StoreRecord& record, Loaded& loaded) {
     _state.notificationStates.insert_or_assign(record.key, record.value.unsignedInteger().value_or(0));
   if (record.kind == "uninstalled") _state.uninstalled.insert_or_assign(record.key, record.value);
   if (record.kind == "leftover") loaded.leftovers.push_back(record.key);
+  if (record.kind == deviceKind && record.key == closedKey) {
+    loaded.closed = _saysClosed = true;
+    _later.push_back({deviceKind, closedKey, {}});
+  }
   return true;
 }
 
@@ -243,6 +251,7 @@ bool AppRecords::keep(Keep keep, const ChangeSet& changes, platform::ErrorRef* e
   // A process that cannot take over what it has stored must not go on with what it had before.
   const auto takeOver = [&]() REQUIRES(recordsGuard) noexcept {
     _later.clear();
+    _saysClosed = false;
     for (const auto& step : changes._steps) {
       if (step.apply) step.apply(_state);
     }

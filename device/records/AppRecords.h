@@ -108,6 +108,9 @@ class ChangeSet {
   /// A file that is to be removed once this is committed; if that does not happen, the next opening removes it.
   void addLeftover(std::string_view path);
   void removeLeftover(std::string_view path);
+  /// The device is closed: nothing is half done, and every file that a record names is on disk. Goes with the next
+  /// change after the next opening.
+  void setClosed();
 
  private:
   friend class AppRecords;
@@ -148,6 +151,7 @@ class AppRecords {
   struct Loaded {
     std::vector<CoordinatorRecord> coordinators;
     std::vector<std::string> leftovers;
+    bool closed = false;  // the process before this one left nothing half done
   };
   /// Reads the store; once, before anything else. Nothing, with an error that names the record, when one cannot be
   /// understood.
@@ -162,6 +166,8 @@ class AppRecords {
   void commitLater(ChangeSet&& changes) REQUIRES(recordsGuard);
   /// Writes what `commitLater` kept back. False with an error when the store refuses; it is then still kept back.
   bool flush(platform::ErrorRef* error = nullptr) EXCLUDES(recordsGuard);
+  /// Whether the store says that the device is closed: nothing was changed since it was opened.
+  bool saysClosed() const REQUIRES(recordsGuard) { return _saysClosed; }
   /// How far a transfer has come. In memory only; goes to the store with the app's next change.
   void setFraction(std::string_view app, double fraction) REQUIRES(recordsGuard);
   /// The apps that were put or removed since this was last asked; for whoever keeps a view of them up to date.
@@ -177,6 +183,7 @@ class AppRecords {
   platform::Mutex _mutex;
   DeviceState _state GUARDED_BY(recordsGuard);
   std::vector<StoreRecord> _later GUARDED_BY(recordsGuard);
+  bool _saysClosed GUARDED_BY(recordsGuard) = false;
 };
 
 }  // namespace device

@@ -163,6 +163,7 @@ void DeviceSession::openRecording() {
 }
 
 platform::TSClient& DeviceSession::makeClient(const platform::Platform& platform) {
+  _device->flush();  // if the store refuses, the first change tells
   if (!_loader) {
     const std::string& chosen = _context.options.plugin;
     _loader.emplace(chosen.empty() ? PluginLoader::defaultFile() : chosen);
