@@ -123,6 +123,7 @@ bool PlaceholderInstall::put(std::optional<AppRecord> written, AbandonedContaine
   if (!isDemoted) app.progress = progressSoFar(state.record);
   auto record = state.record;
   record.placeholder = _placeholder;
+  record.placeholder->manifest = {};  // in the placeholder's own file from here on
   ChangeSet changes;
   changes.put(std::move(app));
   changes.removeOutcome(id);

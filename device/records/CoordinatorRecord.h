@@ -40,14 +40,14 @@ struct InstallOptionsRecord {
   std::uint64_t installTargetType = 0;
 };
 
-/// A placeholder as it was when it was attached.
+/// A placeholder as it was when it was attached, but for the manifest, which is in its files.
 struct PlaceholderRecord {
   std::string name;
   std::string app;
   std::uint64_t installType = 0;
   platform::RVClientIdentifier client = 0;
   bool configured = false;  // false: nothing of what follows counts
-  SharedValue manifest;
+  SharedValue manifest;  // a dictionary; absent: none, or the placeholder has been written
   std::optional<std::string> version;
   bool launchProhibited = false;
   SharedValue metadata;  // a dictionary; absent: none
