@@ -174,16 +174,8 @@ void EventReader::item(std::string& into, std::size_t depth) {
     }
     case Tag::list:
     case Tag::dictionary:
-    case Tag::error: {
-      std::size_t parts = 4;
-      if (static_cast<Tag>(tag) != Tag::error) {
-        parts = count(mostParts, "number of items");
-        appendVarint(into, parts);
-      }
-      if (static_cast<Tag>(tag) == Tag::dictionary) parts *= 2;
-      while (parts-- > 0) item(into, depth + 1);
-      return;
-    }
+    case Tag::error:
+      return container(into, static_cast<Tag>(tag), depth);
     case Tag::object: {
       into.push_back(static_cast<char>(byte()));
       appendVarint(into, varint());
@@ -193,6 +185,16 @@ void EventReader::item(std::string& into, std::size_t depth) {
       return;
     }
   }
+}
+
+void EventReader::container(std::string& into, Tag tag, std::size_t depth) {
+  std::size_t parts = 4;
+  if (tag != Tag::error) {
+    parts = count(mostParts, "number of items");
+    appendVarint(into, parts);
+  }
+  if (tag == Tag::dictionary) parts *= 2;
+  while (parts-- > 0) item(into, depth + 1);
 }
 
 void EventReader::known(std::string& into, std::uint8_t tag) {

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "record/Event.h"
+#include "record/Item.h"
 #include "record/KnownTexts.h"
 
 namespace record {
@@ -47,6 +48,7 @@ class EventReader {
   void place(Event& event);
   void enterInto(Event& event);
   void item(std::string& into, std::size_t depth);
+  void container(std::string& into, Tag tag, std::size_t depth);
   void known(std::string& into, std::uint8_t tag);
   void bounded(const std::string& payload) const;
   void appendSized(std::string& into, std::uint8_t tag, std::string_view bytes) const;

@@ -37,9 +37,9 @@ class ObjectOf : public T, public Numbered {
  protected:
   Crossing<T>& ownCrossing() { return _crossing; }
 
-  template <auto Method, class... Arguments>
+  template <auto method, class... Arguments>
   decltype(auto) call(const Operation& operation, Arguments&&... arguments) const {
-    return _crossing.template call<Method>(operation, this, std::forward<Arguments>(arguments)...);
+    return _crossing.template call<method>(operation, this, std::forward<Arguments>(arguments)...);
   }
 
  private:

@@ -40,7 +40,7 @@ struct Argument<ErrorRef*> {
 };
 
 /// Calls one operation of `target`, which may be null: then nobody is there any more to be called.
-template <auto Method, class R, class T, class... A>
+template <auto method, class R, class T, class... A>
 void callMethod(Replayer& replayer, ItemReader& arguments, ItemWriter& result, std::shared_ptr<T> target,
                 R (T::*)(A...)) {
   std::tuple<Argument<A>...> given;
@@ -48,7 +48,7 @@ void callMethod(Replayer& replayer, ItemReader& arguments, ItemWriter& result, s
     Lock lock(replayer.mutex);
     std::apply([&](auto&... each) { (each.read(replayer, arguments), ...); }, given);
   }
-  auto call = [&] { return std::apply([&](auto&... each) { return (target.get()->*Method)(each.pass()...); }, given); };
+  auto call = [&] { return std::apply([&](auto&... each) { return (target.get()->*method)(each.pass()...); }, given); };
   if constexpr (std::is_void_v<R>) {
     if (target) call();
     // Whoever was called may go with this, inside the call.
@@ -70,7 +70,7 @@ std::uint64_t receiver(ItemReader& arguments, ObjectKind kind) {
   return mention.number;
 }
 
-template <auto Method>
+template <auto method>
 void callClient(Replayer& replayer, ItemReader& arguments, ItemWriter& result) {
   const auto number = receiver(arguments, ObjectKind::client);
   std::shared_ptr<TSClient> target;
@@ -79,10 +79,10 @@ void callClient(Replayer& replayer, ItemReader& arguments, ItemWriter& result) {
     auto found = replayer.clients().find(number);
     if (found != replayer.clients().end()) target = found->second;
   }
-  callMethod<Method>(replayer, arguments, result, std::move(target), Method);
+  callMethod<method>(replayer, arguments, result, std::move(target), method);
 }
 
-template <auto Method>
+template <auto method>
 void callDelegate(Replayer& replayer, ItemReader& arguments, ItemWriter& result) {
   const auto number = receiver(arguments, ObjectKind::observer);
   std::shared_ptr<RVAppInstallObserverDelegate> target;
@@ -90,10 +90,10 @@ void callDelegate(Replayer& replayer, ItemReader& arguments, ItemWriter& result)
     Lock lock(replayer.mutex);
     target = replayer.observed(number).delegate.lock();
   }
-  callMethod<Method>(replayer, arguments, result, std::move(target), Method);
+  callMethod<method>(replayer, arguments, result, std::move(target), method);
 }
 
-template <auto Method>
+template <auto method>
 void callObserver(Replayer& replayer, ItemReader& arguments, ItemWriter& result) {
   const auto number = receiver(arguments, ObjectKind::observer);
   std::shared_ptr<OBApplicationWorkspaceObserverProtocol> target;
@@ -101,7 +101,7 @@ void callObserver(Replayer& replayer, ItemReader& arguments, ItemWriter& result)
     Lock lock(replayer.mutex);
     target = replayer.observed(number).workspace.lock();
   }
-  callMethod<Method>(replayer, arguments, result, std::move(target), Method);
+  callMethod<method>(replayer, arguments, result, std::move(target), method);
 }
 
 void create(Replayer& replayer, ItemReader&, ItemWriter& result) {

@@ -22,7 +22,7 @@ class RecordedObserver : public Protocol {
       : _recorder(std::move(recorder)), _target(std::move(target)), _number(number) {}
 
  protected:
-  template <auto Method, class... Arguments>
+  template <auto method, class... Arguments>
   void call(const Operation& operation, const Arguments&... arguments) {
     const auto recorder = _recorder.lock();
     if (!recorder) return;
@@ -32,7 +32,7 @@ class RecordedObserver : public Protocol {
           items.object({ObjectKind::observer, _number, 0});
         },
         [&](const auto&... seen) {
-          if (const auto target = _target.lock()) (target.get()->*Method)(seen...);
+          if (const auto target = _target.lock()) (target.get()->*method)(seen...);
         },
         arguments...);
   }

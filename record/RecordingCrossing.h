@@ -58,11 +58,11 @@ class RecordingCrossing {
 
   const std::shared_ptr<T>& target() const { return _target; }
 
-  template <auto Method, class... Arguments>
+  template <auto method, class... Arguments>
   auto call(const Operation& operation, const Numbered* receiver, Arguments&&... arguments) const {
     return callWith(
         operation, receiver,
-        [](T& target, auto&&... passed) { return (target.*Method)(std::forward<decltype(passed)>(passed)...); },
+        [](T& target, auto&&... passed) { return (target.*method)(std::forward<decltype(passed)>(passed)...); },
         std::forward<Arguments>(arguments)...);
   }
 

@@ -31,11 +31,11 @@ class RecordedClient final : public TSClient {
   }
   static const TSProgressCallback& given(const Callback<void(double)>& callback) { return callback.function; }
 
-  template <auto Method, class... Arguments>
+  template <auto method, class... Arguments>
   auto call(const Operation& operation, const Arguments&... arguments) {
     return callPlugin(
         *_recorder, operation, receiver(),
-        [this](const auto&... seen) { return (_target.get()->*Method)(given(seen)...); }, arguments...);
+        [this](const auto&... seen) { return (_target.get()->*method)(given(seen)...); }, arguments...);
   }
 
  public:

@@ -114,9 +114,9 @@ class ReplayCrossing {
  public:
   explicit ReplayCrossing(Replayer& replayer) : _replayer(replayer) {}
 
-  template <auto Method, class... Arguments>
+  template <auto method, class... Arguments>
   auto call(const Operation& operation, const Numbered* receiver, Arguments&&... arguments) const {
-    return answer<typename ResultOf<decltype(Method)>::Type>(operation, receiver, arguments...);
+    return answer<typename ResultOf<decltype(method)>::Type>(operation, receiver, arguments...);
   }
   template <class Body, class... Arguments>
   auto callWith(const Operation& operation, const Numbered* receiver, Body&&, Arguments&&... arguments) const {
@@ -145,8 +145,9 @@ class ReplayCrossing {
     return satisfied();
   }
 
-  void addObserver(const Operation& operation, std::weak_ptr<void> observer, platform::KBNotificationCallback callback,
-                   std::string_view name, const void*, platform::KBNotificationSuspensionBehavior suspension) const;
+  void addObserver(const Operation& operation, const std::weak_ptr<void>& observer,
+                   platform::KBNotificationCallback callback, std::string_view name, const void*,
+                   platform::KBNotificationSuspensionBehavior suspension) const;
   void removeObserver(const Operation& operation, const void* observer, std::string_view name) const;
 
  private:

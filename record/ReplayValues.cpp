@@ -231,7 +231,7 @@ platform::TSProgressCallback Read<platform::TSProgressCallback>::from(Replayer& 
 
 template <>
 void ReplayCrossing<platform::NotificationCenter>::addObserver(
-    const Operation& operation, std::weak_ptr<void> observer, platform::KBNotificationCallback callback,
+    const Operation& operation, const std::weak_ptr<void>& observer, platform::KBNotificationCallback callback,
     std::string_view name, const void*, platform::KBNotificationSuspensionBehavior suspension) const {
   platform::Mutex::Lock lock(_replayer.mutex);
   ItemWriter items;

@@ -202,7 +202,7 @@ void Replayer::leave(Player& player, const Event& entered, const std::string& re
   ++_result.events;
 }
 
-std::optional<std::string> Replayer::exchange(const Operation& operation, std::string arguments) {
+std::optional<std::string> Replayer::exchange(const Operation& operation, const std::string& arguments) {
   auto* player = static_cast<Player*>(currentPlayer);
   if (isOver() && player && player == _messenger) return afterEnd(operation, arguments);
   if (isOver() || !player || ignores(operation)) return std::nullopt;

@@ -52,7 +52,7 @@ class Replayer : public Names {
 
   /// A call of the plug-in with these arguments: the recorded answer; nothing when there is none. Throws what the
   /// service threw.
-  std::optional<std::string> exchange(const Operation& operation, std::string arguments) REQUIRES(mutex);
+  std::optional<std::string> exchange(const Operation& operation, const std::string& arguments) REQUIRES(mutex);
   /// The plug-in goes on waiting where it had not to.
   void stands(const Operation& operation) REQUIRES(mutex);
   /// The recording holds what no recording holds.

@@ -31,9 +31,9 @@ class ServiceOf : public T {
   explicit ServiceOf(Crossing<T> crossing) : _crossing(std::move(crossing)) {}
 
  protected:
-  template <auto Method, class... Arguments>
+  template <auto method, class... Arguments>
   decltype(auto) call(const Operation& operation, Arguments&&... arguments) const {
-    return _crossing.template call<Method>(operation, nullptr, std::forward<Arguments>(arguments)...);
+    return _crossing.template call<method>(operation, nullptr, std::forward<Arguments>(arguments)...);
   }
   const Crossing<T>& crossing() const { return _crossing; }
 

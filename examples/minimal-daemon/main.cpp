@@ -75,13 +75,22 @@ constexpr const char* mapsPackage = R"(<plist version="1.0"><dict>
   <key>KBBundleVersion</key><string>1.0</string>
 </dict></plist>)";
 
+/// The app's package as the host sends it, put where the device finds it; the reason if it does not come.
+platform::ErrorRef send(tiny::MemoryFiles& files, platform::TSAsset& asset) {
+  if (asset.identifier() != "com.example.maps") return platform::makeError("Example", 1, "no such package");
+  const std::string path = "/var/mobile/Media/PublicStaging/Packages/" + asset.identifier() + ".pkg";
+  platform::ErrorRef error;
+  files.writeAtomically(path, mapsPackage, &error);
+  asset.setPath(path);
+  return error;
+}
+
 int main(int count, char** arguments) {
   tiny::TinyDevice device;
   tiny::MemoryFiles& files = device.files();
   constexpr const char* staging = "/var/mobile/Media/PublicStaging/ApplicationSync";
-  constexpr const char* packages = "/var/mobile/Media/PublicStaging/Packages";
   files.createDirectory(staging, true, {});
-  files.createDirectory(packages, true, {});
+  files.createDirectory("/var/mobile/Media/PublicStaging/Packages", true, {});
   files.writeAtomically(std::string(staging) + "/ApplicationsSync.plist", todoList);
 
   const char* library = count > 1 ? arguments[1] : PLUGIN;
@@ -107,12 +116,7 @@ int main(int count, char** arguments) {
         std::printf("asked for %s, shown as \"%s\"\n", asset.identifier().c_str(),
                     asset.prettyName().value_or("").c_str());
         progress(0.5);
-        if (asset.identifier() != "com.example.maps") return platform::makeError("Example", 1, "no such package");
-        std::string path = std::string(packages) + "/" + asset.identifier() + ".pkg";
-        platform::ErrorRef error;
-        files.writeAtomically(path, mapsPackage, &error);
-        asset.setPath(path);
-        return error;
+        return send(files, asset);
       },
       [&] { device.events().deliver(); });
 
