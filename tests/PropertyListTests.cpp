@@ -126,6 +126,7 @@ TEST(PropertyList, RefusesXML) {
       {xml("<key>a</key>")},
       {xml("<null/>"), malformed, "\"null\""},
       {xml("<array>x</array>"), malformed, "\"x\""},
+      {xml("<array><true/>x</array>"), malformed, "\"x\""},
       {xml("<true>x</true>")},
       {xml("<string><true/></string>")},
       {xml("<dict><true/></dict>"), malformed, "without a key"},
