@@ -85,6 +85,12 @@ platform::ErrorRef send(tiny::MemoryFiles& files, platform::TSAsset& asset) {
   return error;
 }
 
+void tell(tiny::TinyDevice& device) {
+  for (const char* app : {"com.example.maps", "com.example.notes"}) {
+    std::printf("%s is %s\n", app, device.registry().applicationIsInstalled(app) ? "installed" : "not installed");
+  }
+}
+
 int main(int count, char** arguments) {
   tiny::TinyDevice device;
   tiny::MemoryFiles& files = device.files();
@@ -120,9 +126,7 @@ int main(int count, char** arguments) {
       },
       [&] { device.events().deliver(); });
 
-  for (const char* app : {"com.example.maps", "com.example.notes"}) {
-    std::printf("%s is %s\n", app, device.registry().applicationIsInstalled(app) ? "installed" : "not installed");
-  }
+  tell(device);
   plugin.reset();
   device.events().deliver();  // what is still on its way ends before the services do
   return all ? 0 : 3;
