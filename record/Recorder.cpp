@@ -169,6 +169,12 @@ void Recorder::finish() {
   giveBaton();
 }
 
+void Recorder::release() {
+  takeBaton();
+  const auto kept = std::exchange(_kept, {});
+  giveBaton();
+}
+
 bool Recorder::failed() {
   takeBaton();
   const bool failed = _writer.failed();

@@ -87,7 +87,7 @@ class Recorder : public Names, public std::enable_shared_from_this<Recorder> {
   /// What wrappers there are of objects: found by the object while they live. With the baton in hand.
   std::shared_ptr<void> wrapperOf(const void* target) const;
   void setWrapper(const void* target, const std::shared_ptr<void>& wrapper);
-  /// Keeps something as long as the recorder lives.
+  /// Keeps something until the platform goes.
   void keep(std::shared_ptr<void> object) { _kept.push_back(std::move(object)); }
   /// Wrappers of what the plug-in lets others hold weakly: they go when the plug-in's own object has gone. Null when
   /// there is none; without an owner that of the object that was last at the address.
@@ -102,6 +102,8 @@ class Recorder : public Names, public std::enable_shared_from_this<Recorder> {
 
   /// Ends the recording in order; what happens afterwards is not in it.
   void finish();
+  /// The platform goes, after the plug-in's object: lets go of what was kept, which may hold the recorder itself.
+  void release();
   /// Whether the sink has refused.
   bool failed();
 

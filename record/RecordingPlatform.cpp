@@ -147,7 +147,10 @@ class Recording final : public RecordingPlatform {
         _services([&]<class T>() { return RecordingCrossing<T>(_recorder, borrowed(serviceOf<T>(platform))); }) {
     _recorder->setNotifications(_services.notifications);
   }
-  ~Recording() override { _recorder->finish(); }
+  ~Recording() override {
+    _recorder->finish();
+    _recorder->release();
+  }
 
   const Platform& platform() const override { return _services.platform; }
 
