@@ -75,7 +75,7 @@ std::optional<AppRecord> PackageInstall::unpackInto(const std::string& container
 
 bool PackageInstall::run(ErrorRef* error) {
   setError(error, nullptr);
-  _parts.records.flush();  // files come now that no record names: the device is no longer said to be closed
+  _parts.records.takeBackClosed();  // files come now that no record names
   ErrorRef reason;
   auto id = _request.app;
   bool installed = false;

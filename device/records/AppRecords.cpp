@@ -273,6 +273,11 @@ bool AppRecords::flush(platform::ErrorRef* error) {
   return _later.empty() || commit({}, error);
 }
 
+void AppRecords::takeBackClosed() {
+  Lock lock(*this);
+  if (_saysClosed) commit({});
+}
+
 void AppRecords::setFraction(std::string_view app, double fraction) {
   auto found = _state.apps.find(app);
   if (found != _state.apps.end() && found->second.progress) found->second.progress->fraction = fraction;

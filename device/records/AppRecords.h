@@ -168,6 +168,8 @@ class AppRecords {
   bool flush(platform::ErrorRef* error = nullptr) EXCLUDES(recordsGuard);
   /// Whether the store says that the device is closed: nothing was changed since it was opened.
   bool saysClosed() const REQUIRES(recordsGuard) { return _saysClosed; }
+  /// Has the store say so no longer; what it refuses goes with the next change.
+  void takeBackClosed() EXCLUDES(recordsGuard);
   /// How far a transfer has come. In memory only; goes to the store with the app's next change.
   void setFraction(std::string_view app, double fraction) REQUIRES(recordsGuard);
   /// The apps that were put or removed since this was last asked; for whoever keeps a view of them up to date.
