@@ -47,7 +47,7 @@ struct PlaceholderRecord {
   std::uint64_t installType = 0;
   platform::RVClientIdentifier client = 0;
   bool configured = false;  // false: nothing of what follows counts
-  SharedValue manifest;  // a dictionary; absent: none, or the placeholder has been written
+  SharedValue manifest;     // a dictionary; absent: none, or the placeholder has been written
   std::optional<std::string> version;
   bool launchProhibited = false;
   SharedValue metadata;  // a dictionary; absent: none
