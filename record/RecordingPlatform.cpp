@@ -2,8 +2,8 @@
 
 #include <utility>
 
-#include "record/RecordingCrossing.h"
-#include "record/Services.h"
+#include "record/calls/Services.h"
+#include "record/recording/RecordingCrossing.h"
 
 namespace record {
 

@@ -3,9 +3,9 @@
 #include <set>
 #include <unordered_map>
 
-#include "record/CallText.h"
-#include "record/EventReader.h"
-#include "record/Story.h"
+#include "record/replaying/Story.h"
+#include "record/stream/CallText.h"
+#include "record/stream/EventReader.h"
 
 namespace record {
 

@@ -1,7 +1,7 @@
 #include <type_traits>
 #include <utility>
 
-#include "record/RecordingCrossing.h"
+#include "record/recording/RecordingCrossing.h"
 
 namespace record {
 

@@ -5,8 +5,8 @@
 #include <string>
 #include <string_view>
 
-#include "record/Event.h"
 #include "record/Operation.h"
+#include "record/stream/Event.h"
 
 namespace record {
 

@@ -1,13 +1,13 @@
-#include "record/EventReader.h"
+#include "record/stream/EventReader.h"
 
 #include <zstd.h>
 
 #include <new>
 #include <utility>
 
-#include "record/Item.h"
 #include "record/RecordingError.h"
-#include "record/StreamFormat.h"
+#include "record/stream/Item.h"
+#include "record/stream/StreamFormat.h"
 
 namespace record {
 

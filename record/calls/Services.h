@@ -20,7 +20,7 @@
 #include "platform/PropertyListSerialization.h"
 #include "platform/TSDeviceService.h"
 #include "platform/TSSupport.h"
-#include "record/Objects.h"
+#include "record/calls/Objects.h"
 
 /// The services, as the plug-in sees them while it is recorded or replayed; see Objects.h.
 namespace record {

@@ -1,4 +1,4 @@
-#include "record/Names.h"
+#include "record/stream/Names.h"
 
 #include <algorithm>
 

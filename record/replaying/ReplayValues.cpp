@@ -1,7 +1,7 @@
 #include <cstring>
 #include <utility>
 
-#include "record/ReplayCrossing.h"
+#include "record/replaying/ReplayCrossing.h"
 
 namespace record {
 

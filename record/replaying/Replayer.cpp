@@ -1,4 +1,4 @@
-#include "record/Replayer.h"
+#include "record/replaying/Replayer.h"
 
 #include <fcntl.h>
 #include <sys/syscall.h>
@@ -9,11 +9,11 @@
 #include <stdexcept>
 #include <utility>
 
-#include "record/CallText.h"
 #include "record/RecordingError.h"
-#include "record/ReplayCrossing.h"
-#include "record/Services.h"
-#include "record/Story.h"
+#include "record/calls/Services.h"
+#include "record/replaying/ReplayCrossing.h"
+#include "record/replaying/Story.h"
+#include "record/stream/CallText.h"
 
 namespace record {
 

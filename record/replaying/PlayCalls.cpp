@@ -2,7 +2,7 @@
 #include <tuple>
 #include <utility>
 
-#include "record/ReplayCrossing.h"
+#include "record/replaying/ReplayCrossing.h"
 
 namespace record {
 

@@ -11,11 +11,11 @@
 
 #include "platform/Clock.h"
 #include "platform/TSClient.h"
-#include "record/Codec.h"
-#include "record/Inbound.h"
-#include "record/Objects.h"
 #include "record/RecordingError.h"
-#include "record/Replayer.h"
+#include "record/calls/Inbound.h"
+#include "record/calls/Objects.h"
+#include "record/replaying/Replayer.h"
+#include "record/stream/Codec.h"
 
 /// What a service's operation does while it is replayed: its arguments are compared, and its answer is read.
 namespace record {

@@ -15,10 +15,10 @@
 #include "platform/Mutex.h"
 #include "platform/NotificationCenter.h"
 #include "platform/ThreadSafety.h"
-#include "record/EventWriter.h"
-#include "record/Names.h"
 #include "record/Operation.h"
 #include "record/Sink.h"
+#include "record/stream/EventWriter.h"
+#include "record/stream/Names.h"
 
 namespace record {
 

@@ -13,9 +13,9 @@
 #include "platform/FileSystem.h"
 #include "platform/IconRenderer.h"
 #include "platform/StringSet.h"
-#include "record/Arguments.h"
-#include "record/Item.h"
-#include "record/Names.h"
+#include "record/calls/Arguments.h"
+#include "record/stream/Item.h"
+#include "record/stream/Names.h"
 
 namespace record {
 

@@ -1,4 +1,4 @@
-#include "record/Codec.h"
+#include "record/stream/Codec.h"
 
 namespace record {
 

@@ -1,4 +1,4 @@
-#include "record/Recorder.h"
+#include "record/recording/Recorder.h"
 
 #include <algorithm>
 #include <exception>

@@ -14,10 +14,10 @@
 #include "platform/OBApplicationWorkspace.h"
 #include "platform/TSClient.h"
 #include "platform/TSSupport.h"
-#include "record/Codec.h"
-#include "record/Inbound.h"
-#include "record/Objects.h"
-#include "record/Recorder.h"
+#include "record/calls/Inbound.h"
+#include "record/calls/Objects.h"
+#include "record/recording/Recorder.h"
+#include "record/stream/Codec.h"
 
 /// What a service's operation does while it is recorded: it writes the arguments, calls the real object, and writes its
 /// answer. What goes over in between is translated: the plug-in sees wrappers of the services' objects, the services

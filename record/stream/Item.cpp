@@ -1,4 +1,4 @@
-#include "record/Item.h"
+#include "record/stream/Item.h"
 
 #include <bit>
 #include <cstring>

@@ -1,11 +1,11 @@
-#include "record/EventWriter.h"
+#include "record/stream/EventWriter.h"
 
 #include <zstd.h>
 
 #include <new>
 #include <utility>
 
-#include "record/StreamFormat.h"
+#include "record/stream/StreamFormat.h"
 
 namespace record {
 

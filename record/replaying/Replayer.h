@@ -20,10 +20,10 @@
 #include "platform/OBApplicationWorkspace.h"
 #include "platform/SystemLog.h"
 #include "platform/ThreadSafety.h"
-#include "record/EventReader.h"
-#include "record/Item.h"
-#include "record/Names.h"
 #include "record/Replay.h"
+#include "record/stream/EventReader.h"
+#include "record/stream/Item.h"
+#include "record/stream/Names.h"
 
 namespace record {
 

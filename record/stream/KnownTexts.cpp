@@ -1,4 +1,4 @@
-#include "record/KnownTexts.h"
+#include "record/stream/KnownTexts.h"
 
 #include <algorithm>
 #include <cstring>

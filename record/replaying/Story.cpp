@@ -1,11 +1,11 @@
-#include "record/Story.h"
+#include "record/replaying/Story.h"
 
 #include <algorithm>
 #include <deque>
 #include <map>
 
-#include "record/CallText.h"
 #include "record/RecordingError.h"
+#include "record/stream/CallText.h"
 
 namespace record {
 

@@ -1,13 +1,13 @@
-#include "record/CallText.h"
+#include "record/stream/CallText.h"
 
 #include <algorithm>
 #include <charconv>
 
 #include "platform/DateText.h"
 #include "plist/Unicode.h"
-#include "record/Item.h"
 #include "record/RecordingError.h"
-#include "record/Story.h"
+#include "record/replaying/Story.h"
+#include "record/stream/Item.h"
 
 namespace record {
 

@@ -7,10 +7,10 @@
 #include <unordered_map>
 #include <vector>
 
-#include "record/Event.h"
-#include "record/EventReader.h"
-#include "record/Item.h"
 #include "record/Replay.h"
+#include "record/stream/Event.h"
+#include "record/stream/EventReader.h"
+#include "record/stream/Item.h"
 
 namespace record {
 

@@ -15,9 +15,9 @@
 #include "platform/RVPromise.h"
 #include "platform/SystemLog.h"
 #include "platform/TSAccountInfo.h"
-#include "record/Codec.h"
-#include "record/Names.h"
 #include "record/Operation.h"
+#include "record/stream/Codec.h"
+#include "record/stream/Names.h"
 
 /// The objects of services, as the plug-in sees them while it is recorded or replayed. Every operation is listed here
 /// once; `Crossing` is what it does: it calls the real object and writes what went over, or it answers from a

@@ -9,7 +9,7 @@
 
 #include "platform/OBApplicationProxy.h"
 #include "platform/TSAsset.h"
-#include "record/Item.h"
+#include "record/stream/Item.h"
 
 namespace record {
 

@@ -6,10 +6,10 @@
 #include <string_view>
 #include <vector>
 
-#include "record/Event.h"
-#include "record/Item.h"
-#include "record/KnownTexts.h"
 #include "record/Sink.h"
+#include "record/stream/Event.h"
+#include "record/stream/Item.h"
+#include "record/stream/KnownTexts.h"
 
 namespace record {
 

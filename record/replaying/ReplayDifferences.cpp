@@ -1,8 +1,8 @@
 #include <algorithm>
 #include <utility>
 
-#include "record/CallText.h"
-#include "record/Replayer.h"
+#include "record/replaying/Replayer.h"
+#include "record/stream/CallText.h"
 
 /// How a call that is not the recorded one is taken.
 namespace record {
