@@ -8,7 +8,7 @@
 namespace record {
 
 /// The version of recordings that this code writes; it reads this one and every earlier one.
-constexpr std::uint64_t recordingVersion = 1;
+constexpr std::uint64_t recordingVersion = 2;
 constexpr std::string_view recordingMagic = "TSRECORD";
 
 /// What happens at the boundary of the plug-in. In a recording the events of all threads stand in the order in which

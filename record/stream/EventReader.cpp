@@ -2,6 +2,7 @@
 
 #include <zstd.h>
 
+#include <algorithm>
 #include <new>
 #include <utility>
 
@@ -199,41 +200,78 @@ void EventReader::container(std::string& into, Tag tag, std::size_t depth) {
 
 void EventReader::known(std::string& into, std::uint8_t tag) {
   const auto of = static_cast<Tag>(tag);
-  if (of != Tag::text && of != Tag::data && of != Tag::packed) refuse("an item has an unknown tag");
+  const bool isSized = of == Tag::text || of == Tag::data || of == Tag::packed;
+  if (!isSized && of != Tag::list) refuse("an item has an unknown tag");
+  const auto how = static_cast<Known>(byte());
+  if (!isSized && (how == Known::medium || how == Known::newMedium)) refuse("a list is known as a text");
   std::string bytes;
-  switch (static_cast<Known>(byte())) {
+  switch (how) {
     case Known::medium: {
       const std::uint64_t place = varint();
-      if (place >= _known.mediumCount()) refuse("a text is not known");
-      return appendSized(into, tag, _known.medium(place));
+      if (place >= _known.count()) refuse("a text is not known");
+      return appendSized(into, tag, _known[place]);
     }
     case Known::newMedium: {
-      copy(bytes, count(KnownTexts::largeFrom, "length"));
+      copy(bytes, count(KnownTexts::end, "length"));
       _known.add(bytes, false);
       return appendSized(into, tag, bytes);
     }
-    case Known::large: {
-      const std::uint64_t slot = varint();
-      if (slot >= _known.largeCount()) refuse("bytes are not known");
-      return appendSized(into, tag, _known.use(slot));
-    }
+    case Known::large:
+      return appendLarge(into, tag, _heard.use(slot()));
     case Known::newLarge:
-      copy(bytes, count(KnownTexts::largestKept, "length"));
-      return appendSized(into, tag, _known.keep(std::move(bytes)));
+      copy(bytes, count(LargeTexts::largestKept, "length"));
+      return appendLarge(into, tag, _heard.keep(std::make_shared<LargeText>(std::move(bytes))));
     case Known::changed: {
-      const std::uint64_t slot = varint();
-      if (slot >= _known.largeCount()) refuse("bytes are not known");
-      const std::string& base = _known.large(slot);
+      const std::size_t base = slot();
+      const std::size_t size = _heard.at(base)->size();
       const std::uint64_t begin = varint();
       const std::uint64_t end = varint();
-      if (begin > base.size() || end > base.size() - begin) refuse("bytes are longer than those they are made of");
-      bytes.append(base, 0, begin);
-      copy(bytes, count(KnownTexts::largestKept - begin - end, "length"));
-      bytes.append(base, base.size() - end, end);
-      return appendSized(into, tag, _known.keep(std::move(bytes)));
+      if (begin > size || end > size - begin) refuse("bytes are longer than those they are made of");
+      copy(bytes, count(LargeTexts::largestKept - begin - end, "length"));
+      return appendLarge(into, tag, _heard.keep(_heard.changed(base, begin, end, std::move(bytes))));
     }
+    case Known::edited:
+      return appendLarge(into, tag, _heard.keep(edited()));
   }
   refuse("a text is known in no way there is");
+}
+
+std::size_t EventReader::slot() {
+  const std::uint64_t slot = varint();
+  if (slot >= _heard.count()) refuse("bytes are not known");
+  return slot;
+}
+
+LargeTextRef EventReader::edited() {
+  ListEditing list(_heard.at(slot()));
+  for (std::size_t edits = count(LargeTexts::mostElements, "number of edits"); edits > 0; --edits) {
+    LargeText::Edit edit{};
+    for (auto* number : {&edit.keep, &edit.drop, &edit.insert})
+      *number = count(LargeTexts::mostElements, "number of elements");
+    list.edit(edit);
+    for (std::size_t left = edit.insert; left > 0; --left) {
+      std::size_t begin = 0, end = 0;
+      if (list.comesForAnother()) {
+        begin = count(LargeTexts::largestKept, "length");
+        end = count(LargeTexts::largestKept, "length");
+      }
+      std::string between;
+      copy(between, count(LargeTexts::largestKept, "length"));
+      list.element(begin, end, between);
+    }
+  }
+  return list.finish();
+}
+
+void EventReader::appendLarge(std::string& into, std::uint8_t tag, const LargeTextRef& text) {
+  if (static_cast<Tag>(tag) == Tag::list) {
+    if (!text->splitIntoElements()) refuse("a list is none");
+  } else {
+    into.push_back(static_cast<char>(tag));
+    appendVarint(into, text->size());
+  }
+  if (text->size() > largestPayload - std::min(largestPayload, into.size())) refuse("an event is too large");
+  text->appendTo(into);
 }
 
 bool EventReader::refill() {

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "record/stream/Event.h"
+#include "record/stream/HeardTexts.h"
 #include "record/stream/Item.h"
 #include "record/stream/KnownTexts.h"
 
@@ -50,6 +51,9 @@ class EventReader {
   void item(std::string& into, std::size_t depth);
   void container(std::string& into, Tag tag, std::size_t depth);
   void known(std::string& into, std::uint8_t tag);
+  std::size_t slot();
+  LargeTextRef edited();
+  void appendLarge(std::string& into, std::uint8_t tag, const LargeTextRef& text);
   void bounded(const std::string& payload) const;
   void appendSized(std::string& into, std::uint8_t tag, std::string_view bytes) const;
 
@@ -63,6 +67,7 @@ class EventReader {
   std::unique_ptr<Decompression> _decompression;
   std::string_view _window;  // what is decompressed and not read yet
   KnownTexts _known;
+  HeardTexts _heard;
   std::vector<std::string> _threads;
   std::vector<OperationName> _operations;
   std::vector<std::vector<Frame>> _frames;

@@ -84,19 +84,16 @@ void EventWriter::item(ItemReader& from) {
     case Tag::packed:
       from.tag();
       return sized(tag, from.bytes(from.varint()));
-    case Tag::list:
-    case Tag::dictionary:
-    case Tag::error: {
-      _pending.push_back(static_cast<char>(from.tag()));
-      std::uint64_t count = 4;
-      if (tag != Tag::error) {
-        count = from.varint();
-        appendVarint(_pending, count);
-      }
-      if (tag == Tag::dictionary) count *= 2;
-      while (count-- > 0) item(from);
-      return;
+    case Tag::list: {
+      ItemReader again(from);
+      const std::string_view list = again.skip();
+      if (list.size() < LargeTexts::listFrom || list.size() > LargeTexts::largestKept) return parts(from);
+      from = again;
+      return large(tag, list);
     }
+    case Tag::dictionary:
+    case Tag::error:
+      return parts(from);
     case Tag::object: {
       const std::string_view before = from.rest();
       const bool hasFacts = from.object().flags & ObjectMention::hasFacts;
@@ -109,10 +106,22 @@ void EventWriter::item(ItemReader& from) {
   }
 }
 
+void EventWriter::parts(ItemReader& from) {
+  const Tag tag = from.peek();
+  _pending.push_back(static_cast<char>(from.tag()));
+  std::uint64_t count = 4;
+  if (tag != Tag::error) {
+    count = from.varint();
+    appendVarint(_pending, count);
+  }
+  if (tag == Tag::dictionary) count *= 2;
+  while (count-- > 0) item(from);
+}
+
 void EventWriter::sized(Tag tag, std::string_view bytes) {
-  if (KnownTexts::isKeptLarge(bytes.size())) return large(tag, bytes);
+  if (LargeTexts::isKept(bytes.size())) return large(tag, bytes);
   const auto known = static_cast<char>(static_cast<std::uint8_t>(tag) | stream::knownBit);
-  if (!KnownTexts::isMedium(bytes.size())) {
+  if (!KnownTexts::isKept(bytes.size())) {
     _pending.push_back(static_cast<char>(tag));
   } else if (auto place = _known.find(bytes)) {
     _pending.push_back(known);
@@ -129,25 +138,51 @@ void EventWriter::sized(Tag tag, std::string_view bytes) {
 
 void EventWriter::large(Tag tag, std::string_view bytes) {
   _pending.push_back(static_cast<char>(static_cast<std::uint8_t>(tag) | stream::knownBit));
-  const auto like = _known.like(bytes);
+  const bool mayBeList = tag == Tag::packed || tag == Tag::list;
+  if (mayBeList) {
+    if (auto likeness = _large.likeList(bytes)) return edited(std::move(*likeness), bytes);
+  }
+  const auto like = _large.like(bytes);
   if (!like) {
     _pending.push_back(static_cast<char>(Known::newLarge));
     appendVarint(_pending, bytes.size());
     _pending.append(bytes);
-    _known.keep(std::string(bytes));
-    return;
+  } else if (like->begin == bytes.size() && _large.sizeOf(like->slot) == bytes.size()) {
+    return same(like->slot);
+  } else {
+    const std::size_t changed = bytes.size() - like->begin - like->end;
+    _pending.push_back(static_cast<char>(Known::changed));
+    for (std::size_t number : {like->slot, like->begin, like->end, changed}) appendVarint(_pending, number);
+    _pending.append(bytes.substr(like->begin, changed));
   }
-  const std::size_t changed = bytes.size() - like->begin - like->end;
-  if (changed == 0 && _known.large(like->slot).size() == bytes.size()) {
-    _pending.push_back(static_cast<char>(Known::large));
-    appendVarint(_pending, like->slot);
-    _known.use(like->slot);
-    return;
+  _large.keep(bytes, mayBeList ? elementPlaces(bytes) : std::vector<std::uint32_t>());
+}
+
+void EventWriter::same(std::size_t slot) {
+  _pending.push_back(static_cast<char>(Known::large));
+  appendVarint(_pending, slot);
+  _large.use(slot);
+}
+
+void EventWriter::edited(LargeTexts::ListLikeness&& likeness, std::string_view list) {
+  if (likeness.edits.empty() && _large.sizeOf(likeness.slot) == list.size()) return same(likeness.slot);
+  _pending.push_back(static_cast<char>(Known::edited));
+  appendVarint(_pending, likeness.slot);
+  appendVarint(_pending, likeness.edits.size());
+  for (const auto& edit : likeness.edits) {
+    for (std::size_t number : {edit.keep, edit.drop, edit.insert.size()}) appendVarint(_pending, number);
+    std::size_t left = edit.drop;
+    for (const auto& element : edit.insert) {
+      if (left > 0) {
+        --left;
+        appendVarint(_pending, element.begin);
+        appendVarint(_pending, element.end);
+      }
+      appendVarint(_pending, element.between.size());
+      _pending.append(element.between);
+    }
   }
-  _pending.push_back(static_cast<char>(Known::changed));
-  for (std::size_t number : {like->slot, like->begin, like->end, changed}) appendVarint(_pending, number);
-  _pending.append(bytes.substr(like->begin, changed));
-  _known.keep(std::string(bytes));
+  _large.keep(list, std::move(likeness.places));
 }
 
 void EventWriter::flush() { compress(true, false); }

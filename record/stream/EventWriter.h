@@ -10,6 +10,7 @@
 #include "record/stream/Event.h"
 #include "record/stream/Item.h"
 #include "record/stream/KnownTexts.h"
+#include "record/stream/LargeTexts.h"
 
 namespace record {
 
@@ -37,14 +38,18 @@ class EventWriter {
  private:
   struct Compression;
 
-  void item(class ItemReader& from);
+  void item(ItemReader& from);
+  void parts(ItemReader& from);
   void sized(Tag tag, std::string_view bytes);
   void large(Tag tag, std::string_view bytes);
+  void same(std::size_t slot);
+  void edited(LargeTexts::ListLikeness&& likeness, std::string_view list);
   void compress(bool flushed, bool ended);
 
   std::shared_ptr<Sink> _sink;
   std::unique_ptr<Compression> _compression;
   KnownTexts _known;
+  LargeTexts _large;
   std::string _pending;
   std::uint32_t _threads = 0;
   std::uint32_t _operations = 0;

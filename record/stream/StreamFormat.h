@@ -27,6 +27,8 @@ enum class Known : std::uint8_t {
   large,      // slot
   newLarge,   // length, bytes: from now on in slot 0
   changed,    // slot, bytes that are the same at its beginning, at its end, length, bytes between: now in slot 0
+  edited,  // slot of a list, edits: now in slot 0. Of each: elements that stay, that go, that come; of each that comes
+           // for one that went, its bytes that stay in front and behind; of each that comes, length, bytes
 };
 
 }  // namespace record::stream
