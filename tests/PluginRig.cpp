@@ -107,16 +107,24 @@ PluginRig::PluginRig(const Options& options, std::unique_ptr<device::FileTree> f
   load();
 }
 
-/// One file for the life of the rig, for the tests that hold journals against the rules.
-void PluginRig::openJournal() {
+/// In the folder that the environment names, if it does: a name that is no other rig's.
+static std::optional<std::string> newFile(const char* variable, const std::string& suffix) {
   static std::atomic<int> number = 0;
-  const char* folder = std::getenv("APPSYNC_JOURNALS");
-  if (!folder || !_options.journaled) return;
+  const char* folder = std::getenv(variable);
+  if (!folder) return std::nullopt;
   const auto* test = ::testing::UnitTest::GetInstance()->current_test_info();
   std::string name = test ? std::string(test->test_suite_name()) + "." + test->name() : "rig";
   std::replace(name.begin(), name.end(), '/', '-');
-  _journal.open(std::string(folder) + "/" + name + "." + std::to_string(++number) + ".jsonl");
-  EXPECT_TRUE(_journal.is_open()) << folder;
+  return std::string(folder) + "/" + name + "." + std::to_string(++number) + suffix;
+}
+
+/// One file for the life of the rig, for the tests that hold journals against the rules.
+void PluginRig::openJournal() {
+  if (!_options.journaled) return;
+  const auto path = newFile("APPSYNC_JOURNALS", ".jsonl");
+  if (!path) return;
+  _journal.open(*path);
+  EXPECT_TRUE(_journal.is_open()) << *path;
 }
 
 void PluginRig::open() {
@@ -148,6 +156,7 @@ void PluginRig::open() {
 
 void PluginRig::reopen() {
   unload();
+  _recordings.clear();
   _device = nullptr;
   open();
   load();
@@ -165,8 +174,20 @@ PluginRig::~PluginRig() {
 }
 
 void PluginRig::load() {
-  _client = _plugin.create(platform());
+  _client = makeClient(platform());
   _daemon.emplace(*_device, *_client);
+}
+
+std::shared_ptr<platform::TSClient> PluginRig::makeClient(const platform::Platform& platform) {
+  const auto path = newFile("APPSYNC_RECORDINGS", ".recording");
+  if (!path) return _plugin.create(platform);
+  ErrorRef error;
+  auto sink = record::makeFileSink(*path, &error);
+  EXPECT_TRUE(sink) << error->describe();
+  if (!sink) return _plugin.create(platform);
+  _recordings.push_back(
+      record::recordingPlatform(platform, std::move(sink), {.threadName = device::currentThreadName}));
+  return _recordings.back()->makeClient([this](const platform::Platform& seen) { return _plugin.create(seen); });
 }
 
 void PluginRig::unload() {

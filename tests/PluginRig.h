@@ -13,6 +13,7 @@
 #include "platform/TSClient.h"
 #include "platform/TSDeviceService.h"
 #include "platform/ThreadSafety.h"
+#include "record/RecordingPlatform.h"
 #include "tests/SampleContent.h"
 #include "tests/SharedParts.h"
 #include "tsd/daemon/Daemon.h"
@@ -99,6 +100,9 @@ class PluginRig {
 
   /// Makes the plug-in object, as the daemon does at its start. Done already by the constructor.
   void load();
+  /// An object on a platform that stands before the device. It is recorded, like that of `load`, where
+  /// APPSYNC_RECORDINGS names a folder.
+  std::shared_ptr<platform::TSClient> makeClient(const platform::Platform& platform);
   /// Lets the plug-in object go, after everything under way has been delivered.
   void unload();
   /// Lets it go at once, whoever may be calling back.
@@ -154,6 +158,7 @@ class PluginRig {
   std::ofstream _journal;                    // as well, where APPSYNC_JOURNALS names a folder
   device::ManualEventQueue* _manualEvents = nullptr;
   std::unique_ptr<device::LocalDevice> _device;
+  std::vector<std::unique_ptr<record::RecordingPlatform>> _recordings;  // of all objects on the device
   std::shared_ptr<platform::TSClient> _client;
   std::optional<tsd::Daemon> _daemon;
 };

@@ -10,7 +10,6 @@
 #include "tests/RestoreScenario.h"
 #include "tests/Scenario.h"
 #include "tests/ScriptedServices.h"
-#include "tsd/daemon/PluginLoader.h"
 
 namespace tests {
 namespace {
@@ -46,7 +45,7 @@ class ScriptedServices : public ::testing::Test {
     _services = services;
     if (!services.workspace) _services.workspace = &_registry;
     _platform.emplace(scripted(_rig.platform(), _services));
-    _client = tsd::PluginLoader(SHIPPED_PLUGIN).create(*_platform);
+    _client = _rig.makeClient(*_platform);
   }
   void load() { load({}); }
 
