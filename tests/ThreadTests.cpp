@@ -9,6 +9,7 @@
 #include "platform/InstallCoordination.h"
 #include "platform/NotificationCenter.h"
 #include "tests/RestoreScenario.h"
+#include "tests/ScriptedServices.h"
 
 namespace tests {
 namespace {
@@ -196,6 +197,70 @@ TEST(Threads, EditsReconciliationAndClearingExcludeOneAnother) {
         platform::TSAsset::downloadAssetWithIdentifier(apps[i], "Application", std::nullopt));
   });
   EXPECT_EQ(marks(rig), std::vector<std::string>{"INSTALLED"});
+}
+
+/// The device's clock, which counts those who wait for another thread.
+class CountingClock final : public platform::Clock {
+ public:
+  explicit CountingClock(platform::Clock& clock) : _clock(clock) {}
+
+  Instant now() override { return _clock.now(); }
+  bool waitUntil(platform::Mutex& mutex, platform::Condition& changed, Instant deadline,
+                 const std::function<bool()>& satisfied) override REQUIRES(mutex) {
+    if (deadline == noDeadline) ++waits;
+    return _clock.waitUntil(mutex, changed, deadline, satisfied);
+  }
+
+  std::atomic<std::size_t> waits{0};
+
+ private:
+  platform::Clock& _clock;
+};
+
+/// While `first` is about to do `operation` with that file, `second` begins on another thread, and has to wait.
+struct Meeting {
+  const char* operation;
+  const char* path;
+  std::function<void(platform::TSClient&)> first;
+  std::function<void(platform::TSClient&)> second;
+};
+
+TEST(Threads, WhoeverMeetsAnEditWaitsForItsEnd) {
+  const auto mark = [](platform::TSClient& client) {
+    client.assetInstallSucceeded(platform::TSAsset::downloadAssetWithIdentifier("app.0", "Application", std::nullopt));
+  };
+  const auto reconcile = [](platform::TSClient& client) { client.reconcileSync(1, "anchor", {}, nullptr); };
+  const auto clear = [](platform::TSClient& client) { client.clearSyncData(); };
+  const Meeting meetings[] = {{"readFile", todoListPath, mark, reconcile},
+                              {"readFile", todoListPath, mark, clear},
+                              {"readFile", todoListPath, mark, mark},
+                              {"removeItem", workArea, reconcile, mark},
+                              {"removeItem", pluginDirectory, clear, mark}};
+  for (const auto& meeting : meetings) {
+    PluginRig rig(threads);
+    CountingClock clock(rig.platform().clock);
+    stage(rig, identifiers(1));
+    rig.reconcileSync();
+    stage(rig, identifiers(1));
+    auto client = rig.makeClient(scripted(rig.platform(), {.clock = &clock}));
+    std::atomic<bool> begun{false};
+    std::atomic<bool> over{false};
+    std::thread other;
+    rig.parts().watch = [&](std::string_view operation, std::string_view path) {
+      if (operation != meeting.operation || path != meeting.path || begun.exchange(true)) return;
+      other = std::thread([&] {
+        device::ThreadName name("other");
+        meeting.second(*client);
+        over = true;
+      });
+      while (clock.waits == 0 && !over) std::this_thread::yield();
+    };
+    meeting.first(*client);
+    ASSERT_TRUE(other.joinable()) << meeting.operation;
+    other.join();
+    EXPECT_GE(clock.waits, 1u) << meeting.operation << ' ' << meeting.path;
+    rig.parts().watch = nullptr;
+  }
 }
 
 /// One of the daemon's calls, or what somebody else does meanwhile.
