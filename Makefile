@@ -94,7 +94,8 @@ mutants: packages ## faults planted in a copy of the sources, for the tests to f
 	@python3 tests/random_mutants.py build/mutants --area $(or $(AREA),plugin) --count $(or $(COUNT),100) \
 	  --seed $(or $(SEED),1)
 
-recordings: build ## the recordings that the tests replay, made anew; tells which ones the plug-in answers differently
+recordings: packages ## the recordings that the tests replay, made anew; tells which ones the plug-in answers differently
+	@$(call PRESET,release,tsd ApplicationSync plugin_tests exception_tests)
 	@python3 tests/make_recordings.py build/release/bin/tsd tests/recordings
 
 fuzz: fuzz-packages ## looks for inputs that break something: make fuzz RUNS=1000000 TARGETS=xml_list
