@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """Plants faults by the dice, one at a time, and sees whether the tests find them: says how good the tests are.
 
-usage: random_mutants.py BUILD [--area plugin|values|install] [--count N] [--seed S] [--jobs N] [--only FILE] [--again]
+usage: random_mutants.py BUILD [--area plugin|replay|values|install] [--count N] [--seed S] [--jobs N] [--only FILE] [--again]
 
 A statement, a guard or a message goes, a condition is negated, an operator, a constant or a text becomes another one,
 two neighbouring statements change places. One object is compiled and linked for each; a fault that does not compile is
@@ -55,7 +55,9 @@ def journals(test):
 
 
 # A word that begins with "@" is a file of the copy, "%" one of its build.
+REPLAY = [sys.executable, "@tests/recording_tests.py", "%bin/tsd", "--failfast", "Corpus"]
 PLUGIN_SUITES = [
+    REPLAY,
     ["%bin/plugin_tests", "--gtest_filter=-*Simulation*:*Sweep*:*Thread*"],
     ["%bin/plugin_tests", "--gtest_filter=*Sweep*:*Thread*"],
     ["%bin/plugin_tests", "--gtest_filter=*Simulation*"],
@@ -69,8 +71,10 @@ def seeds(target):
     return [f"%bin/fuzz_{target}", f"@fuzz/seeds/{target}"]
 
 
+PLUGIN_FOLDERS = ["core", "transfer", "coordination", "restore", "placeholder"]
 AREAS = {
-    "plugin": Area(["core", "transfer", "coordination", "restore", "placeholder"], PLUGIN_TARGETS, PLUGIN_SUITES, 97),
+    "plugin": Area(PLUGIN_FOLDERS, PLUGIN_TARGETS, PLUGIN_SUITES, 97),
+    "replay": Area(PLUGIN_FOLDERS, ["ApplicationSync", "tsd"], [REPLAY], 95),
     "values": Area(["platform", "plist"],
                    [*PLUGIN_TARGETS, "property_list_tests", "device_foundation_tests", "fuzz_binary_list",
                     "fuzz_xml_list", "fuzz_round_trip"],
@@ -79,7 +83,7 @@ AREAS = {
     "install": Area(["device/package", "device/reports", "device/install", "device/coordination"],
                     ["ApplicationSync", "plugin_tests", "tsd", "device_service_tests", "contract_tests",
                      "fuzz_package"],
-                    [["%bin/device_service_tests"], ["%bin/contract_tests"], seeds("package"), *PLUGIN_SUITES[:4],
+                    [["%bin/device_service_tests"], ["%bin/contract_tests"], seeds("package"), *PLUGIN_SUITES[1:5],
                      *([sys.executable, f"@tests/{name}.py", "%bin/tsd"]
                        for name in ("hostile_host", "outcome_tests")),
                      [sys.executable, "@tests/kill_sweep.py", "%bin/tsd", "error", "--every", "20"]], 90),
