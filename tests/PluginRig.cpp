@@ -107,6 +107,11 @@ PluginRig::PluginRig(const Options& options, std::unique_ptr<device::FileTree> f
   load();
 }
 
+std::string PluginRig::pluginFile() {
+  const char* named = std::getenv("APPSYNC_PLUGIN");
+  return named ? named : SHIPPED_PLUGIN;
+}
+
 /// In the folder that the environment names, if it does: a name that is no other rig's.
 static std::optional<std::string> newFile(const char* variable, const std::string& suffix) {
   static std::atomic<int> number = 0;

@@ -146,12 +146,14 @@ class PluginRig {
   std::size_t countOf(std::string_view operation, std::string_view app = {}) const;
 
  private:
+  /// The one of the build, unless APPSYNC_PLUGIN names another.
+  static std::string pluginFile();
   void open();
   void openJournal();
   std::vector<const device::CallRecord*> recordsIn(std::string_view operation, std::size_t nth) const;
 
   const Options _options;
-  const tsd::PluginLoader _plugin{SHIPPED_PLUGIN};
+  const tsd::PluginLoader _plugin{pluginFile()};
   SharedParts _parts;
   DaemonTransfers _transfers;
   std::vector<device::CallRecord> _records;  // written under the journal's lock
