@@ -3,8 +3,8 @@
 
 .DEFAULT_GOAL := help
 .PHONY: help build build-all demo test check asan tsan tsan-clang clang debug arm64 coverage sweep kill-sweep error-sweep full-disk \
-        power-loss simulate mutants recordings fuzz bench deb interface format clean packages check-packages fuzz-packages \
-        deb-packages arm64-packages coverage-packages
+        farm-test power-loss simulate mutants recordings fuzz bench deb interface format clean packages check-packages fuzz-packages \
+        deb-packages arm64-packages coverage-packages farm-packages
 
 # Random scenarios of the simulation; empty: what the tests choose themselves.
 SEEDS ?=
@@ -29,7 +29,7 @@ demo: build ## a whole life of a device, from the first sync to a restore, in a 
 	@rm -rf build/demo
 	@examples/demo build/release/bin/tsd build/demo
 
-test: build-all ## all tests (SEEDS=N: that many random scenarios)
+test: build-all farm-packages ## all tests (SEEDS=N: that many random scenarios)
 	@cd build/release && $(WITH_SEEDS) $(CTEST)
 
 check: check-packages ## format, sizes, includes, spelling, documents, interface, clang-tidy, thread safety, state, hardening
@@ -94,6 +94,9 @@ mutants: packages ## faults planted in a copy of the sources, for the tests to f
 	@python3 tests/random_mutants.py build/mutants --area $(or $(AREA),plugin) --count $(or $(COUNT),100) \
 	  --seed $(or $(SEED),1)
 
+farm-test: build-all farm-packages ## the farm of examples/farm on engines of its own: make farm-test SEEDS=10000
+	@APPSYNC_FARM_SEEDS=$(or $(SEEDS),10000) python3 tests/farm_tests.py build/release/bin/tsd -v
+
 recordings: packages ## the recordings that the tests replay, made anew; tells which ones the plug-in answers differently
 	@$(call PRESET,release,tsd ApplicationSync plugin_tests exception_tests)
 	@python3 tests/make_recordings.py build/release/bin/tsd tests/recordings
@@ -137,3 +140,7 @@ arm64-packages:
 
 coverage-packages:
 	@.ci/packages coverage
+
+# Where they cannot be had, the test of the farm says what it leaves out.
+farm-packages:
+	@.ci/packages farm || echo "note: the farm is not tested here" >&2
