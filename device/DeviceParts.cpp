@@ -48,14 +48,18 @@ bool makeDeviceDirectories(FileTree& files, ErrorRef* error) {
 }
 
 bool isDeviceStore(Store& store, ErrorRef* error) {
-  for (const auto& record : store.load()) {
-    if (record.kind != "device") continue;
-    if (record.key == "version" && record.value.unsignedInteger() == storeVersion) return true;
-    return fail(error, localDeviceError(LocalDeviceError::notADevice, "the device is of another version"));
-  }
-  bool isEmpty = store.load().empty();
-  return fail(error, localDeviceError(LocalDeviceError::notADevice,
-                                      isEmpty ? "the device was never finished" : "the store is not a device's"));
+  const char* reason = "the device was never finished";
+  store.read([&](const StoreRecord& record) {
+    const bool isDevice = record.kind == "device";
+    if (!isDevice)
+      reason = "the store is not a device's";
+    else if (record.key == "version" && record.value.unsignedInteger() == storeVersion)
+      reason = nullptr;
+    else
+      reason = "the device is of another version";
+    return !isDevice;
+  });
+  return !reason || fail(error, localDeviceError(LocalDeviceError::notADevice, reason));
 }
 
 bool fillDeviceParts(FileTree& files, Store& store, ErrorRef* error) {

@@ -166,7 +166,7 @@ class Replay {
 class PowerLog::LoggedStore final : public Store {
  public:
   explicit LoggedStore(PowerLog& log) : _log(log) {}
-  std::vector<StoreRecord> load() override { return _store->load(); }
+  void read(const Take& take) override { _store->read(take); }
   bool commit(const std::vector<StoreRecord>& changes, platform::ErrorRef* error) override {
     _log._steps.push_back({Step::Kind::storeCommit, {}, {}, {}, changes});
     return _store->commit(changes, error);

@@ -16,7 +16,7 @@ namespace {
 class SharedStore final : public device::Store {
  public:
   SharedStore(device::Store& store, const bool& broken) : _store(store), _broken(broken) {}
-  std::vector<device::StoreRecord> load() override { return _store.load(); }
+  void read(const Take& take) override { _store.read(take); }
   bool commit(const std::vector<device::StoreRecord>& changes, ErrorRef* error) override {
     return _broken ? refuse(error) : _store.commit(changes, error);
   }

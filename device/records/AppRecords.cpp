@@ -182,14 +182,15 @@ void ChangeSet::setClosed() { add({deviceKind, closedKey, true}, nullptr); }
 std::optional<AppRecords::Loaded> AppRecords::load(platform::ErrorRef* error) {
   Loaded loaded;
   Lock lock(*this);
-  for (const auto& record : _store.load()) {
-    if (take(record, loaded)) continue;
-    platform::setError(error,
-                       localDeviceError(LocalDeviceError::notADevice, "device.db: the record " + record.kind + " \"" +
-                                                                          record.key + "\" cannot be understood"));
-    return std::nullopt;
-  }
-  return loaded;
+  platform::ErrorRef reason;
+  _store.read([&](const StoreRecord& record) REQUIRES(recordsGuard) {
+    if (!take(record, loaded))
+      reason = localDeviceError(LocalDeviceError::notADevice, "device.db: the record " + record.kind + " \"" +
+                                                                  record.key + "\" cannot be understood");
+    return !reason;
+  });
+  platform::setError(error, reason);
+  return reason ? std::nullopt : std::optional(std::move(loaded));
 }
 
 bool AppRecords::take(const StoreRecord& record, Loaded& loaded) {

@@ -101,36 +101,41 @@ class DatabaseStore final : public Store {
     if (status != SQLITE_OK) return fail(error);
     sqlite3_extended_result_codes(_database.get(), 1);
     // Only one process at a time has a device, so nothing needs to be shared.
-    if (!execute("PRAGMA locking_mode=EXCLUSIVE", error) || !checkFormat(error)) return false;
+    bool isEmpty = false;
+    if (!execute("PRAGMA locking_mode=EXCLUSIVE", error) || !checkFormat(isEmpty, error)) return false;
+    if (isEmpty && !makeFormat(error)) return false;
     if (!execute("PRAGMA journal_mode=WAL", error) || !execute("PRAGMA synchronous=FULL", error)) return false;
     return prepareAndRead(error);
   }
 
-  /// The same of a database in memory.
-  bool openImage(const Bytes& image, ErrorRef* error) {
+  /// The records of a database in memory.
+  std::optional<std::vector<StoreRecord>> readImage(Bytes& image, ErrorRef* error) {
     platform::Mutex::Lock lock(_mutex);
     sqlite3* opened = nullptr;
     int status = sqlite3_open_v2(":memory:", &opened, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
     _database.reset(opened);
-    if (status != SQLITE_OK) return fail(error);
-    auto* bytes = static_cast<unsigned char*>(sqlite3_malloc64(image.size() + 1));
-    if (!bytes) return fail(error, "out of memory");
-    std::copy(image.begin(), image.end(), bytes);
     auto size = static_cast<sqlite3_int64>(image.size());
-    // The database takes the bytes over even if this fails.
-    if (sqlite3_deserialize(opened, "main", bytes, size, size + 1,
-                            SQLITE_DESERIALIZE_FREEONCLOSE | SQLITE_DESERIALIZE_RESIZEABLE) != SQLITE_OK)
-      return fail(error);
-    return checkFormat(error) && prepareAndRead(error);
+    std::vector<StoreRecord> records;
+    bool isRead =
+        status == SQLITE_OK && sqlite3_deserialize(opened, "main", reinterpret_cast<unsigned char*>(image.data()), size,
+                                                   size, SQLITE_DESERIALIZE_READONLY) == SQLITE_OK;
+    if (!isRead) fail(error);
+    bool isEmpty = false;
+    isRead = isRead && checkFormat(isEmpty, error) && (isEmpty || readRecords(records, error));
+    _database.reset();  // it reads the image's own bytes
+    return isRead ? std::optional(std::move(records)) : std::nullopt;
   }
 
-  std::vector<StoreRecord> load() override {
+  void read(const Take& take) override {
     platform::Mutex::Lock lock(_mutex);
-    if (_asOpened) return *_asOpened;
-    std::vector<StoreRecord> records;
     ErrorRef error;
-    if (!readRecords(records, &error)) throw std::runtime_error(error->description());
-    return records;
+    if (!_asRead && !readRecords(_asRead.emplace(), &error)) {
+      _asRead.reset();
+      throw std::runtime_error(error->description());
+    }
+    for (const auto& record : *_asRead) {
+      if (!take(record)) return;
+    }
   }
 
   bool commit(const std::vector<StoreRecord>& changes, ErrorRef* error) override { return apply(changes, true, error); }
@@ -143,7 +148,7 @@ class DatabaseStore final : public Store {
                    "ON CONFLICT(kind, key) DO UPDATE SET value = excluded.value",
                    error) &&
            prepare(_remove, "DELETE FROM records WHERE kind = ?1 AND key = ?2", error) &&
-           readRecords(_asOpened.emplace(), error);
+           readRecords(_asRead.emplace(), error);
   }
 
   bool apply(const std::vector<StoreRecord>& changes, bool flushes, ErrorRef* error) EXCLUDES(_mutex) {
@@ -155,7 +160,7 @@ class DatabaseStore final : public Store {
       values.push_back(std::move(*bytes));
     }
     platform::Mutex::Lock lock(_mutex);
-    _asOpened.reset();
+    _asRead.reset();
     Step step{flushes ? Step::Kind::storeCommit : Step::Kind::storeWrite, {}};
     if (int forbidden = _watch ? _watch->before(step) : 0) {
       platform::setError(error, platform::makeError("Store", forbidden, _path + ": " + textOfErrorNumber(forbidden)));
@@ -210,12 +215,14 @@ class DatabaseStore final : public Store {
     return true;
   }
 
-  bool checkFormat(ErrorRef* error) REQUIRES(_mutex) {
+  /// Ours, or nothing at all yet.
+  bool checkFormat(bool& isEmpty, ErrorRef* error) REQUIRES(_mutex) {
     int id = 0, version = 0, tables = 0;
     if (!readNumber("PRAGMA application_id", id, error) || !readNumber("PRAGMA user_version", version, error) ||
         !readNumber("SELECT count(*) FROM sqlite_schema", tables, error))
       return false;
-    if (id == 0 && version == 0 && tables == 0) return makeFormat(error);
+    isEmpty = id == 0 && version == 0 && tables == 0;
+    if (isEmpty) return true;
     if (id != applicationID) return fail(error, "a database of something else, not a device's store");
     if (version != formatVersion)
       return fail(error,
@@ -266,8 +273,8 @@ class DatabaseStore final : public Store {
   Statement _put GUARDED_BY(_mutex);
   Statement _remove GUARDED_BY(_mutex);
   bool _flushes GUARDED_BY(_mutex) = true;
-  /// What the file held when it was opened, until it changes: whoever opens a device asks more than once.
-  std::optional<std::vector<StoreRecord>> _asOpened GUARDED_BY(_mutex);
+  /// What the file holds, until it changes: whoever opens a device asks more than once.
+  std::optional<std::vector<StoreRecord>> _asRead GUARDED_BY(_mutex);
 };
 
 }  // namespace
@@ -281,10 +288,8 @@ std::unique_ptr<Store> openDatabaseStore(const std::string& path, ErrorRef* erro
 
 std::unique_ptr<Store> copyDatabaseStore(const std::string& path, ErrorRef* error) {
   auto image = readDatabaseImage(path, error);
-  auto store = image ? std::make_unique<DatabaseStore>(path, nullptr) : nullptr;
-  if (!store || !store->openImage(*image, error)) return nullptr;
-  auto result = makeMemoryStore();
-  return result->commit(store->load(), error) ? std::move(result) : nullptr;
+  auto records = image ? DatabaseStore(path, nullptr).readImage(*image, error) : std::nullopt;
+  return records ? makeMemoryStore(std::move(*records)) : nullptr;
 }
 
 }  // namespace device

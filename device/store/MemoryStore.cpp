@@ -1,3 +1,5 @@
+#include <utility>
+
 #include "device/store/RecordList.h"
 #include "device/store/Store.h"
 #include "platform/Mutex.h"
@@ -5,13 +7,23 @@
 
 namespace device {
 
+std::vector<StoreRecord> Store::load() {
+  std::vector<StoreRecord> records;
+  read([&](const StoreRecord& record) {
+    records.push_back(record);
+    return true;
+  });
+  return records;
+}
+
 namespace {
 
 class MemoryStore final : public Store {
  public:
-  std::vector<StoreRecord> load() override {
+  explicit MemoryStore(std::vector<StoreRecord>&& records) : _records(std::move(records)) {}
+  void read(const Take& take) override {
     platform::Mutex::Lock lock(_mutex);
-    return _records.all();
+    _records.read(take);
   }
   bool commit(const std::vector<StoreRecord>& changes, platform::ErrorRef* error) override {
     platform::setError(error, nullptr);
@@ -27,6 +39,8 @@ class MemoryStore final : public Store {
 
 }  // namespace
 
-std::unique_ptr<Store> makeMemoryStore() { return std::make_unique<MemoryStore>(); }
+std::unique_ptr<Store> makeMemoryStore(std::vector<StoreRecord>&& records) {
+  return std::make_unique<MemoryStore>(std::move(records));
+}
 
 }  // namespace device

@@ -5,8 +5,27 @@
 
 namespace device {
 
+namespace {
+
+std::string nameOf(const StoreRecord& record) { return record.kind + '\0' + record.key; }
+
+}  // namespace
+
+RecordList::RecordList(std::vector<StoreRecord>&& records)
+    : _records(std::move_iterator(records.begin()), std::move_iterator(records.end())) {}
+
+void RecordList::read(const Store::Take& take) const {
+  for (const auto& record : _records) {
+    if (!take(record)) return;
+  }
+}
+
 void RecordList::apply(const StoreRecord& change) {
-  std::string name = change.kind + '\0' + change.key;
+  if (!_hasPlaces) {
+    for (auto record = _records.begin(); record != _records.end(); ++record) _places.emplace(nameOf(*record), record);
+    _hasPlaces = true;
+  }
+  std::string name = nameOf(change);
   auto found = _places.find(name);
   if (change.value.isAbsent()) {
     if (found == _places.end()) return;

@@ -14,18 +14,20 @@ namespace device {
 class RecordList {
  public:
   RecordList() = default;
+  explicit RecordList(std::vector<StoreRecord>&& records);
   RecordList(const RecordList&) = delete;
   RecordList& operator=(const RecordList&) = delete;
 
   /// An absent value removes the record, if it is there.
   void apply(const StoreRecord& change);
-  std::vector<StoreRecord> all() const { return {_records.begin(), _records.end()}; }
+  void read(const Store::Take& take) const;
 
  private:
   using Records = std::list<StoreRecord>;
 
   Records _records;
-  platform::TextMap<Records::iterator> _places;  // by the kind, a zero and the key
+  platform::TextMap<Records::iterator> _places;  // by the kind, a zero and the key; made with the first change
+  bool _hasPlaces = false;
 };
 
 }  // namespace device

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <string>
 #include <vector>
@@ -23,9 +24,13 @@ struct StoreRecord {
 class Store {
  public:
   virtual ~Store() = default;
-  /// Every record, in the order of first insertion. None is missing: an unreadable store is an error when it is opened,
-  /// and throws when it becomes one later.
-  virtual std::vector<StoreRecord> load() = 0;
+  /// Answers whether it wants the next record too. Does not use the store.
+  using Take = std::function<bool(const StoreRecord& record)>;
+  /// Hands over every record, in the order of first insertion. None is missing: an unreadable store is an error when it
+  /// is opened, and throws when it becomes one later.
+  virtual void read(const Take& take) = 0;
+  /// Copies of them all.
+  std::vector<StoreRecord> load();
   virtual bool commit(const std::vector<StoreRecord>& changes, platform::ErrorRef* error = nullptr) = 0;
   /// The same for changes that a loss of power may take back: atomic, in order with every other change, and kept when
   /// the process dies; durable with the next commit. Without a flush.
@@ -42,7 +47,7 @@ std::unique_ptr<Store> openDatabaseStore(const std::string& path, platform::Erro
 /// A store in memory that begins with what the file holds, as its last commit left it. The file and its
 /// companions are only read, even while another process has it open. Null with an error as above.
 std::unique_ptr<Store> copyDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr);
-/// Forgets everything when it is destroyed.
-std::unique_ptr<Store> makeMemoryStore();
+/// Begins with these records, of which no two have the same name, and forgets everything when it is destroyed.
+std::unique_ptr<Store> makeMemoryStore(std::vector<StoreRecord>&& records = {});
 
 }  // namespace device
