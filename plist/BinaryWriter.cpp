@@ -118,8 +118,10 @@ bool BinaryWriter::countItems(const platform::Array& items, std::size_t depth) {
 bool BinaryWriter::countEntries(const Dictionary& entries, std::size_t depth) {
   if (!countContainer(entries.size(), 2, depth)) return false;
   for (const Dictionary::Entry& entry : entries) {
-    auto place = static_cast<std::size_t>(&entry - entries.begin());
-    if (!countKey(entry.key, place) || !count(entry.value, depth + 1)) return false;
+    const std::size_t place = (23 * depth + static_cast<std::size_t>(&entry - entries.begin())) % places;
+    if (!countAgain(entry.key, _lastKeys[place])) return false;
+    const auto text = entry.value.string();
+    if (!(text ? countAgain(*text, _lastTexts[place]) : count(entry.value, depth + 1))) return false;
   }
   return true;
 }
@@ -147,9 +149,10 @@ bool BinaryWriter::countString(std::string_view text) {
   return true;
 }
 
-bool BinaryWriter::countKey(std::string_view text, std::size_t place) {
-  Key& last = _lastKeys[place % _lastKeys.size()];
-  if (_shares && last.isKnown && last.text == text) {
+/// A string that may well be the last one.
+bool BinaryWriter::countAgain(std::string_view text, Last& last) {
+  const bool isSame = last.text.size() == text.size() && (last.text.data() == text.data() || last.text == text);
+  if (_shares && last.isKnown && isSame) {
     _stringNumbers.push_back(last.number);
     _text += text.size();
     return true;

@@ -29,8 +29,9 @@ class BinaryWriter {
   std::optional<platform::Bytes> write(const platform::Value& value, platform::ErrorRef& error);
 
  private:
-  /// What a dictionary had at some place. The entries of a list mostly have the same keys in the same order.
-  struct Key {
+  /// What a dictionary had at some place. The entries of a list mostly have the same keys in the same order, and often
+  /// the same texts under them.
+  struct Last {
     std::string_view text;
     std::uint32_t number = 0;
     bool isKnown = false;
@@ -42,7 +43,7 @@ class BinaryWriter {
   bool countEntries(const platform::Dictionary& entries, std::size_t depth);
   bool addText(StringTable::Kind kind, std::string_view text);
   bool countString(std::string_view text);
-  bool countKey(std::string_view text, std::size_t place);
+  bool countAgain(std::string_view text, Last& last);
   bool countContainer(std::size_t items, std::size_t references, std::size_t depth);
   void countObject(std::size_t size);
 
@@ -62,7 +63,8 @@ class BinaryWriter {
   // Of every key, string and data, in the order of both passes. In pieces: there are too many of them to be moved
   // about.
   std::deque<std::uint32_t> _stringNumbers;
-  std::array<Key, 8> _lastKeys;
+  static constexpr std::size_t places = 64;  // by depth and place
+  std::array<Last, places> _lastKeys, _lastTexts;
   std::size_t _objects = 0;
   std::size_t _references = 0;
   std::size_t _text = 0;  // bytes of strings and data, at all their places

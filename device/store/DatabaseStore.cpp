@@ -109,13 +109,13 @@ class DatabaseStore final : public Store {
   }
 
   /// The records of a database in memory.
-  std::optional<std::vector<StoreRecord>> readImage(Bytes& image, ErrorRef* error) {
+  std::optional<std::list<StoreRecord>> readImage(Bytes& image, ErrorRef* error) {
     platform::Mutex::Lock lock(_mutex);
     sqlite3* opened = nullptr;
     int status = sqlite3_open_v2(":memory:", &opened, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
     _database.reset(opened);
     auto size = static_cast<sqlite3_int64>(image.size());
-    std::vector<StoreRecord> records;
+    std::list<StoreRecord> records;
     bool isRead =
         status == SQLITE_OK && sqlite3_deserialize(opened, "main", reinterpret_cast<unsigned char*>(image.data()), size,
                                                    size, SQLITE_DESERIALIZE_READONLY) == SQLITE_OK;
@@ -237,7 +237,7 @@ class DatabaseStore final : public Store {
     return execute(schema, error) && execute(marks.c_str(), error) && (transaction.commit() || fail(error));
   }
 
-  bool readRecords(std::vector<StoreRecord>& records, ErrorRef* error) REQUIRES(_mutex) {
+  bool readRecords(std::list<StoreRecord>& records, ErrorRef* error) REQUIRES(_mutex) {
     Statement all;
     if (!prepare(all, "SELECT kind, key, value FROM records ORDER BY place", error)) return false;
     int status;
@@ -274,7 +274,7 @@ class DatabaseStore final : public Store {
   Statement _remove GUARDED_BY(_mutex);
   bool _flushes GUARDED_BY(_mutex) = true;
   /// What the file holds, until it changes: whoever opens a device asks more than once.
-  std::optional<std::vector<StoreRecord>> _asRead GUARDED_BY(_mutex);
+  std::optional<std::list<StoreRecord>> _asRead GUARDED_BY(_mutex);
 };
 
 }  // namespace

@@ -20,7 +20,7 @@ namespace {
 
 class MemoryStore final : public Store {
  public:
-  explicit MemoryStore(std::vector<StoreRecord>&& records) : _records(std::move(records)) {}
+  explicit MemoryStore(std::list<StoreRecord>&& records) : _records(std::move(records)) {}
   void read(const Take& take) override {
     platform::Mutex::Lock lock(_mutex);
     _records.read(take);
@@ -39,7 +39,7 @@ class MemoryStore final : public Store {
 
 }  // namespace
 
-std::unique_ptr<Store> makeMemoryStore(std::vector<StoreRecord>&& records) {
+std::unique_ptr<Store> makeMemoryStore(std::list<StoreRecord>&& records) {
   return std::make_unique<MemoryStore>(std::move(records));
 }
 

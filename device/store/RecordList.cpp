@@ -11,9 +11,6 @@ std::string nameOf(const StoreRecord& record) { return record.kind + '\0' + reco
 
 }  // namespace
 
-RecordList::RecordList(std::vector<StoreRecord>&& records)
-    : _records(std::move_iterator(records.begin()), std::move_iterator(records.end())) {}
-
 void RecordList::read(const Store::Take& take) const {
   for (const auto& record : _records) {
     if (!take(record)) return;

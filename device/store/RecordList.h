@@ -2,7 +2,7 @@
 
 #include <list>
 #include <string>
-#include <vector>
+#include <utility>
 
 #include "device/store/Store.h"
 #include "platform/TextTable.h"
@@ -14,7 +14,7 @@ namespace device {
 class RecordList {
  public:
   RecordList() = default;
-  explicit RecordList(std::vector<StoreRecord>&& records);
+  explicit RecordList(std::list<StoreRecord>&& records) : _records(std::move(records)) {}
   RecordList(const RecordList&) = delete;
   RecordList& operator=(const RecordList&) = delete;
 

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <functional>
+#include <list>
 #include <memory>
 #include <string>
 #include <vector>
@@ -48,6 +49,6 @@ std::unique_ptr<Store> openDatabaseStore(const std::string& path, platform::Erro
 /// companions are only read, even while another process has it open. Null with an error as above.
 std::unique_ptr<Store> copyDatabaseStore(const std::string& path, platform::ErrorRef* error = nullptr);
 /// Begins with these records, of which no two have the same name, and forgets everything when it is destroyed.
-std::unique_ptr<Store> makeMemoryStore(std::vector<StoreRecord>&& records = {});
+std::unique_ptr<Store> makeMemoryStore(std::list<StoreRecord>&& records = {});
 
 }  // namespace device
