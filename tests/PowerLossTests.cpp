@@ -3,7 +3,9 @@
 
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <iostream>
+#include <iterator>
 #include <map>
 #include <optional>
 #include <random>
@@ -112,6 +114,16 @@ class PowerLoss : public testing::Test {
   void push(PluginRig& rig, const std::string& file, const std::string& path) {
     tsd::FileConduit(rig.device().files(), _console).pushFile(_folder + '/' + file, path);
   }
+  /// As a transfer does: nothing of the package is flushed.
+  void send(PluginRig& rig, const std::string& file, const std::string& path) {
+    std::ifstream package(_folder + '/' + file, std::ios::binary);
+    auto& files = rig.device().files();
+    if (files.fileExists(path)) files.removeItem(path);
+    auto target = files.createNew(path, false);
+    ASSERT_TRUE(package && target) << file;
+    target->write(platform::Bytes(std::istreambuf_iterator<char>(package), {}));
+    ASSERT_TRUE(target->close(false));
+  }
   static std::string packagePath(const std::string& app) { return std::string(packagesDirectory) + '/' + app + ".pkg"; }
 
   void sync(PluginRig& rig, const std::string& host) {
@@ -123,7 +135,7 @@ class PowerLoss : public testing::Test {
     for (const auto& asset : rig.daemon().outstandingAssetTransfers()) {
       const auto& app = asset->identifier();
       rig.deliver();
-      push(rig, host + "/Packages/" + app + ".pkg", packagePath(app));
+      send(rig, host + "/Packages/" + app + ".pkg", packagePath(app));
       asset->setIsDownload(true);
       asset->setCompletedAssetParts(1);
       asset->setPath(packagePath(app));

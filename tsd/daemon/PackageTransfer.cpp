@@ -65,7 +65,9 @@ PackageTransfer::Result PackageTransfer::send(const Way& way, HostFile& package,
   auto target = files.createNew(path, false, &error);
   if (!target) return fail(way, End::failed, transferError(path + ": " + textOf(error), error));
   Result sent = sendChunks(way, package, *target);
-  if (sent.end == End::arrived && (!target->close(false, &error) || !files.syncItem(path, &error))) {
+  // Not flushed: the package is unpacked and removed at once, and after a loss of power in between the host sends it
+  // again.
+  if (sent.end == End::arrived && !target->close(false, &error)) {
     sent = {End::failed, transferError(path + ": " + textOf(error), error), sent.bytes};
   }
   target.reset();
