@@ -10,11 +10,14 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
+#include <map>
 #include <random>
 #include <thread>
+#include <utility>
 
 #include "device/files/FileTree.h"
 #include "device/files/OverlayFileTree.h"
+#include "device/files/StepWatch.h"
 #include "device/files/TemporaryFiles.h"
 #include "device/store/Store.h"
 
@@ -357,6 +360,50 @@ TEST(DiskFileTree, keepsTheOldContentWhenAWriteFails) {
   }
   std::signal(SIGXFSZ, SIG_DFL);
   EXPECT_EQ(picture(*files), whole);
+}
+
+/// How many steps of each kind there were.
+class CountedSteps final : public StepWatch {
+ public:
+  int before(Step& step) override {
+    ++_counts[step.kind];
+    return 0;
+  }
+  int after(const Step&) override { return 0; }
+  std::map<Step::Kind, int> take() { return std::exchange(_counts, {}); }
+
+ private:
+  std::map<Step::Kind, int> _counts;
+};
+
+TEST(DiskFileTree, flushesManySmallItemsAtOnceAndLargeOnesByThemselves) {
+  Folder folder;
+  auto steps = std::make_shared<CountedSteps>();
+  auto tree = openDiskFileTree(folder.path(), nullptr, steps);
+  auto add = [&](const std::string& path, std::uintmax_t size) {
+    std::ofstream(folder / path).put('x');
+    std::filesystem::resize_file(folder / path, size);
+  };
+  using Kind = Step::Kind;
+  ASSERT_TRUE(tree->createDirectory("/app/inner", true, {}));
+  for (const char* name : {"/app/a", "/app/inner/b"}) add(name, 100);
+  steps->take();
+  ASSERT_TRUE(tree->syncItem("/app"));
+  auto few = steps->take();
+  EXPECT_EQ(few[Kind::syncTree], 0);
+  EXPECT_EQ(few[Kind::syncFile], 2);
+  EXPECT_EQ(few[Kind::syncDirectory], 3) << "its own name is in the directory above";
+  add("/app/c", 100);
+  ASSERT_TRUE(tree->syncItem("/app"));
+  const bool flushesTrees = steps->take()[Kind::syncTree] == 1;  // not on every file system
+  add("/app/c", std::uintmax_t{5 * 4} << 20);
+  ASSERT_TRUE(tree->syncItem("/app"));
+  auto large = steps->take();
+  EXPECT_EQ(large[Kind::syncTree], 0);
+  EXPECT_EQ(large[Kind::syncFile], 3);
+  for (int i = 0; i < 60; ++i) add("/app/" + std::to_string(i), std::uintmax_t{4} << 20);
+  ASSERT_TRUE(tree->syncItem("/app"));
+  EXPECT_EQ(steps->take()[Kind::syncFile], flushesTrees ? 0 : 63) << "so many take too long by themselves";
 }
 
 TEST(DiskFileTree, removesAnyDepthWithFewFilesOpen) {

@@ -175,8 +175,11 @@ int copyContents(int from, const FileInWriting& to) {
   return 0;
 }
 
-/// So many are flushed one by one, which waits for nobody else's files.
+/// So many are flushed one by one, which waits for nobody else's files. More, if they are large: to write out what
+/// somebody else has written, such as the package that they came in, then takes longer than many single flushes.
 constexpr std::size_t fewItems = 4;
+constexpr std::size_t fewLargeItems = 64;
+constexpr std::uint64_t largeItem = std::uint64_t{4} << 20;
 
 /// The directory, where one request flushes all of its file system: some take it for nothing, or only for what they
 /// keep here. Held open, so that the system tells of every write that failed from now on.
@@ -384,23 +387,30 @@ int DiskFileTree::flushTree(std::string_view path) const {
                   [&](Step&) { return ::syncfs(_flushable.get()) == 0 ? 0 : errno; });
 }
 
+/// On the average.
+bool DiskFileTree::areLarge(const std::vector<Item>& items) {
+  std::uint64_t size = 0;
+  for (const auto& item : items) {
+    auto attributes = item.isDirectory ? std::nullopt : attributesOfItem(item.path, nullptr);
+    if (attributes) size += attributes->size;
+  }
+  return size / items.size() >= largeItem;
+}
+
 bool DiskFileTree::syncItem(std::string_view path, ErrorRef* error) {
   auto attributes = attributesOfItem(path, error);
   if (!attributes) return false;
-  struct Item {
-    std::string path;
-    bool isDirectory;
-  };
   std::vector<Item> items{{std::string(path), attributes->isDirectory}};
-  const std::size_t mostFlushedAlone = attributes->isDirectory && canFlushTree(path) ? fewItems : items.max_size();
+  const bool canBeOne = attributes->isDirectory && canFlushTree(path);
   for (std::size_t i = 0; i < items.size(); ++i) {
     if (!items[i].isDirectory) continue;
     std::string directory = path == "/" && i == 0 ? "" : items[i].path;
     auto entries = list(items[i].path, error);
     if (!entries) return false;
     for (const auto& entry : *entries) items.push_back({directory + '/' + entry.name, entry.isDirectory});
-    if (items.size() > mostFlushedAlone) return answerFileOperation(flushTree(path), path, error);
+    if (canBeOne && items.size() > fewLargeItems) return answerFileOperation(flushTree(path), path, error);
   }
+  if (canBeOne && items.size() > fewItems && !areLarge(items)) return answerFileOperation(flushTree(path), path, error);
   auto slash = path.rfind('/');
   items.push_back({std::string(slash == 0 ? "/" : path.substr(0, slash)), true});
   int failure = 0;

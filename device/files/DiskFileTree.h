@@ -2,6 +2,8 @@
 
 #include <atomic>
 #include <memory>
+#include <string>
+#include <vector>
 
 #include "device/files/DiskPlace.h"
 #include "device/files/FileTree.h"
@@ -54,6 +56,11 @@ class DiskFileTree final : public FileTree {
   int flushFile(std::string_view path) const;
   bool canFlushTree(std::string_view path) const;
   int flushTree(std::string_view path) const;
+  struct Item {
+    std::string path;
+    bool isDirectory;
+  };
+  bool areLarge(const std::vector<Item>& items);
 
   const FileDescriptor _root;
   const FileDescriptor _flushable;  // the root again, if its file system can be flushed as a whole

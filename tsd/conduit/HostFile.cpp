@@ -69,19 +69,23 @@ HostFile::~HostFile() {
   if (_descriptor >= 0) ::close(_descriptor);
 }
 
-std::optional<platform::Bytes> HostFile::read(std::size_t count, platform::ErrorRef* error) {
+std::optional<platform::BytesView> HostFile::readInto(platform::Bytes& buffer, platform::ErrorRef* error) {
   platform::setError(error, nullptr);
-  // No larger than the file can be, as all of it is cleared first.
-  platform::Bytes bytes(static_cast<std::size_t>(std::min<std::uint64_t>(count, _size + 1)), '\0');
   ssize_t got;
   do {
-    got = ::read(_descriptor, bytes.data(), bytes.size());
+    got = ::read(_descriptor, buffer.data(), buffer.size());
   } while (got < 0 && errno == EINTR);
-  if (got < 0) {
-    platform::setError(error, hostError(errno));
-    return std::nullopt;
-  }
-  bytes.resize(static_cast<std::size_t>(got));
+  if (got >= 0) return platform::BytesView(buffer.data(), static_cast<std::size_t>(got));
+  platform::setError(error, hostError(errno));
+  return std::nullopt;
+}
+
+std::optional<platform::Bytes> HostFile::read(std::size_t count, platform::ErrorRef* error) {
+  // No larger than the file can be, as all of it is cleared first.
+  platform::Bytes bytes(static_cast<std::size_t>(std::min<std::uint64_t>(count, _size + 1)), '\0');
+  auto got = readInto(bytes, error);
+  if (!got) return std::nullopt;
+  bytes.resize(got->size());
   return bytes;
 }
 

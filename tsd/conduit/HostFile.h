@@ -27,6 +27,8 @@ class HostFile {
 
   /// In bytes, as it was when the file was opened.
   std::uint64_t size() const { return _size; }
+  /// The next bytes, as many as the buffer has at most, which they are then in; empty at the end; nothing on failure.
+  std::optional<platform::BytesView> readInto(platform::Bytes& buffer, platform::ErrorRef* error = nullptr);
   /// Up to `count` bytes; empty at the end; nothing on failure.
   std::optional<platform::Bytes> read(std::size_t count, platform::ErrorRef* error = nullptr);
   /// The rest of the file; more than `limit` bytes are a failure.

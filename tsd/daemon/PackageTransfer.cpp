@@ -88,7 +88,7 @@ PackageTransfer::Result PackageTransfer::sendChunks(const Way& way, HostFile& pa
   using Action = device::InjectionRule::Action;
   const std::string& id = identifier();
   std::uint64_t size = package.size();
-  std::uint64_t chunk = std::clamp(size / chunksPerPackage, leastChunk, largestChunk);
+  platform::Bytes chunk(std::clamp(size / chunksPerPackage, leastChunk, largestChunk), '\0');
   Result result{End::arrived, nullptr, 0};
   ErrorRef error;
   while (true) {
@@ -99,7 +99,7 @@ PackageTransfer::Result PackageTransfer::sendChunks(const Way& way, HostFile& pa
       return {End::failed, transferError("injected at transfer"), result.bytes};
     }
     if (ordered && ordered->action == Action::none) return {End::stalled, nullptr, result.bytes};
-    auto bytes = package.read(static_cast<std::size_t>(chunk), &error);
+    auto bytes = package.readInto(chunk, &error);
     if (!bytes || !target.write(*bytes, &error))
       return {End::failed, transferError(textOf(error), error), result.bytes};
     if (ordered && ordered->action == Action::killAfter) way.device.boundary().die();
