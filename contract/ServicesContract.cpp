@@ -179,6 +179,29 @@ TEST_P(ServicesContract, TheClockWaitsForTheConditionOrTheDeadline) {
   registry().removeObserver(observer.get());
 }
 
+TEST_P(ServicesContract, TheClockWaitsWithoutADeadlineForAnotherThread) {
+  auto& clock = platform().clock;
+  platform::Mutex mutex;
+  platform::Condition changed;
+  bool waits = false, done = false;
+  const auto begin = clock.now();
+  std::thread other([&] {
+    platform::Mutex::Lock lock(mutex);
+    changed.wait(mutex, [&] { return waits; });
+    done = true;
+    changed.notifyAll();
+  });
+  {
+    platform::Mutex::Lock lock(mutex);
+    waits = true;
+    changed.notifyAll();
+    EXPECT_TRUE(clock.waitUntil(mutex, changed, platform::Clock::noDeadline, [&] { return done; }));
+    EXPECT_TRUE(done);
+  }
+  other.join();
+  EXPECT_LT(clock.now() - begin, std::chrono::hours(24)) << "a virtual clock has jumped to the end of time";
+}
+
 TEST_P(ServicesContract, WhatIsNotThereIsAbsent) {
   auto& process = platform().process;
   EXPECT_FALSE(process.mainBundleIdentifier().empty());
