@@ -14,7 +14,6 @@
 #include "record/replaying/ReplayCrossing.h"
 #include "record/replaying/Story.h"
 #include "record/stream/CallText.h"
-#include "record/stream/Comparison.h"
 
 namespace record {
 
@@ -56,7 +55,7 @@ struct Replayer::Services {
 Replayer::Replayer(std::string_view recording, MakeClient makeClient, ReplayOptions options)
     : _makeClient(std::move(makeClient)),
       _options(std::move(options)),
-      _reader(recording, EventReader::Large::apart),
+      _reader(recording),
       _services(std::make_unique<Services>(*this)) {}
 
 Replayer::~Replayer() = default;
@@ -98,7 +97,7 @@ std::uint64_t Replayer::newNumber(ObjectKind kind) {
   const Event* next = head();
   if (next && _expectedOf != next->number) {
     _expectedOf = next->number;
-    _expected = newObjectsOf(*next);
+    _expected = newObjectsOf(next->payload);
   }
   (void)kind;
   if (_expected.empty()) return ++_ownNumber;
@@ -168,7 +167,7 @@ void Replayer::play(Player& player, const Event& event) {
     return refuse("event " + std::to_string(event.number) + ": " + operation.service + "." + operation.name +
                   " is no call into a plug-in");
   player.inside.push_back(operation);
-  ItemReader arguments(event.payload, &event.large);
+  ItemReader arguments(event.payload);
   ItemWriter result;
   std::string problem;
   mutex.unlock();
@@ -180,14 +179,14 @@ void Replayer::play(Player& player, const Event& event) {
   mutex.lock();
   player.inside.pop_back();
   if (!problem.empty() && !isOver()) refuse(problem);
-  if (!isOver()) leave(player, event, result);
+  if (!isOver()) leave(player, event, result.bytes());
   passTurn();
 }
 
-void Replayer::leave(Player& player, const Event& entered, const ItemWriter& result) {
+void Replayer::leave(Player& player, const Event& entered, const std::string& result) {
   const Event* next = head();
   if (next && next->kind != EventKind::leave) {
-    const auto place = findAhead(player, nullptr, result);
+    const auto place = findAhead(player, nullptr, {});
     if (!place && !_options.goOn) return void(differ(Difference::Kind::missing, player, next, {}));
     if (!place) return end();
     skipTo(player, *place, {});
@@ -195,15 +194,15 @@ void Replayer::leave(Player& player, const Event& entered, const ItemWriter& res
     next = &_ahead[*place];
   }
   if (!next) return;
-  if (!isSame(*next, result))
-    differ(Difference::Kind::otherResult, player, next, resultLine(nameOfEvent(entered), result.whole()));
+  if (next->payload != result)
+    differ(Difference::Kind::otherResult, player, next, resultLine(nameOfEvent(entered), result));
   if (isOver()) return;
   auto at = std::find_if(_ahead.begin(), _ahead.end(), [&](const Event& event) { return &event == next; });
   _ahead.erase(at);
   ++_result.events;
 }
 
-std::optional<Event> Replayer::exchange(const Operation& operation, const ItemWriter& arguments) {
+std::optional<std::string> Replayer::exchange(const Operation& operation, const std::string& arguments) {
   auto* player = static_cast<Player*>(currentPlayer);
   if (isOver() && player && player == _messenger) return afterEnd(operation, arguments);
   if (isOver() || !player || ignores(operation)) return std::nullopt;
@@ -217,16 +216,16 @@ std::optional<Event> Replayer::exchange(const Operation& operation, const ItemWr
   return awaitAnswer(*player);
 }
 
-std::optional<Event> Replayer::awaitAnswer(Player& player) {
+std::optional<std::string> Replayer::awaitAnswer(Player& player) {
   while (awaitTurn(player)) {
     Event event = pop();
     if (event.kind == EventKind::enter) {
       play(player, event);
       continue;
     }
-    if (event.kind == EventKind::answer) return event;
+    if (event.kind == EventKind::answer) return std::move(event.payload);
     if (event.kind != EventKind::threw) break;
-    ItemReader said(event.payload, &event.large);
+    ItemReader said(event.payload);
     const Tag tag = event.payload.empty() ? Tag::absent : said.peek();
     if (tag == Tag::absent) throw std::bad_alloc();
     if (tag == Tag::text) throw std::runtime_error(std::string(said.text()));

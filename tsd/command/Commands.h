@@ -54,8 +54,9 @@ struct ReplayOptions {
 ExitCode runReplay(const CommandContext& context, const ReplayOptions& options);
 
 struct RecordingOptions {
-  std::string action;  // "show"
+  std::string action;  // "show", "redact"
   std::string file;
+  std::string output{};  // of redact
 };
 ExitCode runRecording(const CommandContext& context, const RecordingOptions& options);
 

@@ -1,14 +1,20 @@
 #include <string>
 
+#include "record/Redact.h"
+#include "record/Replay.h"
 #include "record/Show.h"
 #include "tsd/CommandError.h"
 #include "tsd/command/Commands.h"
 #include "tsd/conduit/WholeFile.h"
+#include "tsd/daemon/PluginLoader.h"
+#include "tsd/host/NewItem.h"
 #include "tsd/terminal/Output.h"
 
 namespace tsd {
 
-ExitCode runRecording(const CommandContext& context, const RecordingOptions& options) {
+namespace {
+
+ExitCode showRecording(const CommandContext& context, const RecordingOptions& options) {
   const std::string recording = readWholeFile(options.file);
   std::string text;
   const auto facts = record::show(recording, [&](std::string_view line) {
@@ -29,6 +35,50 @@ ExitCode runRecording(const CommandContext& context, const RecordingOptions& opt
   }
   if (!facts.problem.empty()) throw CommandError(options.file + ": " + facts.problem);
   return ExitCode::done;
+}
+
+/// Throws when that plug-in does something else than is recorded.
+void checkReplay(const std::string& file, const std::string& plugin) {
+  const PluginLoader loader(plugin);
+  const auto result =
+      record::replay(readWholeFile(file), [&](const platform::Platform& platform) { return loader.create(platform); });
+  if (!result.problem.empty()) throw CommandError(result.problem);
+  if (result.differences.empty()) return;
+  const auto& first = result.differences.front();
+  throw CommandError("event " + std::to_string(first.event) + ": redacted, the plug-in answers differently: expected " +
+                     first.expected + ", came " + first.came);
+}
+
+ExitCode redactRecording(const CommandContext& context, const RecordingOptions& options) {
+  if (options.output.empty())
+    throw CommandError(ExitCode::usage, "redact: where the redacted recording goes is missing");
+  const std::string recording = readWholeFile(options.file);
+  NewItem file(options.output, NewItem::Kind::file, false);
+  platform::ErrorRef error;
+  auto sink = record::makeFileSink(file.temporary(), &error);
+  if (!sink) throw CommandError(options.output + ": " + error->description());
+  const auto facts = record::redact(recording, std::move(sink));
+  if (!facts.problem.empty()) throw CommandError(options.file + ": " + facts.problem);
+  if (!context.options.plugin.empty()) checkReplay(file.temporary(), context.options.plugin);
+  file.putInPlace();
+  if (context.options.json) {
+    auto document = startDocument(context.options.command);
+    document.dictionary()->set("result", "done");
+    document.dictionary()->set("events", facts.events);
+    document.dictionary()->set("whole", facts.isWhole);
+    document.dictionary()->set("replaced", facts.replaced);
+    writeDocument(document);
+    return ExitCode::done;
+  }
+  context.report(options.output + ": " + std::to_string(facts.events) + " events, " + std::to_string(facts.replaced) +
+                 " texts replaced.\n");
+  return ExitCode::done;
+}
+
+}  // namespace
+
+ExitCode runRecording(const CommandContext& context, const RecordingOptions& options) {
+  return options.action == "redact" ? redactRecording(context, options) : showRecording(context, options);
 }
 
 }  // namespace tsd

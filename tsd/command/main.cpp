@@ -319,10 +319,17 @@ void addReplay(CLI::App& program, Invocation& invocation) {
 
 void addRecording(CLI::App& program, Invocation& invocation) {
   auto options = std::make_shared<RecordingOptions>();
-  auto* command = addCommand(program, invocation, "recording", "Look into a recording", runRecording, options);
-  auto* action = command->add_option("ACTION", options->action, wrapped("show: every call, as a line"));
-  takeOneOf(invocation, action, {"show"})->required()->option_text(" ");
+  auto* command =
+      addCommand(program, invocation, "recording", "Look into a recording, or redact it", runRecording, options);
+  auto* action = command->add_option("ACTION", options->action,
+                                     wrapped("show: every call, as a line; redact: write it anew, with other texts in "
+                                             "place of identifiers, names, accounts and contents. With --plugin the "
+                                             "new one has to replay"));
+  takeOneOf(invocation, action, {"show", "redact"})->required()->option_text(" ");
   addRecordingFile(command, options->file);
+  command->add_option("OUTPUT", options->output, wrapped("Of redact: the new recording; nothing may be there"))
+      ->check(checkFile)
+      ->option_text(" ");
 }
 
 void addSet(CLI::App& program, Invocation& invocation) {
