@@ -22,8 +22,8 @@ Value AppsClient::_loadPlist(const Platform& platform, std::string_view path, Er
 static Dictionary* firstEntry(Array& todoList, std::optional<std::string_view> identifier) {
   if (!identifier) return nullptr;
   for (std::size_t i = 0; i < todoList.size(); ++i) {
-    Dictionary* entry = todoList.dictionary(i);
-    if (entry && (*entry)["identifier"].string() == identifier) return entry;
+    const Dictionary* entry = todoList[i].dictionary();
+    if (entry && (*entry)["identifier"].string() == identifier) return todoList.dictionary(i);
   }
   return nullptr;
 }

@@ -68,7 +68,7 @@ bool Arena::extend(void* block, std::size_t size, std::size_t newSize) noexcept 
 
 void Arena::recycle(const void* block, std::size_t size) noexcept {
   const char* start = static_cast<const char*>(block);
-  if (size == 0 || isShared(start)) return;
+  if (size == 0 || _lent || isShared(start)) return;
   SizeClass given = sizeClass(size);
   if (start + given.size == _next) {
     _next -= given.size;

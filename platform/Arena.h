@@ -18,6 +18,9 @@ class Arena {
  public:
   Arena() noexcept = default;
   explicit Arena(Bytes input) noexcept : _input(std::move(input)) {}
+  /// Values of this arena may also point into what `lent` keeps, which nobody changes. What is given back here is not
+  /// handed out again: it may be of there.
+  explicit Arena(std::shared_ptr<const void> lent) noexcept : _lent(std::move(lent)) {}
   Arena(const Arena&) = delete;
   Arena& operator=(const Arena&) = delete;
 
@@ -61,6 +64,7 @@ class Arena {
   char* _sharedNext = nullptr;
   std::size_t _sharedLeft = 0;
   Bytes _input;
+  std::shared_ptr<const void> _lent;
   alignas(8) char _first[firstChunk];
 };
 

@@ -12,9 +12,16 @@ const Value& Array::operator[](std::size_t index) const noexcept {
   return index < _size ? _values[index] : absent;
 }
 
-Array* Array::array(std::size_t index) noexcept { return index < _size ? _values[index].array() : nullptr; }
-Dictionary* Array::dictionary(std::size_t index) noexcept {
-  return index < _size ? _values[index].dictionary() : nullptr;
+Array* Array::array(std::size_t index) {
+  if (index >= _size) return nullptr;
+  _values[index].ownContainer(*_arena);
+  return _values[index].array();
+}
+
+Dictionary* Array::dictionary(std::size_t index) {
+  if (index >= _size) return nullptr;
+  _values[index].ownContainer(*_arena);
+  return _values[index].dictionary();
 }
 
 void Array::reserve(std::size_t count) {

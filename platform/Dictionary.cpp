@@ -84,14 +84,18 @@ const Value& Dictionary::operator[](std::string_view key) const noexcept {
 
 bool Dictionary::contains(std::string_view key) const noexcept { return find(key) != nowhere; }
 
-Array* Dictionary::array(std::string_view key) noexcept {
+Array* Dictionary::array(std::string_view key) {
   std::size_t number = find(key);
-  return number == nowhere ? nullptr : _entries[number].value.array();
+  if (number == nowhere) return nullptr;
+  _entries[number].value.ownContainer(*_arena);
+  return _entries[number].value.array();
 }
 
-Dictionary* Dictionary::dictionary(std::string_view key) noexcept {
+Dictionary* Dictionary::dictionary(std::string_view key) {
   std::size_t number = find(key);
-  return number == nowhere ? nullptr : _entries[number].value.dictionary();
+  if (number == nowhere) return nullptr;
+  _entries[number].value.ownContainer(*_arena);
+  return _entries[number].value.dictionary();
 }
 
 /// Makes an index for so many entries at least. If a key is there twice, answers the number of the later entry

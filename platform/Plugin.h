@@ -14,7 +14,7 @@ namespace platform {
 /// taken back. It stays for what only one side sees: comments that say more of the same, functions that are not virtual
 /// and are compiled into each side, what the plug-in does behind `TSClient`. There is no partial match: a host takes a
 /// plug-in of its own number and refuses any other. Both are built with the same C++ standard library.
-constexpr std::uint32_t pluginInterfaceVersion = 3;
+constexpr std::uint32_t pluginInterfaceVersion = 4;
 
 /// What a plug-in's library answers from its entry point. The first field never moves; a host looks at the others
 /// only when the version is its own.

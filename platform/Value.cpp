@@ -146,16 +146,43 @@ Value Value::copiedInto(Arena& arena) const {
   return Value(*this);
 }
 
+/// A container that was lent to the arena becomes one of its own before it is changed; what it holds stays lent.
+void Value::ownContainer(Arena& arena) {
+  if (_kind == Kind::array && _payload.array->_arena != &arena) {
+    const Array& lent = *_payload.array;
+    auto* own = ::new (arena.allocate(sizeof(Array))) Array(&arena);
+    own->reserve(lent.size());
+    if (!lent.empty()) {
+      std::memcpy(static_cast<void*>(own->_values), static_cast<const void*>(lent._values),
+                  lent.size() * sizeof(Value));
+    }
+    own->_size = lent._size;
+    _payload.array = own;
+  } else if (_kind == Kind::dictionary && _payload.dictionary->_arena != &arena) {
+    const Dictionary& lent = *_payload.dictionary;
+    auto* own = ::new (arena.allocate(sizeof(Dictionary))) Dictionary(&arena);
+    if (!lent.empty()) {
+      void* entries = arena.allocate(lent.size() * sizeof(Dictionary::Entry));
+      std::memcpy(entries, static_cast<const void*>(lent._entries), lent.size() * sizeof(Dictionary::Entry));
+      own->_entries = static_cast<Dictionary::Entry*>(entries);
+      own->_size = own->_capacity = lent._size;
+      if (lent._index) own->buildIndex(own->_size);
+    }
+    _payload.dictionary = own;
+  }
+}
+
 /// Gives back to the arena what a contained value, which nobody will use again, points to.
 void Value::recycleInto(Arena& arena) const noexcept {
   if (holdsBytes()) {
     arena.recycle(_payload.bytes, _length);
   } else if (_kind == Kind::array) {
     const Array& array = *_payload.array;
+    if (array._arena != &arena) return;
     for (const Value& value : array) value.recycleInto(arena);
     arena.recycle(array._values, array._capacity * sizeof(Value));
     arena.recycle(&array, sizeof(Array));
-  } else if (_kind == Kind::dictionary) {
+  } else if (_kind == Kind::dictionary && _payload.dictionary->_arena == &arena) {
     _payload.dictionary->recycle();
   }
 }

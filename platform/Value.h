@@ -32,7 +32,7 @@ class ValueBuilder;
 /// that container is changed or its outermost Value goes. Copying a Value, putting one into a container
 /// and copying one out copy deeply, so nothing a caller keeps can dangle; moving an outermost Value is cheap.
 ///
-/// Typed access never throws and never converts: it answers nothing when the value is of another kind.
+/// Typed reading never throws and never converts: it answers nothing when the value is of another kind.
 /// A string or data of 4 GiB or more throws std::length_error, as a lack of memory throws std::bad_alloc.
 /// Not synchronised: one thread at a time may touch a Value that anybody changes.
 class Value {
@@ -128,6 +128,7 @@ class Value {
   void release() noexcept;
   Value copiedInto(Arena& arena) const;
   void recycleInto(Arena& arena) const noexcept;
+  void ownContainer(Arena& arena);
 
   Kind _kind = Kind::absent;
   bool _owning = false;    // this Value frees what _payload points to
@@ -153,9 +154,9 @@ class Array {
   const Value* begin() const noexcept { return _values; }
   const Value* end() const noexcept { return _values + _size; }
 
-  /// The container at the place, to be changed in place; null when there is none of that kind there.
-  Array* array(std::size_t index) noexcept;
-  Dictionary* dictionary(std::size_t index) noexcept;
+  /// The container at the place, to be changed in place; null when there is none of that kind. Throws std::bad_alloc.
+  Array* array(std::size_t index);
+  Dictionary* dictionary(std::size_t index);
 
   void reserve(std::size_t count);
   /// Copies deeply. An absent value is not appended.
@@ -195,9 +196,9 @@ class Dictionary {
   const Value& operator[](std::string_view key) const noexcept;
   bool contains(std::string_view key) const noexcept;
 
-  /// The container under the key, to be changed in place; null when there is none of that kind there.
-  Array* array(std::string_view key) noexcept;
-  Dictionary* dictionary(std::string_view key) noexcept;
+  /// The container under the key, to be changed in place; null when there is none of that kind. Throws std::bad_alloc.
+  Array* array(std::string_view key);
+  Dictionary* dictionary(std::string_view key);
 
   /// Copies deeply. Replaces an older value in its place; an absent value removes the entry.
   void set(std::string_view key, const Value& value);

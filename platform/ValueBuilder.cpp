@@ -67,6 +67,10 @@ Dictionary& ValueBuilder::makeDictionary(std::size_t count) {
   return *dictionary;
 }
 
+void ValueBuilder::lend(const Value* from, std::size_t count, Value* places) noexcept {
+  if (count) std::memcpy(static_cast<void*>(places), static_cast<const void*>(from), count * sizeof(Value));
+}
+
 void ValueBuilder::sealUnlike(Dictionary& dictionary) {
   if (dictionary._size > Dictionary::linearLimit) dictionary.buildIndex(dictionary._size);
 }

@@ -18,6 +18,10 @@ class ValueBuilder {
  public:
   explicit ValueBuilder(Bytes input) : _arena(std::make_unique<Arena>(std::move(input))) {}
 
+  /// What is made here may hold values that lie in what `lent` keeps. Nobody may change those; who is handed the
+  /// document and changes a container of them changes a copy of his own.
+  explicit ValueBuilder(std::shared_ptr<const void> lent) : _arena(std::make_unique<Arena>(std::move(lent))) {}
+
   BytesView input() const noexcept { return _arena->input(); }
   /// Room for text that is not in the input as it is; any number of values may point to it.
   char* allocateText(std::size_t size) { return _arena->allocateShared(size); }
@@ -34,6 +38,8 @@ class ValueBuilder {
   Array& makeArray(std::size_t count);
   Dictionary& makeDictionary(std::size_t count);
   static Value* places(Array& array) noexcept { return array._values; }
+  /// Puts values of one container into the places of another, as they are.
+  static void lend(const Value* from, std::size_t count, Value* places) noexcept;
   static Dictionary::Entry* places(Dictionary& dictionary) noexcept { return dictionary._entries; }
 
   /// Completes a dictionary whose entries are in their places. Answers the number of an entry whose key an

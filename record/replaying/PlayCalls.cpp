@@ -124,12 +124,14 @@ void releaseClient(Replayer& replayer, ItemReader& arguments, ItemWriter&) {
 
 void callNotified(Replayer& replayer, ItemReader& arguments, ItemWriter&) {
   const auto number = receiver(arguments, ObjectKind::observer);
-  const std::string name(arguments.text());
-  const auto userInfo = arguments.value();
+  std::string name;
+  platform::Value userInfo;
   std::shared_ptr<void> target;
   platform::KBNotificationCallback callback = nullptr;
   {
     Lock lock(replayer.mutex);
+    name = arguments.text();
+    userInfo = arguments.value();
     target = replayer.observed(number).notified.lock();
     callback = replayer.observed(number).callback;
   }

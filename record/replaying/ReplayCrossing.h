@@ -38,6 +38,11 @@ template <class T>
 void putGiven(Replayer& replayer, ItemWriter& items, const T& argument) {
   put(items, replayer, argument);
 }
+inline void putGiven(Replayer&, ItemWriter& items, const std::string_view& text) { items.lendText(Tag::text, text); }
+inline void putGiven(Replayer&, ItemWriter& items, const BytesArgument& argument) {
+  items.lendText(Tag::data, argument.bytes);
+}
+inline void putGiven(Replayer&, ItemWriter& items, const platform::Value& value) { items.lendValue(value); }
 void putGiven(Replayer& replayer, ItemWriter& items,
               const std::weak_ptr<platform::RVAppInstallObserverDelegate>& observer);
 void putGiven(Replayer& replayer, ItemWriter& items,
@@ -151,20 +156,17 @@ class ReplayCrossing {
   void removeObserver(const Operation& operation, const void* observer, std::string_view name) const;
 
  private:
-  template <class Result>
-  Result withoutAnswer(const Operation& operation, const std::string& arguments) const;
-
   template <class Result, class... Arguments>
   Result answer(const Operation& operation, const Numbered* receiver, Arguments&&... arguments) const {
     platform::Mutex::Lock lock(_replayer.mutex);
     ItemWriter items;
-    std::optional<std::string> answered;
+    std::optional<Event> answered;
     if (receiver) items.object(receiver->mention());
     (putGiven(_replayer, items, arguments), ...);
-    answered = _replayer.exchange(operation, items.take());
+    answered = _replayer.exchange(operation, items);
     try {
       if (answered) {
-        ItemReader reader(*answered);
+        ItemReader reader(answered->payload, &answered->large);
         if constexpr (std::is_void_v<Result>) {
           (getOut(_replayer, reader, arguments), ...);
           return;
@@ -246,6 +248,11 @@ struct Read<std::optional<T>> {
     if (items.takeAbsent()) return std::nullopt;
     return get<T>(replayer, items);
   }
+};
+/// The proxies of a list that is told again and again with changes.
+template <>
+struct Read<std::vector<platform::OBApplicationProxyRef>> {
+  static std::vector<platform::OBApplicationProxyRef> from(Replayer& replayer, ItemReader& items);
 };
 template <class T>
 struct Read<std::vector<T>> {

@@ -3,6 +3,7 @@
 
 #include "record/replaying/Replayer.h"
 #include "record/stream/CallText.h"
+#include "record/stream/Comparison.h"
 
 /// How a call that is not the recorded one is taken.
 namespace record {
@@ -32,17 +33,17 @@ const char* nameOf(Difference::Kind kind) {
 }
 
 /// True when the recording has an answer to the call, which is then the next to come for this thread.
-bool Replayer::match(Player& player, const Operation& operation, const std::string& arguments) {
+bool Replayer::match(Player& player, const Operation& operation, const ItemWriter& arguments) {
   const Event* next = head();
   if (!next) {
     passTurn();
     return false;
   }
-  if (isCall(*next) && isOf(*next, operation) && next->payload == arguments) {
+  if (isCall(*next) && isOf(*next, operation) && isSame(*next, arguments)) {
     pop();
     return true;
   }
-  const std::string came = callLine({operation.service, operation.name, operation.parameters}, arguments);
+  const std::string came = callLine({operation.service, operation.name, operation.parameters}, arguments.whole());
   if (auto place = findAhead(player, &operation, arguments)) {
     skipTo(player, *place, came);
     if (isOver()) return false;
@@ -62,7 +63,7 @@ bool Replayer::match(Player& player, const Operation& operation, const std::stri
 
 /// The place of that call of the thread in the rest of what it is inside of; without an operation, of its return.
 std::optional<std::size_t> Replayer::findAhead(const Player& player, const Operation* operation,
-                                               const std::string& arguments) {
+                                               const ItemWriter& arguments) {
   int depth = 0;
   for (std::size_t place = 0; place < farthestAhead; ++place) {
     while (_ahead.size() <= place) {
@@ -73,7 +74,7 @@ std::optional<std::size_t> Replayer::findAhead(const Player& player, const Opera
     const Event& event = _ahead[place];
     if (event.thread != player.number) continue;
     if (depth == 0 && event.kind == EventKind::leave) return operation ? std::nullopt : std::optional(place);
-    if (depth == 0 && operation && isCall(event) && isOf(event, *operation) && event.payload == arguments) return place;
+    if (depth == 0 && operation && isCall(event) && isOf(event, *operation) && isSame(event, arguments)) return place;
     depth += event.kind == EventKind::call || event.kind == EventKind::enter ? 1 : -1;
   }
   return std::nullopt;
@@ -125,7 +126,7 @@ Difference& Replayer::differ(Difference::Kind kind, const Player& player, const 
     difference.event = expected->number;
     difference.of = expected->kind == EventKind::call ? classOf(name) : OperationClass::service;
     const bool returns = expected->kind == EventKind::leave || expected->kind == EventKind::answer;
-    difference.expected = returns ? resultLine(name, expected->payload) : callLine(name, expected->payload);
+    difference.expected = returns ? resultLine(name, wholePayload(*expected)) : callLine(name, wholePayload(*expected));
   }
   _result.differences.push_back(std::move(difference));
   if (!_options.goOn || _result.differences.size() == mostDifferences) {
@@ -136,15 +137,18 @@ Difference& Replayer::differ(Difference::Kind kind, const Player& player, const 
 }
 
 /// The plug-in is listened to until the first message behind a difference: the one that it would have written.
-std::optional<std::string> Replayer::afterEnd(const Operation& operation, const std::string& arguments) {
+std::optional<Event> Replayer::afterEnd(const Operation& operation, const ItemWriter& arguments) {
   const std::string_view name = operation.name;
   if (std::string_view(operation.service) != "LogHandle") return std::nullopt;
-  ItemWriter answer;
   if (name == "isEnabled") {
+    ItemWriter answer;
     answer.boolean(true);
-    return answer.take();
+    Event event;
+    event.payload = answer.take();
+    return event;
   }
-  ItemReader reader(arguments);
+  const std::string whole = arguments.whole();
+  ItemReader reader(whole);
   reader.object();
   reader.number();
   _result.differences.back().message = reader.text();

@@ -217,6 +217,63 @@ platform::OBApplicationProxyRef Read<platform::OBApplicationProxyRef>::from(Repl
   return app;
 }
 
+namespace {
+
+using Proxies = std::vector<platform::OBApplicationProxyRef>;
+
+struct MadeProxies final : LargeText::Made {
+  Proxies proxies;
+};
+
+platform::OBApplicationProxyRef proxyOf(Replayer& replayer, std::string_view element) {
+  ItemReader items(element);
+  return get<platform::OBApplicationProxyRef>(replayer, items);
+}
+
+Proxies editedProxies(Replayer& replayer, const Proxies& before, const LargeText& list) {
+  Proxies proxies;
+  proxies.reserve(list.elementCount());
+  auto old = before.begin();
+  const auto keep = [&](std::size_t count) {
+    proxies.insert(proxies.end(), old, old + static_cast<std::ptrdiff_t>(count));
+    old += static_cast<std::ptrdiff_t>(count);
+  };
+  for (const auto& edit : list.edits()) {
+    keep(edit.keep);
+    old += static_cast<std::ptrdiff_t>(edit.drop);
+    for (std::size_t left = edit.insert; left > 0; --left)
+      proxies.push_back(proxyOf(replayer, list.element(proxies.size())));
+  }
+  keep(list.elementCount() - proxies.size());
+  return proxies;
+}
+
+}  // namespace
+
+Proxies Read<Proxies>::from(Replayer& replayer, ItemReader& items) {
+  const auto* list = items.nextLarge();
+  if (!list || !list->splitIntoElements()) {
+    ItemReader inside{{}};
+    ItemReader& reader = items.unpacked(inside);
+    Proxies proxies;
+    for (std::size_t count = reader.list(); count > 0; --count)
+      proxies.push_back(get<platform::OBApplicationProxyRef>(replayer, reader));
+    return proxies;
+  }
+  items.skip();
+  if (const auto known = std::dynamic_pointer_cast<const MadeProxies>(list->made())) return known->proxies;
+  auto made = std::make_shared<MadeProxies>();
+  const auto before = list->before() ? std::dynamic_pointer_cast<const MadeProxies>(list->before()->made()) : nullptr;
+  if (before) {
+    made->proxies = editedProxies(replayer, before->proxies, *list);
+  } else {
+    for (std::size_t at = 0; at < list->elementCount(); ++at)
+      made->proxies.push_back(proxyOf(replayer, list->element(at)));
+  }
+  list->setMade(made);
+  return made->proxies;
+}
+
 platform::TSProgressCallback Read<platform::TSProgressCallback>::from(Replayer& replayer, ItemReader& items) {
   if (items.takeAbsent()) return nullptr;
   const auto mention = items.object();
@@ -225,7 +282,7 @@ platform::TSProgressCallback Read<platform::TSProgressCallback>::from(Replayer& 
     ItemWriter arguments;
     arguments.object({ObjectKind::callback, mention.number, 0});
     arguments.real(fraction);
-    replayer.exchange(inbound::progress, arguments.take());
+    replayer.exchange(inbound::progress, arguments);
   };
 }
 
@@ -242,7 +299,7 @@ void ReplayCrossing<platform::NotificationCenter>::addObserver(
   }
   put(items, _replayer, name);
   put(items, _replayer, suspension);
-  _replayer.exchange(operation, items.take());
+  _replayer.exchange(operation, items);
 }
 
 template <>
@@ -255,7 +312,7 @@ void ReplayCrossing<platform::NotificationCenter>::removeObserver(const Operatio
   else
     items.absent();
   put(items, _replayer, name);
-  _replayer.exchange(operation, items.take());
+  _replayer.exchange(operation, items);
 }
 
 }  // namespace record

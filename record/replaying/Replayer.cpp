@@ -14,6 +14,7 @@
 #include "record/replaying/ReplayCrossing.h"
 #include "record/replaying/Story.h"
 #include "record/stream/CallText.h"
+#include "record/stream/Comparison.h"
 
 namespace record {
 
@@ -55,7 +56,7 @@ struct Replayer::Services {
 Replayer::Replayer(std::string_view recording, MakeClient makeClient, ReplayOptions options)
     : _makeClient(std::move(makeClient)),
       _options(std::move(options)),
-      _reader(recording),
+      _reader(recording, EventReader::Large::apart),
       _services(std::make_unique<Services>(*this)) {}
 
 Replayer::~Replayer() = default;
@@ -97,7 +98,7 @@ std::uint64_t Replayer::newNumber(ObjectKind kind) {
   const Event* next = head();
   if (next && _expectedOf != next->number) {
     _expectedOf = next->number;
-    _expected = newObjectsOf(next->payload);
+    _expected = newObjectsOf(*next);
   }
   (void)kind;
   if (_expected.empty()) return ++_ownNumber;
@@ -167,7 +168,7 @@ void Replayer::play(Player& player, const Event& event) {
     return refuse("event " + std::to_string(event.number) + ": " + operation.service + "." + operation.name +
                   " is no call into a plug-in");
   player.inside.push_back(operation);
-  ItemReader arguments(event.payload);
+  ItemReader arguments(event.payload, &event.large);
   ItemWriter result;
   std::string problem;
   mutex.unlock();
@@ -179,14 +180,14 @@ void Replayer::play(Player& player, const Event& event) {
   mutex.lock();
   player.inside.pop_back();
   if (!problem.empty() && !isOver()) refuse(problem);
-  if (!isOver()) leave(player, event, result.bytes());
+  if (!isOver()) leave(player, event, result);
   passTurn();
 }
 
-void Replayer::leave(Player& player, const Event& entered, const std::string& result) {
+void Replayer::leave(Player& player, const Event& entered, const ItemWriter& result) {
   const Event* next = head();
   if (next && next->kind != EventKind::leave) {
-    const auto place = findAhead(player, nullptr, {});
+    const auto place = findAhead(player, nullptr, result);
     if (!place && !_options.goOn) return void(differ(Difference::Kind::missing, player, next, {}));
     if (!place) return end();
     skipTo(player, *place, {});
@@ -194,15 +195,15 @@ void Replayer::leave(Player& player, const Event& entered, const std::string& re
     next = &_ahead[*place];
   }
   if (!next) return;
-  if (next->payload != result)
-    differ(Difference::Kind::otherResult, player, next, resultLine(nameOfEvent(entered), result));
+  if (!isSame(*next, result))
+    differ(Difference::Kind::otherResult, player, next, resultLine(nameOfEvent(entered), result.whole()));
   if (isOver()) return;
   auto at = std::find_if(_ahead.begin(), _ahead.end(), [&](const Event& event) { return &event == next; });
   _ahead.erase(at);
   ++_result.events;
 }
 
-std::optional<std::string> Replayer::exchange(const Operation& operation, const std::string& arguments) {
+std::optional<Event> Replayer::exchange(const Operation& operation, const ItemWriter& arguments) {
   auto* player = static_cast<Player*>(currentPlayer);
   if (isOver() && player && player == _messenger) return afterEnd(operation, arguments);
   if (isOver() || !player || ignores(operation)) return std::nullopt;
@@ -216,16 +217,16 @@ std::optional<std::string> Replayer::exchange(const Operation& operation, const 
   return awaitAnswer(*player);
 }
 
-std::optional<std::string> Replayer::awaitAnswer(Player& player) {
+std::optional<Event> Replayer::awaitAnswer(Player& player) {
   while (awaitTurn(player)) {
     Event event = pop();
     if (event.kind == EventKind::enter) {
       play(player, event);
       continue;
     }
-    if (event.kind == EventKind::answer) return std::move(event.payload);
+    if (event.kind == EventKind::answer) return event;
     if (event.kind != EventKind::threw) break;
-    ItemReader said(event.payload);
+    ItemReader said(event.payload, &event.large);
     const Tag tag = event.payload.empty() ? Tag::absent : said.peek();
     if (tag == Tag::absent) throw std::bad_alloc();
     if (tag == Tag::text) throw std::runtime_error(std::string(said.text()));

@@ -52,7 +52,7 @@ class Replayer : public Names {
 
   /// A call of the plug-in with these arguments: the recorded answer; nothing when there is none. Throws what the
   /// service threw.
-  std::optional<std::string> exchange(const Operation& operation, const std::string& arguments) REQUIRES(mutex);
+  std::optional<Event> exchange(const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
   /// The plug-in goes on waiting where it had not to.
   void stands(const Operation& operation) REQUIRES(mutex);
   /// The recording holds what no recording holds.
@@ -106,19 +106,19 @@ class Replayer : public Names {
 
   void playAll(Player& player);
   void play(Player& player, const Event& event) REQUIRES(mutex);
-  void leave(Player& player, const Event& entered, const std::string& result) REQUIRES(mutex);
+  void leave(Player& player, const Event& entered, const ItemWriter& result) REQUIRES(mutex);
   void passTurn() REQUIRES(mutex);
   bool awaitTurn(Player& player) REQUIRES(mutex);
-  std::optional<std::string> awaitAnswer(Player& player) REQUIRES(mutex);
+  std::optional<Event> awaitAnswer(Player& player) REQUIRES(mutex);
   void end() REQUIRES(mutex);
 
-  bool match(Player& player, const Operation& operation, const std::string& arguments) REQUIRES(mutex);
-  std::optional<std::size_t> findAhead(const Player& player, const Operation* operation, const std::string& arguments)
+  bool match(Player& player, const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
+  std::optional<std::size_t> findAhead(const Player& player, const Operation* operation, const ItemWriter& arguments)
       REQUIRES(mutex);
   void skipTo(const Player& player, std::size_t place, std::string_view came) REQUIRES(mutex);
   Difference& differ(Difference::Kind kind, const Player& player, const Event* expected, std::string came)
       REQUIRES(mutex);
-  std::optional<std::string> afterEnd(const Operation& operation, const std::string& arguments) REQUIRES(mutex);
+  std::optional<Event> afterEnd(const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
   std::vector<std::string> standing() const REQUIRES(mutex);
   OperationName nameOfEvent(const Event& event) const REQUIRES(mutex);
 

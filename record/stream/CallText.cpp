@@ -184,14 +184,12 @@ void collect(ItemReader& items, std::deque<std::uint64_t>& numbers) {
       if (mention.flags & ObjectMention::hasFacts) items.skip();
       return;
     }
-    case Tag::list: {
-      for (std::size_t count = items.list(); count > 0; --count) collect(items, numbers);
-      return;
-    }
+    case Tag::list:
     case Tag::packed: {
       ItemReader inside{{}};
-      ItemReader& packed = items.unpacked(inside);
-      if (packed.peek() == Tag::list) return collect(packed, numbers);
+      ItemReader& list = items.unpacked(inside);
+      if (list.peek() != Tag::list) return;
+      for (std::size_t count = list.list(); count > 0; --count) collect(list, numbers);
       return;
     }
     default:
@@ -201,10 +199,10 @@ void collect(ItemReader& items, std::deque<std::uint64_t>& numbers) {
 
 }  // namespace
 
-std::deque<std::uint64_t> newObjectsOf(std::string_view payload) {
+std::deque<std::uint64_t> newObjectsOf(const Event& event) {
   std::deque<std::uint64_t> numbers;
   try {
-    for (ItemReader items(payload); !items.atEnd();) collect(items, numbers);
+    for (ItemReader items(event.payload, &event.large); !items.atEnd();) collect(items, numbers);
   } catch (const RecordingError&) {
     return numbers;
   }

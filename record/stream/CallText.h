@@ -19,6 +19,6 @@ std::string itemText(std::string_view item);
 
 OperationClass classOf(const OperationName& operation);
 /// The numbers of the objects that are mentioned for the first time, in their order.
-std::deque<std::uint64_t> newObjectsOf(std::string_view payload);
+std::deque<std::uint64_t> newObjectsOf(const Event& event);
 
 }  // namespace record

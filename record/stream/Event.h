@@ -2,8 +2,9 @@
 
 #include <cstdint>
 #include <string>
+#include <vector>
 
-#include "platform/Value.h"
+#include "record/stream/HeardTexts.h"
 
 namespace record {
 
@@ -42,11 +43,12 @@ struct OperationName {
 struct Event {
   EventKind kind = EventKind::end;
   std::uint32_t thread = 0;
-  std::uint32_t operation = 0;  // of a call and an enter: its place in the reader's list; an answer and a leave have
-                                // that of what they answer
-  std::uint64_t number = 0;     // its place in the recording, from 1
-  std::uint64_t time = 0;       // of an enter: microseconds since the recording began
-  std::string payload;          // items (see Item.h)
+  std::uint32_t operation = 0;   // of a call and an enter: its place in the reader's list; an answer and a leave have
+                                 // that of what they answer
+  std::uint64_t number = 0;      // its place in the recording, from 1
+  std::uint64_t time = 0;        // of an enter: microseconds since the recording began
+  std::string payload;           // items (see Item.h)
+  std::vector<LargePart> large;  // what of them is not in the payload itself, if the reader was asked for that
 };
 
 }  // namespace record

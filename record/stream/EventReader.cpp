@@ -37,7 +37,8 @@ struct EventReader::Decompression {
   bool ended = false;
 };
 
-EventReader::EventReader(std::string_view bytes) : _decompression(std::make_unique<Decompression>()) {
+EventReader::EventReader(std::string_view bytes, Large large)
+    : _large(large), _decompression(std::make_unique<Decompression>()) {
   if (!_decompression->context) throw std::bad_alloc();
   ZSTD_DCtx_setParameter(_decompression->context.get(), ZSTD_d_windowLogMax, largestWindowLog);
   _over = true;
@@ -111,7 +112,9 @@ void EventReader::enterInto(Event& event) {
   }
   if (event.kind == EventKind::enter) event.time = varint();
   event.payload.clear();
-  for (std::uint64_t items = count(mostParts, "number of items"); items > 0; --items) item(event.payload, 0);
+  event.large.clear();
+  _apart = 0;
+  for (std::uint64_t items = count(mostParts, "number of items"); items > 0; --items) item(event, 0);
   place(event);
   _lastThread = event.thread;
   event.number = ++_events;
@@ -148,10 +151,11 @@ void EventReader::appendSized(std::string& into, std::uint8_t tag, std::string_v
 }
 
 /// Reads one item, and puts in what stands for known texts.
-void EventReader::item(std::string& into, std::size_t depth) {
+void EventReader::item(Event& event, std::size_t depth) {
+  std::string& into = event.payload;
   if (depth > deepestItem) refuse("an item is nested too deeply");
   const std::uint8_t tag = byte();
-  if (tag & stream::knownBit) return known(into, tag & static_cast<std::uint8_t>(~stream::knownBit));
+  if (tag & stream::knownBit) return known(event, tag & static_cast<std::uint8_t>(~stream::knownBit));
   if (tag > static_cast<std::uint8_t>(Tag::packed)) refuse("an item has an unknown tag");
   into.push_back(static_cast<char>(tag));
   bounded(into);
@@ -176,29 +180,29 @@ void EventReader::item(std::string& into, std::size_t depth) {
     case Tag::list:
     case Tag::dictionary:
     case Tag::error:
-      return container(into, static_cast<Tag>(tag), depth);
+      return container(event, static_cast<Tag>(tag), depth);
     case Tag::object: {
       into.push_back(static_cast<char>(byte()));
       appendVarint(into, varint());
       const std::uint8_t flags = byte();
       into.push_back(static_cast<char>(flags));
-      if (flags & ObjectMention::hasFacts) item(into, depth + 1);
+      if (flags & ObjectMention::hasFacts) item(event, depth + 1);
       return;
     }
   }
 }
 
-void EventReader::container(std::string& into, Tag tag, std::size_t depth) {
+void EventReader::container(Event& event, Tag tag, std::size_t depth) {
   std::size_t parts = 4;
   if (tag != Tag::error) {
     parts = count(mostParts, "number of items");
-    appendVarint(into, parts);
+    appendVarint(event.payload, parts);
   }
   if (tag == Tag::dictionary) parts *= 2;
-  while (parts-- > 0) item(into, depth + 1);
+  while (parts-- > 0) item(event, depth + 1);
 }
 
-void EventReader::known(std::string& into, std::uint8_t tag) {
+void EventReader::known(Event& event, std::uint8_t tag) {
   const auto of = static_cast<Tag>(tag);
   const bool isSized = of == Tag::text || of == Tag::data || of == Tag::packed;
   if (!isSized && of != Tag::list) refuse("an item has an unknown tag");
@@ -209,18 +213,18 @@ void EventReader::known(std::string& into, std::uint8_t tag) {
     case Known::medium: {
       const std::uint64_t place = varint();
       if (place >= _known.count()) refuse("a text is not known");
-      return appendSized(into, tag, _known[place]);
+      return appendSized(event.payload, tag, _known[place]);
     }
     case Known::newMedium: {
       copy(bytes, count(KnownTexts::end, "length"));
       _known.add(bytes, false);
-      return appendSized(into, tag, bytes);
+      return appendSized(event.payload, tag, bytes);
     }
     case Known::large:
-      return appendLarge(into, tag, _heard.use(slot()));
+      return appendLarge(event, tag, _heard.use(slot()));
     case Known::newLarge:
       copy(bytes, count(LargeTexts::largestKept, "length"));
-      return appendLarge(into, tag, _heard.keep(std::make_shared<LargeText>(std::move(bytes))));
+      return appendLarge(event, tag, _heard.keep(std::make_shared<LargeText>(std::move(bytes))));
     case Known::changed: {
       const std::size_t base = slot();
       const std::size_t size = _heard.at(base)->size();
@@ -228,10 +232,10 @@ void EventReader::known(std::string& into, std::uint8_t tag) {
       const std::uint64_t end = varint();
       if (begin > size || end > size - begin) refuse("bytes are longer than those they are made of");
       copy(bytes, count(LargeTexts::largestKept - begin - end, "length"));
-      return appendLarge(into, tag, _heard.keep(_heard.changed(base, begin, end, std::move(bytes))));
+      return appendLarge(event, tag, _heard.keep(_heard.changed(base, begin, end, std::move(bytes))));
     }
     case Known::edited:
-      return appendLarge(into, tag, _heard.keep(edited()));
+      return appendLarge(event, tag, _heard.keep(edited()));
   }
   refuse("a text is known in no way there is");
 }
@@ -263,14 +267,24 @@ LargeTextRef EventReader::edited() {
   return list.finish();
 }
 
-void EventReader::appendLarge(std::string& into, std::uint8_t tag, const LargeTextRef& text) {
-  if (static_cast<Tag>(tag) == Tag::list) {
-    if (!text->splitIntoElements()) refuse("a list is none");
-  } else {
+void EventReader::appendLarge(Event& event, std::uint8_t tag, const LargeTextRef& text) {
+  std::string& into = event.payload;
+  const bool isList = static_cast<Tag>(tag) == Tag::list;
+  if (isList && !text->splitIntoElements()) refuse("a list is none");
+  if (text->size() > largestPayload - std::min(largestPayload, into.size() + _apart)) refuse("an event is too large");
+  if (_large == Large::apart) {
+    // Many small ones take room, too.
+    _apart += std::max(text->size(), KnownTexts::end);
+    const std::size_t begin = into.size();
+    into.push_back(static_cast<char>(tag | stream::knownBit));
+    appendVarint(into, event.large.size());
+    event.large.push_back({begin, into.size(), text});
+    return;
+  }
+  if (!isList) {
     into.push_back(static_cast<char>(tag));
     appendVarint(into, text->size());
   }
-  if (text->size() > largestPayload - std::min(largestPayload, into.size())) refuse("an event is too large");
   text->appendTo(into);
 }
 

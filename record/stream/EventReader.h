@@ -20,8 +20,11 @@ class ItemReader;
 /// with what is wrong and where. Holds a bounded amount of memory.
 class EventReader {
  public:
+  /// Where large texts go that are told by what was told before: into the payload as any other, or, for who would have
+  /// the same ones again, beside it.
+  enum class Large { within, apart };
   /// `bytes` is a whole recording, and outlives the reader.
-  explicit EventReader(std::string_view bytes);
+  explicit EventReader(std::string_view bytes, Large large = Large::within);
   ~EventReader();
   EventReader(const EventReader&) = delete;
   EventReader& operator=(const EventReader&) = delete;
@@ -48,12 +51,12 @@ class EventReader {
   bool readEvent(Event& event);
   void place(Event& event);
   void enterInto(Event& event);
-  void item(std::string& into, std::size_t depth);
-  void container(std::string& into, Tag tag, std::size_t depth);
-  void known(std::string& into, std::uint8_t tag);
+  void item(Event& event, std::size_t depth);
+  void container(Event& event, Tag tag, std::size_t depth);
+  void known(Event& event, std::uint8_t tag);
   std::size_t slot();
   LargeTextRef edited();
-  void appendLarge(std::string& into, std::uint8_t tag, const LargeTextRef& text);
+  void appendLarge(Event& event, std::uint8_t tag, const LargeTextRef& text);
   void bounded(const std::string& payload) const;
   void appendSized(std::string& into, std::uint8_t tag, std::string_view bytes) const;
 
@@ -64,6 +67,8 @@ class EventReader {
   std::string shortText();
   bool refill();
 
+  const Large _large;
+  std::size_t _apart = 0;  // bytes of this event that are beside its payload
   std::unique_ptr<Decompression> _decompression;
   std::string_view _window;  // what is decompressed and not read yet
   KnownTexts _known;

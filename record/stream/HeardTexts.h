@@ -74,6 +74,14 @@ class LargeText {
 };
 using LargeTextRef = std::shared_ptr<const LargeText>;
 
+/// A large text apart from the items that it is one of: there its tag stands with a bit, and its number in the list of
+/// these.
+struct LargePart {
+  std::size_t begin;  // in the items
+  std::size_t end;
+  LargeTextRef text;
+};
+
 /// Makes a list of another one. Throws `RecordingError` for what the other one has not.
 class ListEditing {
  public:

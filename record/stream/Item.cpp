@@ -6,6 +6,8 @@
 
 #include "platform/ValueBuilder.h"
 #include "record/RecordingError.h"
+#include "record/stream/SharedValue.h"
+#include "record/stream/StreamFormat.h"
 
 namespace record {
 
@@ -85,6 +87,8 @@ class ValueReading {
 
 }  // namespace
 
+Value containedValue(ValueBuilder& builder, ItemReader& items) { return ValueReading(builder, items).read(); }
+
 const char* nameOf(ObjectKind kind) { return kindNames[static_cast<std::size_t>(kind)]; }
 
 void appendVarint(std::string& bytes, std::uint64_t value) {
@@ -127,6 +131,30 @@ void ItemWriter::packFrom(std::size_t begin) {
   _bytes.insert(begin, head);
 }
 
+void ItemWriter::Lent::putInto(ItemWriter& items) const { list ? items.value(*list) : items.sized(tag, bytes); }
+
+void ItemWriter::lendText(Tag tag, std::string_view bytes) {
+  if (bytes.size() < LargeTexts::from) return sized(tag, bytes);
+  _lent.push_back({_bytes.size(), tag, bytes});
+}
+
+void ItemWriter::lendValue(const Value& value) {
+  if (!value.array() || value.array()->empty()) return this->value(value);
+  _lent.push_back({_bytes.size(), Tag::list, {}, &value});
+}
+
+std::string ItemWriter::whole() const {
+  ItemWriter items;
+  std::size_t at = 0;
+  for (const auto& lent : _lent) {
+    items.items(std::string_view(_bytes).substr(at, lent.place - at));
+    lent.putInto(items);
+    at = lent.place;
+  }
+  items.items(std::string_view(_bytes).substr(at));
+  return items.take();
+}
+
 void ItemWriter::value(const Value& value) {
   const std::size_t begin = _bytes.size();
   bareValue(value);
@@ -165,9 +193,16 @@ void ItemWriter::bareValue(const Value& value) {
 
 Tag ItemReader::peek() const {
   if (_rest.empty()) refuse("it ends where an item should be");
-  const auto tag = static_cast<std::uint8_t>(_rest.front());
+  auto tag = static_cast<std::uint8_t>(_rest.front());
+  if (_large) tag &= static_cast<std::uint8_t>(~stream::knownBit);
   if (tag > static_cast<std::uint8_t>(Tag::packed)) refuse("an item has an unknown tag");
   return static_cast<Tag>(tag);
+}
+
+const LargeText* ItemReader::nextLarge() const {
+  if (!_large || _rest.empty() || !(static_cast<std::uint8_t>(_rest.front()) & stream::knownBit)) return nullptr;
+  ItemReader number(_rest.substr(1));
+  return (*_large)[number.varint()].text.get();
 }
 
 Tag ItemReader::tag() {
@@ -236,14 +271,22 @@ double ItemReader::real() {
   return fixed();
 }
 
+/// The bytes behind a tag, wherever they are.
+std::string_view ItemReader::sized() {
+  const auto* large = nextLarge();
+  _rest.remove_prefix(1);
+  const std::uint64_t number = varint();
+  return large ? large->flat() : bytes(number);
+}
+
 std::string_view ItemReader::text() {
-  expect(Tag::text, "a text");
-  return bytes(varint());
+  if (peek() != Tag::text) refuse("an item should be a text");
+  return sized();
 }
 
 platform::BytesView ItemReader::data() {
-  expect(Tag::data, "bytes");
-  return bytes(varint());
+  if (peek() != Tag::data) refuse("an item should be bytes");
+  return sized();
 }
 
 double ItemReader::date() {
@@ -277,17 +320,26 @@ ObjectMention ItemReader::object() {
 }
 
 std::string_view ItemReader::packedBytes() {
-  expect(Tag::packed, "a packed item");
-  return bytes(varint());
+  if (peek() != Tag::packed) refuse("an item should be a packed item");
+  return sized();
 }
 
 ItemReader& ItemReader::unpacked(ItemReader& inside) {
-  if (peek() != Tag::packed) return *this;
-  inside = ItemReader(packedBytes());
+  if (peek() == Tag::packed) {
+    inside = ItemReader(packedBytes());
+  } else if (nextLarge()) {
+    inside = ItemReader(sized());
+  } else {
+    return *this;
+  }
   return inside;
 }
 
 Value ItemReader::value() {
+  if (const auto* large = nextLarge(); large && large->splitIntoElements()) {
+    skip();
+    return sharedValue(*large);
+  }
   ItemReader inside{{}};
   // The values keep a copy of their own bytes, in which they find their texts.
   std::string_view item;
@@ -309,7 +361,9 @@ Value ItemReader::value() {
 std::string_view ItemReader::skip(std::size_t depth) {
   if (depth > deepestItem) refuse("an item is nested too deeply");
   const std::string_view begin = _rest;
-  switch (tag()) {
+  const bool isLarge = nextLarge();
+  const Tag next = tag();
+  switch (isLarge ? Tag::number : next) {
     case Tag::absent:
     case Tag::no:
     case Tag::yes:
@@ -330,19 +384,16 @@ std::string_view ItemReader::skip(std::size_t depth) {
     case Tag::list:
     case Tag::error:
     case Tag::dictionary: {
-      ItemReader again(begin);
-      const Tag which = again.peek();
-      std::uint64_t count = which == Tag::error ? 4 : varint();
-      if (which == Tag::dictionary) count = count > _rest.size() ? _rest.size() + 1 : 2 * count;
+      std::uint64_t count = next == Tag::error ? 4 : varint();
+      if (next == Tag::dictionary) count = count > _rest.size() ? _rest.size() + 1 : 2 * count;
       for (std::uint64_t i = 0; i < count; ++i) skip(depth + 1);
       break;
     }
-    case Tag::object: {
+    case Tag::object:
       bytes(1);
       varint();
       if (static_cast<unsigned char>(bytes(1).front()) & ObjectMention::hasFacts) skip(depth + 1);
       break;
-    }
   }
   return begin.substr(0, begin.size() - _rest.size());
 }

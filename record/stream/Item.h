@@ -6,6 +6,7 @@
 #include <string_view>
 
 #include "platform/Value.h"
+#include "record/stream/HeardTexts.h"
 
 namespace record {
 
@@ -76,6 +77,22 @@ class ItemWriter {
   std::string take() { return std::move(_bytes); }
   void clear() { _bytes.clear(); }
 
+  /// One item that is only looked at, to be compared with another one: it is not in `bytes`, which have `place` where
+  /// it should be, and has to outlive this.
+  struct Lent {
+    std::size_t place;
+    Tag tag;
+    std::string_view bytes{};
+    const platform::Value* list = nullptr;  // what it is, if it is no text and no bytes
+    void putInto(ItemWriter& items) const;
+  };
+  /// Lends texts and bytes that are large, and lists; writes others.
+  void lendText(Tag tag, std::string_view bytes);
+  void lendValue(const platform::Value& value);
+  const std::vector<Lent>& lent() const { return _lent; }
+  /// All items, those that were lent too.
+  std::string whole() const;
+
   void absent() { tag(Tag::absent); }
   void boolean(bool value) { tag(value ? Tag::yes : Tag::no); }
   void number(std::uint64_t value) {
@@ -121,6 +138,7 @@ class ItemWriter {
   void bareValue(const platform::Value& value);
 
   std::string _bytes;
+  std::vector<Lent> _lent;
 };
 
 void appendVarint(std::string& bytes, std::uint64_t value);
@@ -129,10 +147,14 @@ void appendVarint(std::string& bytes, std::uint64_t value);
 /// `RecordingError` at what no item can be.
 class ItemReader {
  public:
-  explicit ItemReader(std::string_view bytes) : _rest(bytes) {}
+  /// `large`: what is beside the items, if something is.
+  explicit ItemReader(std::string_view bytes, const std::vector<LargePart>* large = nullptr)
+      : _rest(bytes), _large(large) {}
 
   bool atEnd() const { return _rest.empty(); }
   std::string_view rest() const { return _rest; }
+  /// The text that is beside the items and comes next; null when what comes is here.
+  const LargeText* nextLarge() const;
   Tag peek() const;
 
   /// True, and past it, when an absent item comes.
@@ -161,9 +183,11 @@ class ItemReader {
 
  private:
   void expect(Tag wanted, const char* what);
+  std::string_view sized();
   double fixed();
 
   std::string_view _rest;
+  const std::vector<LargePart>* _large;
 };
 
 }  // namespace record
