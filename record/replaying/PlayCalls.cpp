@@ -22,6 +22,13 @@ struct Argument {
   void putOut(Replayer&, ItemWriter&) const {}
 };
 template <>
+struct Argument<const Proxies&> {
+  std::shared_ptr<const Proxies> value{};
+  void read(Replayer& replayer, ItemReader& items) { value = proxiesOf(replayer, items); }
+  const Proxies& pass() const { return *value; }
+  void putOut(Replayer&, ItemWriter&) const {}
+};
+template <>
 struct Argument<std::string_view> {
   std::string value{};
   void read(Replayer&, ItemReader& items) { value = items.text(); }

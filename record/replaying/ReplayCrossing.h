@@ -212,7 +212,7 @@ struct Read<double> {
 };
 template <>
 struct Read<std::string> {
-  static std::string from(Replayer&, ItemReader& items) { return std::string(items.text()); }
+  static std::string from(Replayer&, ItemReader& items) { return items.ownText(); }
 };
 template <>
 struct Read<platform::Value> {
@@ -249,11 +249,9 @@ struct Read<std::optional<T>> {
     return get<T>(replayer, items);
   }
 };
-/// The proxies of a list that is told again and again with changes.
-template <>
-struct Read<std::vector<platform::OBApplicationProxyRef>> {
-  static std::vector<platform::OBApplicationProxyRef> from(Replayer& replayer, ItemReader& items);
-};
+/// The proxies of a list that is told again and again with changes: what it keeps of them is made once.
+using Proxies = std::vector<platform::OBApplicationProxyRef>;
+std::shared_ptr<const Proxies> proxiesOf(Replayer& replayer, ItemReader& items);
 template <class T>
 struct Read<std::vector<T>> {
   static std::vector<T> from(Replayer& replayer, ItemReader& items) {

@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <cstring>
 #include <utility>
 
@@ -219,8 +220,6 @@ platform::OBApplicationProxyRef Read<platform::OBApplicationProxyRef>::from(Repl
 
 namespace {
 
-using Proxies = std::vector<platform::OBApplicationProxyRef>;
-
 struct MadeProxies final : LargeText::Made {
   Proxies proxies;
 };
@@ -230,48 +229,55 @@ platform::OBApplicationProxyRef proxyOf(Replayer& replayer, std::string_view ele
   return get<platform::OBApplicationProxyRef>(replayer, items);
 }
 
-Proxies editedProxies(Replayer& replayer, const Proxies& before, const LargeText& list) {
-  Proxies proxies;
-  proxies.reserve(list.elementCount());
-  auto old = before.begin();
-  const auto keep = [&](std::size_t count) {
-    proxies.insert(proxies.end(), old, old + static_cast<std::ptrdiff_t>(count));
-    old += static_cast<std::ptrdiff_t>(count);
-  };
-  for (const auto& edit : list.edits()) {
-    keep(edit.keep);
-    old += static_cast<std::ptrdiff_t>(edit.drop);
-    for (std::size_t left = edit.insert; left > 0; --left)
-      proxies.push_back(proxyOf(replayer, list.element(proxies.size())));
+/// What was made of the list before becomes what is made of this one; nobody but the list before may have it.
+void edit(Replayer& replayer, Proxies& proxies, const LargeText& list) {
+  auto at = proxies.begin();
+  for (const auto& each : list.edits()) {
+    at += static_cast<std::ptrdiff_t>(each.keep);
+    const std::size_t replaced = std::min(each.drop, each.insert);
+    std::size_t number = static_cast<std::size_t>(at - proxies.begin());
+    for (std::size_t left = replaced; left > 0; --left) *at++ = proxyOf(replayer, list.element(number++));
+    at = proxies.erase(at, at + static_cast<std::ptrdiff_t>(each.drop - replaced));
+    for (std::size_t left = each.insert - replaced; left > 0; --left)
+      at = proxies.insert(at, proxyOf(replayer, list.element(number++))) + 1;
   }
-  keep(list.elementCount() - proxies.size());
-  return proxies;
+}
+
+std::shared_ptr<const MadeProxies> madeProxies(Replayer& replayer, const LargeText& list) {
+  if (auto known = std::dynamic_pointer_cast<const MadeProxies>(list.made())) return known;
+  auto made = std::make_shared<MadeProxies>();
+  const auto* before = list.before();
+  auto old = before ? std::dynamic_pointer_cast<const MadeProxies>(before->made()) : nullptr;
+  if (old) {
+    before->setMade(nullptr);
+    if (old.use_count() == 1)
+      made = std::const_pointer_cast<MadeProxies>(std::move(old));
+    else
+      made->proxies = old->proxies;
+    edit(replayer, made->proxies, list);
+  } else {
+    for (std::size_t at = 0; at < list.elementCount(); ++at)
+      made->proxies.push_back(proxyOf(replayer, list.element(at)));
+  }
+  list.setMade(made);
+  return made;
 }
 
 }  // namespace
 
-Proxies Read<Proxies>::from(Replayer& replayer, ItemReader& items) {
+std::shared_ptr<const Proxies> proxiesOf(Replayer& replayer, ItemReader& items) {
   const auto* list = items.nextLarge();
-  if (!list || !list->splitIntoElements()) {
-    ItemReader inside{{}};
-    ItemReader& reader = items.unpacked(inside);
-    Proxies proxies;
-    for (std::size_t count = reader.list(); count > 0; --count)
-      proxies.push_back(get<platform::OBApplicationProxyRef>(replayer, reader));
-    return proxies;
+  if (list && list->splitIntoElements()) {
+    items.skip();
+    auto made = madeProxies(replayer, *list);
+    return {made, &made->proxies};
   }
-  items.skip();
-  if (const auto known = std::dynamic_pointer_cast<const MadeProxies>(list->made())) return known->proxies;
-  auto made = std::make_shared<MadeProxies>();
-  const auto before = list->before() ? std::dynamic_pointer_cast<const MadeProxies>(list->before()->made()) : nullptr;
-  if (before) {
-    made->proxies = editedProxies(replayer, before->proxies, *list);
-  } else {
-    for (std::size_t at = 0; at < list->elementCount(); ++at)
-      made->proxies.push_back(proxyOf(replayer, list->element(at)));
-  }
-  list->setMade(made);
-  return made->proxies;
+  ItemReader inside{{}};
+  ItemReader& reader = items.unpacked(inside);
+  auto proxies = std::make_shared<Proxies>();
+  for (std::size_t count = reader.list(); count > 0; --count)
+    proxies->push_back(get<platform::OBApplicationProxyRef>(replayer, reader));
+  return proxies;
 }
 
 platform::TSProgressCallback Read<platform::TSProgressCallback>::from(Replayer& replayer, ItemReader& items) {

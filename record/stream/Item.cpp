@@ -284,6 +284,17 @@ std::string_view ItemReader::text() {
   return sized();
 }
 
+/// One that is told in pieces is put together where it goes.
+std::string ItemReader::ownText() {
+  const auto* large = nextLarge();
+  if (!large || peek() != Tag::text) return std::string(text());
+  std::string own;
+  own.reserve(large->size());
+  large->appendTo(own);
+  skip();
+  return own;
+}
+
 platform::BytesView ItemReader::data() {
   if (peek() != Tag::data) refuse("an item should be bytes");
   return sized();

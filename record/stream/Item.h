@@ -164,6 +164,7 @@ class ItemReader {
   std::int64_t signedNumber();
   double real();
   std::string_view text();
+  std::string ownText();
   platform::BytesView data();
   double date();
   std::size_t list();
