@@ -11,6 +11,7 @@
 #include <utility>
 #include <vector>
 
+#include "platform/Value.h"
 #include "record/Sink.h"
 #include "record/stream/Comparison.h"
 #include "record/stream/Event.h"
@@ -215,6 +216,19 @@ TEST(RecordingStream, WhatCameIsComparedWhereItIs) {
     EXPECT_FALSE(came(1, text + "more", list.bytes(), isLent, false));
     EXPECT_FALSE(came(1, text, ChangingList(59).bytes(), isLent, false));
     EXPECT_FALSE(came(1, text, list.bytes(), isLent, true));
+  }
+}
+
+TEST(RecordingStream, WhatIsPartOfAnotherItemIsReadWithIt) {
+  platform::Value entries = platform::Value::makeDictionary();
+  entries.dictionary()->set("large", noise(3000, 1));
+  ItemWriter items;
+  items.value(entries);
+  const auto read = readAll(recordingOf({items.bytes(), items.bytes()}), EventReader::Large::apart);
+  for (const auto& event : {read.events.at(0), read.events.at(2)}) {
+    record::ItemReader reader(event.payload, &event.large);
+    EXPECT_EQ(reader.value(), entries);
+    EXPECT_TRUE(reader.atEnd());
   }
 }
 

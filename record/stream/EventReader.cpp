@@ -155,7 +155,7 @@ void EventReader::item(Event& event, std::size_t depth) {
   std::string& into = event.payload;
   if (depth > deepestItem) refuse("an item is nested too deeply");
   const std::uint8_t tag = byte();
-  if (tag & stream::knownBit) return known(event, tag & static_cast<std::uint8_t>(~stream::knownBit));
+  if (tag & stream::knownBit) return known(event, depth, tag & static_cast<std::uint8_t>(~stream::knownBit));
   if (tag > static_cast<std::uint8_t>(Tag::packed)) refuse("an item has an unknown tag");
   into.push_back(static_cast<char>(tag));
   bounded(into);
@@ -202,7 +202,7 @@ void EventReader::container(Event& event, Tag tag, std::size_t depth) {
   while (parts-- > 0) item(event, depth + 1);
 }
 
-void EventReader::known(Event& event, std::uint8_t tag) {
+void EventReader::known(Event& event, std::size_t depth, std::uint8_t tag) {
   const auto of = static_cast<Tag>(tag);
   const bool isSized = of == Tag::text || of == Tag::data || of == Tag::packed;
   if (!isSized && of != Tag::list) refuse("an item has an unknown tag");
@@ -221,10 +221,10 @@ void EventReader::known(Event& event, std::uint8_t tag) {
       return appendSized(event.payload, tag, bytes);
     }
     case Known::large:
-      return appendLarge(event, tag, _heard.use(slot()));
+      return appendLarge(event, depth, tag, _heard.use(slot()));
     case Known::newLarge:
       copy(bytes, count(LargeTexts::largestKept, "length"));
-      return appendLarge(event, tag, _heard.keep(std::make_shared<LargeText>(std::move(bytes))));
+      return appendLarge(event, depth, tag, _heard.keep(std::make_shared<LargeText>(std::move(bytes))));
     case Known::changed: {
       const std::size_t base = slot();
       const std::size_t size = _heard.at(base)->size();
@@ -232,10 +232,10 @@ void EventReader::known(Event& event, std::uint8_t tag) {
       const std::uint64_t end = varint();
       if (begin > size || end > size - begin) refuse("bytes are longer than those they are made of");
       copy(bytes, count(LargeTexts::largestKept - begin - end, "length"));
-      return appendLarge(event, tag, _heard.keep(_heard.changed(base, begin, end, std::move(bytes))));
+      return appendLarge(event, depth, tag, _heard.keep(_heard.changed(base, begin, end, std::move(bytes))));
     }
     case Known::edited:
-      return appendLarge(event, tag, _heard.keep(edited()));
+      return appendLarge(event, depth, tag, _heard.keep(edited()));
   }
   refuse("a text is known in no way there is");
 }
@@ -267,12 +267,13 @@ LargeTextRef EventReader::edited() {
   return list.finish();
 }
 
-void EventReader::appendLarge(Event& event, std::uint8_t tag, const LargeTextRef& text) {
+void EventReader::appendLarge(Event& event, std::size_t depth, std::uint8_t tag, const LargeTextRef& text) {
   std::string& into = event.payload;
   const bool isList = static_cast<Tag>(tag) == Tag::list;
   if (isList && !text->splitIntoElements()) refuse("a list is none");
   if (text->size() > largestPayload - std::min(largestPayload, into.size() + _apart)) refuse("an event is too large");
-  if (_large == Large::apart) {
+  // What is part of another item is read with it.
+  if (_large == Large::apart && depth == 0) {
     // Many small ones take room, too.
     _apart += std::max(text->size(), KnownTexts::end);
     const std::size_t begin = into.size();

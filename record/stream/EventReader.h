@@ -21,7 +21,7 @@ class ItemReader;
 class EventReader {
  public:
   /// Where large texts go that are told by what was told before: into the payload as any other, or, for who would have
-  /// the same ones again, beside it.
+  /// the same ones again and if they are no part of another item, beside it.
   enum class Large { within, apart };
   /// `bytes` is a whole recording, and outlives the reader.
   explicit EventReader(std::string_view bytes, Large large = Large::within);
@@ -53,10 +53,10 @@ class EventReader {
   void enterInto(Event& event);
   void item(Event& event, std::size_t depth);
   void container(Event& event, Tag tag, std::size_t depth);
-  void known(Event& event, std::uint8_t tag);
+  void known(Event& event, std::size_t depth, std::uint8_t tag);
   std::size_t slot();
   LargeTextRef edited();
-  void appendLarge(Event& event, std::uint8_t tag, const LargeTextRef& text);
+  void appendLarge(Event& event, std::size_t depth, std::uint8_t tag, const LargeTextRef& text);
   void bounded(const std::string& payload) const;
   void appendSized(std::string& into, std::uint8_t tag, std::string_view bytes) const;
 
