@@ -53,9 +53,9 @@ class Corpus(Folder):
             if "VantorIDs" in path.name or "AnAccountThatCannotBeMade" in path.name:
                 continue
             with self.subTest(path.name):
+                pathlib.Path("redacted").unlink(missing_ok=True)
                 self.document("recording", "redact", str(path), "redacted")
                 self.assertEqual(self.document("replay", "redacted")["differences"], [])
-                pathlib.Path("redacted").unlink()
 
 
 class Recordings(Folder):
