@@ -6,6 +6,7 @@ usage: recording_tests.py TSD [unittest arguments]
 
 import ctypes
 import ctypes.util
+import json
 import pathlib
 import plistlib
 import random
@@ -110,6 +111,33 @@ class Recordings(Folder):
             self.assertEqual(report["whole"], place > len(whole) - 8 and report["whole"], place)
         self.assertGreater(last, 100)
 
+    def reported(self, subject):
+        """What the page about a run, or about a recording, shows."""
+        page = self.tsd("report", subject, "-o", "-").stdout
+        return json.loads(re.search(r'<script type="application/json" id="data">(.*?)</script>', page, re.DOTALL)[1])
+
+    def test_a_report_tells_the_same_as_that_of_the_device(self):
+        apps = self.make(8, "dev", "--demo")
+        for name, *line in (("sync", "sync", "dev", "host", "--transfers", "1", "--inject",
+                             f"transfer:{apps[3]}@3=none", "--end-phase", "success"), ("restore", "restore", "dev", "host")):
+            with self.subTest(name):
+                self.record(*line, code=SOME_FAILED, name=name)
+                run, recorded = self.reported("dev"), self.reported(name)
+                self.assertNotIn("home", recorded)
+                # What the journal alone tells; the device knows the names, and more about the outcomes.
+                stories = [{app["id"]: [[kind, text] for _, kind, text in app["events"]] for app in page["apps"]
+                            if app["events"]} for page in (run, recorded)]
+                self.assertGreater(len(stories[0]), 4)
+                self.assertEqual(*stories)
+                messages = [[row[-1] for row in page["journal"]["rows"] if row[7] % 4 == 3 and "appsync|" in row[-1]]
+                            for page in (run, recorded)]
+                self.assertEqual(*messages)
+        facts = dict(recorded["facts"])
+        self.assertEqual((facts["Recorded"], facts["Messages"]), ("to the end", str(len(messages[1]))))
+        pathlib.Path("cut").write_bytes(pathlib.Path("sync").read_bytes()[:-400])
+        self.assertEqual(self.reported("cut")["run"]["result"], "cut")
+        self.assertIn("has no runs", self.tsd("report", "sync", "--run", "1", "-o", "-", code=USAGE).stderr)
+
     def test_what_is_no_recording(self):
         self.make(1)
         whole = bytearray(pathlib.Path(self.record("sync", "dev", "host")).read_bytes())
@@ -120,6 +148,7 @@ class Recordings(Folder):
             self.assertRegex(self.tsd("replay", name, code=FAILED).stderr, says(name))
             self.assertIn(words, self.tsd("replay", name, code=FAILED).stderr)
             self.assertIn(words, self.tsd("recording", "show", name, code=FAILED).stderr)
+            self.assertIn(words, self.tsd("report", name, "-o", "-", code=FAILED).stderr)
 
     def somebodys(self, apps):
         """Identifiers, names, accounts and whatever else a host says in texts, that no fixed text is."""

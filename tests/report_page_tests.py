@@ -43,8 +43,8 @@ class ReportPage(Folder):
         self.browser = browser.Browser()
         self.addCleanup(self.browser.close)
 
-    def open(self, width=1280, dark=False):
-        self.tsd("report", "dev", "-o", "report.html")
+    def open(self, width=1280, dark=False, subject="dev"):
+        self.tsd("report", subject, "-o", "report.html")
         self.browser.look(width, dark=dark)
         self.browser.requests.clear()
         self.browser.open("report.html")
@@ -152,6 +152,15 @@ class ReportPage(Folder):
         self.open()
         self.assertRegex(self.text("#cut"), r"come to its size limit at (\d+ min )?\d+\.\d{3} s: what came later is not drawn")
         self.assertNotIn("Took", self.text("#facts"))
+        self.settled()
+
+    def test_a_recording(self):
+        self.make(2)
+        self.sync("dev", "host", "--record", "sync.recording")
+        self.open(subject="sync.recording")
+        self.assertEqual(self.text("#sentence"), "What was recorded: 2 of 2 apps in order.")
+        self.assertEqual(self.browser.ask("document.querySelector('#home, nav a[href=\\'#home\\'], #settings')"), None)
+        self.assertRegex(self.text("#call-count"), r"^(?!0 )[\d,]+ of [\d,]+ records$")
         self.settled()
 
     def test_many_apps_take_few_elements(self):

@@ -90,7 +90,7 @@ struct HomeOptions {
 ExitCode runHome(const CommandContext& context, const HomeOptions& options);
 
 struct ReportOptions {
-  std::string device;
+  std::string device;     // or a recording
   std::uint64_t run = 0;  // its number; 0: the last sync or restore
   std::string file;       // of the page; "-" for standard output
   std::string version;    // of the program

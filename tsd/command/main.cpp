@@ -279,9 +279,12 @@ void addWatch(CLI::App& program, Invocation& invocation) {
 void addReport(CLI::App& program, Invocation& invocation) {
   auto options = std::make_shared<ReportOptions>();
   options->version = version;
-  auto* command =
-      addCommand(program, invocation, "report", "Write a page about a run, for any browser", runReport, options);
-  addDevice(command, options->device);
+  auto* command = addCommand(program, invocation, "report", "Write a page about a run or a recording, for any browser",
+                             runReport, options);
+  command->add_option("DEVICE", options->device, "The device's folder, or a recording")
+      ->required()
+      ->check(checkFile)
+      ->option_text(" ");
   addNumber<std::uint64_t>(command, "--run", options->run, "Number of the run (that of the last sync or restore)", 1);
   command->add_option("-o,--output", options->file, "The page, an HTML file; - for standard output")
       ->required()

@@ -6,82 +6,20 @@
 
 #include "device/records/Settings.h"
 #include "platform/Plugin.h"
-#include "tsd/history/AppStory.h"
 #include "tsd/history/LineFile.h"
-#include "tsd/history/Outcome.h"
-#include "tsd/history/Verdicts.h"
 #include "tsd/picture/HomePages.h"
+#include "tsd/report/ReportApps.h"
 #include "tsd/report/ReportJournal.h"
 #include "tsd/terminal/Output.h"
 
 namespace tsd {
 
 using platform::Value;
-using Kind = AppEvent::Kind;
 
 namespace {
 
 constexpr std::size_t pageSize = 20;
 constexpr std::size_t pagesWithImages = 6;  // those that the page shows at first
-
-/// What an outcome means: as wanted, wrong, not at its end, or none of these.
-const char* toneOf(Outcome outcome) {
-  if (isInOrder(outcome)) return "good";
-  switch (outcome) {
-    case Outcome::failed:
-    case Outcome::refused:
-    case Outcome::unrecorded:
-      return "bad";
-    case Outcome::waiting:
-    case Outcome::cancelled:
-    case Outcome::sent:
-    case Outcome::downloaded:
-    case Outcome::notReached:
-      return "wait";
-    default:
-      return "still";
-  }
-}
-
-/// The outcome that the event decides, as far as the run's journal tells; provisional for what is still running.
-std::optional<Outcome> outcomeFor(Kind kind) {
-  switch (kind) {
-    case Kind::installed:
-      return Outcome::installed;
-    case Kind::restored:
-    case Kind::leftToStore:
-      return Outcome::placed;
-    case Kind::failed:
-    case Kind::transferFailed:
-      return Outcome::failed;
-    case Kind::cancelled:
-      return Outcome::cancelled;
-    case Kind::deleted:
-      return Outcome::removed;
-    case Kind::preparing:
-    case Kind::prepared:
-    case Kind::restoring:
-    case Kind::transferring:
-    case Kind::arrived:
-    case Kind::installing:
-      return Outcome::waiting;
-    default:
-      return outcomeOf(kind);
-  }
-}
-
-/// Whether the event names the rule that decided about the app.
-bool isVerdict(Kind kind) {
-  auto outcome = outcomeFor(kind);
-  bool isWay = !outcome || *outcome == Outcome::waiting || *outcome == Outcome::installed || kind == Kind::restored;
-  return kind == Kind::chosen || kind == Kind::prepared || !isWay;
-}
-
-struct App {
-  std::vector<AppEvent> events;
-  Outcome outcome = Outcome::notReached;
-  std::string rule;
-};
 
 std::string base64(platform::BytesView bytes) {
   constexpr std::string_view digits = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
@@ -96,68 +34,29 @@ std::string base64(platform::BytesView bytes) {
   return text;
 }
 
-Value pair(std::string_view one, const Value& other) {
-  Value item = Value::makeArray();
-  item.array()->append(one);
-  item.array()->append(other);
-  return item;
-}
-
 /// What the run meant for each app, and the journal itself.
-class Reading {
- public:
-  explicit Reading(const RunSummary& run) : _story([this](const AppEvent& event) { take(event); }) {
+struct Reading {
+  explicit Reading(const RunSummary& run) {
     isCut = readJournal(run, {""}, [this](const device::CallRecord& record) {
-      _story.hear(record);
+      apps.hear(record);
       journal.hear(record);
     });
     // The journal may have reached its size limit, and knows nothing of what is on the device's disk.
-    for (const auto& told : outcomesIn(run)) {
-      App& app = apps[told.id];
-      if (app.outcome != told.outcome && !told.reason.empty()) app.rule = told.reason;
-      app.outcome = told.outcome;
-    }
+    for (const auto& told : outcomesIn(run)) apps.know(told);
   }
 
   ReportJournal journal;
   bool isCut = false;  // the journal has come to its size limit
-  std::map<std::string, App> apps;
-
- private:
-  void take(const AppEvent& event) {
-    if (event.app.empty()) return;
-    App& app = apps[event.app];
-    if (event.kind == Kind::considered) return;
-    if (auto outcome = outcomeFor(event.kind)) app.outcome = *outcome;
-    if (isVerdict(event.kind)) app.rule = event.line();
-    app.events.push_back(event);
-  }
-
-  AppStory _story;
+  ReportApps apps;
 };
 
 Value valueOfApps(const Reading& reading, const ReportSubject& subject) {
   std::map<std::string_view, const device::AppStatus*> known;
   for (const auto& app : subject.now.apps) known.emplace(app.id, &app);
-  Value apps = Value::makeArray();
-  for (const auto& [id, app] : reading.apps) {
-    auto& item = apps.array()->appendDictionary();
+  return reading.apps.document([&](const std::string& id) {
     auto status = known.find(id);
-    item.set("id", id);
-    item.set("name", status == known.end() ? "" : status->second->name);
-    item.set("outcome", wordsOf(app.outcome));
-    item.set("rule", app.rule);
-    Value events = Value::makeArray();
-    for (const auto& event : app.events) {
-      Value each = Value::makeArray();
-      each.array()->append(event.time.count());
-      each.array()->append(nameOfKind(event.kind));
-      each.array()->append(event.line());
-      events.array()->append(each);
-    }
-    item.set("events", events);
-  }
-  return apps;
+    return status == known.end() ? std::string() : status->second->name;
+  });
 }
 
 Value valueOfHome(const ReportSubject& subject, device::LocalDevice& device) {
@@ -202,15 +101,13 @@ std::string endOfRun(const ReportSubject& subject) {
 
 /// "The sync is not complete: 5 of 8 apps in order, 2 failed, 1 not allowed."
 std::string sentenceOf(const Reading& reading, const ReportSubject& subject) {
-  OutcomeCounts counts;
-  for (const auto& [id, app] : reading.apps) counts.add(app.outcome);
   const std::string end = endOfRun(subject);
   std::string text = "The " + subject.run.command;
   if (end == "failed")
     text += " failed";
   else
     text += (end == "done" || end == "not complete" ? " is " : " was ") + end;
-  std::string apps = counts.text();
+  std::string apps = reading.apps.counts().text();
   return text + (apps.empty() ? "." : ": " + apps + ".");
 }
 
@@ -218,7 +115,7 @@ Value valueOfFacts(const Reading& reading, const ReportSubject& subject) {
   std::string words = "tsd " + subject.run.command;
   for (const auto& argument : subject.run.arguments) words += " " + argument;
   Value facts = Value::makeArray();
-  auto add = [&](const char* name, const std::string& value) { facts.array()->append(pair(name, value)); };
+  auto add = [&](const char* name, const std::string& value) { facts.array()->append(pairOf(name, value)); };
   add("Command", words);
   add("Began", inUTC(subject.run.began));
   add("Ended", subject.run.ended ? inUTC(*subject.run.ended) : "");
@@ -244,12 +141,7 @@ Value reportDocument(const ReportSubject& subject, device::LocalDevice& device) 
   run.dictionary()->set("result", endOfRun(subject));
   run.dictionary()->set("micros", reading.journal.end().count());
   entries.set("run", run);
-  Value words = Value::makeArray();
-  for (int i = 0; i <= static_cast<int>(Outcome::notReached); ++i) {
-    auto outcome = static_cast<Outcome>(i);
-    words.array()->append(pair(wordsOf(outcome), Value(toneOf(outcome))));
-  }
-  entries.set("outcomes", words);
+  entries.set("outcomes", toneOfOutcomes());
   entries.set("sentence", sentenceOf(reading, subject));
   entries.set("facts", valueOfFacts(reading, subject));
   entries.set("home", valueOfHome(subject, device));
@@ -257,11 +149,11 @@ Value reportDocument(const ReportSubject& subject, device::LocalDevice& device) 
   entries.set("journal", reading.journal.document());
   entries.set("journalIsCut", reading.isCut);
   Value versions = Value::makeArray();
-  versions.array()->append(pair("Program", Value("tsd " + subject.version)));
-  versions.array()->append(pair("Plug-in interface", Value(std::to_string(platform::pluginInterfaceVersion))));
+  versions.array()->append(pairOf("Program", Value("tsd " + subject.version)));
+  versions.array()->append(pairOf("Plug-in interface", Value(std::to_string(platform::pluginInterfaceVersion))));
   entries.set("versions", versions);
   Value settings = Value::makeArray();
-  for (const auto& key : device::settingKeys()) settings.array()->append(pair(key, Value(device.setting(key))));
+  for (const auto& key : device::settingKeys()) settings.array()->append(pairOf(key, Value(device.setting(key))));
   entries.set("settings", settings);
   return document;
 }

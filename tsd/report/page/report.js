@@ -149,10 +149,10 @@
     const run = data.run;
     document.title = clean(`${data.device}: ${data.title}`);
     at("title").replaceChildren(named("span", "", data.device), ` · ${data.title}`);
-    at("subtitle").textContent = clean([`tsd ${run.command}`, run.began, run.result].filter(Boolean).join(" · "));
+    at("subtitle").textContent = clean([run.command && `tsd ${run.command}`, run.began, run.result].filter(Boolean).join(" · "));
     at("made").textContent = clean(`Made ${data.made} by ${data.maker}.`);
     addFacts(at("versions"), data.versions);
-    addFacts(at("settings"), data.settings);
+    if (data.home) addFacts(at("settings"), data.settings);
     const button = at("theme");
     const wish = matchMedia("(prefers-color-scheme: dark)");
     const dress = (dark) => {
@@ -604,9 +604,14 @@
     filter();
   };
 
+  // A recording knows neither a home screen nor a device.
+  if (!data.home) {
+    for (const each of [at("home"), document.querySelector("nav a[href='#home']").parentElement]) each.remove();
+    at("settings").parentElement.remove();
+  }
   drawTop();
   drawSummary();
-  drawHome();
+  if (data.home) drawHome();
   drawApps();
   drawTimeline();
   drawJournal();
