@@ -292,7 +292,11 @@ class Farm(Folder):
         answer("scontrol", "update", f"JobId={array}_{requeued}", "StartTime=now")
         slurm.wait_for_jobs()
         names = [piece["name"] for piece in self.pieces(killed)]
-        self.assertEqual(self.gathered(DIFFERS)["missing"], {str(killed): len(names) - names.index(gates[0].name)})
+        missed = self.gathered(DIFFERS)["missing"]
+        self.assertEqual(set(missed), {str(killed)})
+        # A job that is killed after its replay may have come to the next one.
+        self.assertIn(missed[str(killed)], range(1, len(names) - names.index(gates[0].name) + 1))
+        self.assertEqual(list(pathlib.Path("out/results").rglob(f"{gates[0].name}-*.json")), [])
         self.assertRegex(self.farm("gather", "out", code=DIFFERS).stdout, r"\nPartial: \d+ of \d+ pieces have a result")
         self.assertIn(f"1 of {JOBS} jobs to do", self.farm("start", "--engine", "slurm", "out").stdout)
         slurm.wait_for_jobs()
