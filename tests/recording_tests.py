@@ -125,13 +125,17 @@ class Recordings(Folder):
                 run, recorded = self.reported("dev"), self.reported(name)
                 self.assertNotIn("home", recorded)
                 # What the journal alone tells; the device knows the names, and more about the outcomes.
-                stories = [{app["id"]: [[kind, text] for _, kind, text in app["events"]] for app in page["apps"]
+                # Threads that are not inside the plug-in may be in another order.
+                stories = [{app["id"]: sorted([kind, text] for _, kind, text in app["events"]) for app in page["apps"]
                             if app["events"]} for page in (run, recorded)]
                 self.assertGreater(len(stories[0]), 4)
                 self.assertEqual(*stories)
-                messages = [[row[-1] for row in page["journal"]["rows"] if row[7] % 4 == 3 and "appsync|" in row[-1]]
+                messages = [sorted(row[-1] for row in page["journal"]["rows"] if row[7] % 4 == 3 and "appsync|" in row[-1])
                             for page in (run, recorded)]
                 self.assertEqual(*messages)
+                times = [row[1] for row in recorded["journal"]["rows"]]
+                self.assertEqual(times, sorted(times))
+                self.assertGreater(len(set(times)), 5)
         facts = dict(recorded["facts"])
         self.assertEqual((facts["Recorded"], facts["Messages"]), ("to the end", str(len(messages[1]))))
         pathlib.Path("cut").write_bytes(pathlib.Path("sync").read_bytes()[:-400])
