@@ -14,7 +14,7 @@ list(TRANSFORM private_headers APPEND "\\.h$")
 list(JOIN private_headers "|" private_headers)
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/platform DESTINATION ${header_folder} COMPONENT development
         FILES_MATCHING PATTERN *.h REGEX "/(${private_headers})" EXCLUDE)
-set(record_headers RecordingPlatform.h Redact.h Replay.h Operation.h Show.h Sink.h)
+set(record_headers RecordingPlatform.h RecordedCalls.h Redact.h Replay.h Operation.h Show.h Sink.h)
 install(FILES ${CMAKE_SOURCE_DIR}/plist/PropertyList.h DESTINATION ${header_folder}/plist COMPONENT development)
 list(TRANSFORM record_headers PREPEND ${CMAKE_SOURCE_DIR}/record/)
 install(FILES ${record_headers} DESTINATION ${header_folder}/record COMPONENT development)

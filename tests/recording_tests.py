@@ -154,6 +154,30 @@ class Recordings(Folder):
             self.assertIn(words, self.tsd("recording", "show", name, code=FAILED).stderr)
             self.assertIn(words, self.tsd("report", name, "-o", "-", code=FAILED).stderr)
 
+    def test_as_a_journal(self):
+        """It says the same as the journal that the device wrote meanwhile."""
+        apps = self.make(3, "dev")
+        self.record("sync", "dev", "host", "--transfers", "1", "--calls", "calls")
+        journals = [[json.loads(line) for line in lines.splitlines()]
+                    for lines in (pathlib.Path("calls").read_text(encoding="utf-8"),
+                                  self.tsd("recording", "journal", "recording").stdout)]
+        # Each thread by itself: which of two is first may look otherwise from the other side.
+        device, recorded = (sorted(((record["thread"], place, record["op"], record["category"], record["text"])
+                                    for place, record in enumerate(journal) if record["service"] == "log" and
+                                    record["category"] != "tsd.appsync"), key=lambda each: each[:2])
+                            for journal in journals)
+        device, recorded = ([(thread, *rest) for thread, _, *rest in each] for each in (device, recorded))
+        self.assertGreater(len(recorded), 100)
+        self.assertEqual(recorded, device)
+        asked = [[(record["thread"], record["app"], record["result"], record["error"]) for record in journal
+                  if record["op"] in ("setInstallOptions", "setPlaceholderPromise", "applicationIsInstalled")]
+                 for journal in journals]
+        self.assertEqual({app for _, app, _, _ in asked[1]}, set(apps))
+        self.assertEqual(asked[1], asked[0])
+        entered = [record for record in journals[1] if record["service"] == "AppsClient"]
+        self.assertEqual(sum("end" in record for record in entered) * 2, len(entered))
+        self.assertEqual([record["n"] for record in journals[1]], list(range(1, len(journals[1]) + 1)))
+
     def somebodys(self, apps):
         """Identifiers, names, accounts and whatever else a host says in texts, that no fixed text is."""
         texts = set(apps)

@@ -54,7 +54,7 @@ struct ReplayOptions {
 ExitCode runReplay(const CommandContext& context, const ReplayOptions& options);
 
 struct RecordingOptions {
-  std::string action;  // "show", "redact"
+  std::string action;  // "show", "journal", "redact"
   std::string file;
   std::string output{};  // of redact
 };

@@ -1,5 +1,9 @@
+#include <map>
 #include <string>
+#include <vector>
 
+#include "device/boundary/Journal.h"
+#include "platform/Describe.h"
 #include "record/Redact.h"
 #include "record/Replay.h"
 #include "record/Show.h"
@@ -8,6 +12,7 @@
 #include "tsd/conduit/WholeFile.h"
 #include "tsd/daemon/PluginLoader.h"
 #include "tsd/host/NewItem.h"
+#include "tsd/report/RecordingDocument.h"
 #include "tsd/terminal/Output.h"
 
 namespace tsd {
@@ -33,6 +38,47 @@ ExitCode showRecording(const CommandContext& context, const RecordingOptions& op
     document.dictionary()->set("apps", arrayOf(facts.apps));
     writeDocument(document);
   }
+  if (!facts.problem.empty()) throw CommandError(options.file + ": " + facts.problem);
+  return ExitCode::done;
+}
+
+/// A recording's calls as lines of the journal.
+class JournalLines {
+ public:
+  /// Empty of what no journal tells.
+  std::string of(const record::RecordedCall& call) {
+    const auto& arguments = *call.arguments.dictionary();
+    if (call.operation == "TSGetLogCategory") _categories[platform::describe(call.result)] = arguments["category"];
+    if (isPreparation(call)) return {};
+    device::CallRecord record = journalRecordOf(call);
+    record.number = ++_number;
+    if (record.service == "log") {
+      record.app.clear();
+      record.arguments.dictionary()->set("category",
+                                         platform::describe(_categories[platform::describe(arguments["log"])]));
+    }
+    std::vector<std::string> names;
+    for (const auto& entry : *record.arguments.dictionary()) names.emplace_back(entry.key);
+    for (const auto& name : names) record.argumentNames.push_back(name.c_str());
+    return device::journalLine(record) + '\n';
+  }
+
+ private:
+  std::uint64_t _number = 0;
+  std::map<std::string, platform::Value> _categories;  // of the log's handles
+};
+
+ExitCode showJournal(const RecordingOptions& options) {
+  JournalLines lines;
+  const std::string recording = readWholeFile(options.file);
+  std::string text;
+  const auto facts = record::readCalls(recording, [&](const record::RecordedCall& call) {
+    text += lines.of(call);
+    if (text.size() < 1 << 16) return;
+    writeOutput(text);
+    text.clear();
+  });
+  writeOutput(text);
   if (!facts.problem.empty()) throw CommandError(options.file + ": " + facts.problem);
   return ExitCode::done;
 }
@@ -78,6 +124,7 @@ ExitCode redactRecording(const CommandContext& context, const RecordingOptions& 
 }  // namespace
 
 ExitCode runRecording(const CommandContext& context, const RecordingOptions& options) {
+  if (options.action == "journal") return showJournal(options);
   return options.action == "redact" ? redactRecording(context, options) : showRecording(context, options);
 }
 

@@ -325,10 +325,11 @@ void addRecording(CLI::App& program, Invocation& invocation) {
   auto* command =
       addCommand(program, invocation, "recording", "Look into a recording, or redact it", runRecording, options);
   auto* action = command->add_option("ACTION", options->action,
-                                     wrapped("show: every call, as a line; redact: write it anew, with other texts in "
+                                     wrapped("show: every call, as a line; journal: the same as records of the "
+                                             "call journal; redact: write it anew, with other texts in "
                                              "place of identifiers, names, accounts and contents. With --plugin the "
                                              "new one has to replay"));
-  takeOneOf(invocation, action, {"show", "redact"})->required()->option_text(" ");
+  takeOneOf(invocation, action, {"show", "journal", "redact"})->required()->option_text(" ");
   addRecordingFile(command, options->file);
   command->add_option("OUTPUT", options->output, wrapped("Of redact: the new recording; nothing may be there"))
       ->check(checkFile)

@@ -3,7 +3,6 @@
 #include <array>
 
 #include "platform/Plugin.h"
-#include "record/RecordedCalls.h"
 #include "tsd/CommandError.h"
 #include "tsd/history/LineFile.h"
 #include "tsd/report/ReportApps.h"
@@ -16,10 +15,7 @@ using platform::Value;
 using record::OperationClass;
 using record::RecordedCall;
 
-namespace {
-
-/// As the device's journal has it, which the readers of journals know.
-device::CallRecord recordOf(const RecordedCall& call) {
+device::CallRecord journalRecordOf(const RecordedCall& call) {
   device::CallRecord record;
   record.number = call.number;
   record.time = std::chrono::microseconds(call.time);
@@ -40,8 +36,9 @@ device::CallRecord recordOf(const RecordedCall& call) {
   return record;
 }
 
-/// What the plug-in needs to write a message, beside the writing.
 bool isPreparation(const RecordedCall& call) { return call.of == OperationClass::message && call.operation != "write"; }
+
+namespace {
 
 struct Reading {
   void hear(const RecordedCall& call) {
@@ -50,7 +47,7 @@ struct Reading {
       operations += call.end ? 0 : 1;
     else
       ++calls[static_cast<std::size_t>(call.of)];
-    const auto record = recordOf(call);
+    const auto record = journalRecordOf(call);
     apps.hear(record);
     journal.hear(record);
   }
