@@ -158,6 +158,8 @@ class ReplayCrossing {
  private:
   template <class Result, class... Arguments>
   Result answer(const Operation& operation, const Numbered* receiver, Arguments&&... arguments) const {
+    // An object that is not handed on after all goes as the plug-in's would: without the mutex.
+    std::optional<std::conditional_t<std::is_void_v<Result>, bool, Result>> result;
     platform::Mutex::Lock lock(_replayer.mutex);
     ItemWriter items;
     std::optional<Event> answered;
@@ -171,9 +173,9 @@ class ReplayCrossing {
           (getOut(_replayer, reader, arguments), ...);
           return;
         } else {
-          Result result = get<Result>(_replayer, reader);
+          result.emplace(get<Result>(_replayer, reader));
           (getOut(_replayer, reader, arguments), ...);
-          return result;
+          return std::move(*result);
         }
       }
     } catch (const RecordingError& error) {

@@ -7,6 +7,7 @@
 #include <chrono>
 #include <new>
 #include <stdexcept>
+#include <system_error>
 #include <utility>
 
 #include "record/RecordingError.h"
@@ -104,7 +105,10 @@ std::uint64_t Replayer::newNumber(ObjectKind kind) {
   if (_expected.empty()) return ++_ownNumber;
   const std::uint64_t number = _expected.front();
   _expected.pop_front();
-  return number;
+  if (_given.insert(number).second) return number;
+  // Who had it would go in the midst of this.
+  refuse("event " + std::to_string(next->number) + ": an object gets the number of another one");
+  return ++_ownNumber;
 }
 
 void Replayer::named(std::uint64_t number, const platform::TSAssetRef& asset) {
@@ -139,8 +143,12 @@ void Replayer::passTurn() {
   }
   Player& player = *_players[next->thread];
   if (!player.thread.joinable()) {
-    ++_playing;
-    player.thread = std::thread([self = _self.lock(), &player] { self->playAll(player); });
+    try {
+      player.thread = std::thread([self = _self.lock(), &player] { self->playAll(player); });
+      ++_playing;
+    } catch (const std::system_error&) {
+      refuse("event " + std::to_string(next->number) + ": there is no thread left to replay it");
+    }
   } else {
     player.turn.notifyOne();
   }
@@ -187,11 +195,14 @@ void Replayer::play(Player& player, const Event& event) {
 void Replayer::leave(Player& player, const Event& entered, const ItemWriter& result) {
   const Event* next = head();
   if (next && next->kind != EventKind::leave) {
-    const auto place = findAhead(player, nullptr, result);
+    auto place = findAhead(player, nullptr, result);
     if (!place && !_options.goOn) return void(differ(Difference::Kind::missing, player, next, {}));
     if (!place) return end();
     skipTo(player, *place, {});
     if (isOver()) return;
+    // What was skipped is not before it any more.
+    place = findAhead(player, nullptr, result);
+    if (!place) return end();
     next = &_ahead[*place];
   }
   if (!next) return;
@@ -295,8 +306,6 @@ ReplayResult Replayer::run(const std::shared_ptr<Replayer>& self) {
     else
       thread.detach();
   }
-  if (!allEnded)
-    new std::shared_ptr<Replayer>(self);  // those that wait may look at it for as long as the process lives
   clients.clear();
   completions.clear();
   lock.lock();

@@ -11,6 +11,7 @@
 #include <thread>
 #include <typeindex>
 #include <unordered_map>
+#include <unordered_set>
 #include <vector>
 
 #include "platform/Condition.h"
@@ -140,6 +141,7 @@ class Replayer : public Names {
 
   std::deque<std::uint64_t> _expected GUARDED_BY(mutex);
   std::uint64_t _expectedOf GUARDED_BY(mutex) = 0;
+  std::unordered_set<std::uint64_t> _given GUARDED_BY(mutex);
   std::uint64_t _ownNumber GUARDED_BY(mutex) = std::uint64_t{1} << 40;
   std::unordered_map<std::uint64_t, Known> _known GUARDED_BY(mutex);
   std::unordered_map<std::uint64_t, Observed> _observed GUARDED_BY(mutex);
