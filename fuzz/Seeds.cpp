@@ -11,11 +11,17 @@
 #include <utility>
 #include <vector>
 
+#include "device/LocalDevice.h"
 #include "fuzz/HostileShapes.h"
+#include "fuzz/RecordingStream.h"
 #include "fuzz/SampleApp.h"
 #include "plist/PropertyList.h"
+#include "record/RecordingPlatform.h"
+#include "record/stream/EventReader.h"
+#include "record/stream/EventWriter.h"
 #include "tests/SampleContent.h"
 #include "tests/ZipArchive.h"
+#include "tsd/daemon/PluginLoader.h"
 
 namespace {
 
@@ -152,6 +158,78 @@ void addIcons(Seeds& seeds) {
   seeds.push_back({"icon", "larger-than-drawn", huge});
 }
 
+class Memory final : public record::Sink {
+ public:
+  bool write(platform::BytesView bytes) override {
+    content += bytes;
+    return true;
+  }
+  std::string content;
+};
+
+/// The same every time that the seeds are written.
+std::string withoutTimes(const std::string& recording) {
+  const auto sink = std::make_shared<Memory>();
+  record::EventReader reader(recording);
+  record::EventWriter writer(sink);
+  std::size_t threads = 0, operations = 0;
+  for (record::Event event; reader.next(event);) {
+    while (threads < reader.threads().size()) writer.addThread(reader.threads()[threads++]);
+    while (operations < reader.operations().size()) writer.addOperation(reader.operations()[operations++]);
+    writer.write(event.kind, event.thread, event.operation, 0, event.payload);
+  }
+  writer.finish();
+  return sink->content;
+}
+
+/// What the plug-in answers on an empty device.
+void addRecordedCalls(Seeds& seeds) {
+  const auto device = device::makeMemoryDevice(device::makeManualEventQueue(), {});
+  const tsd::PluginLoader plugin{SHIPPED_PLUGIN};
+  const auto record = [&](const char* name, const auto& work) {
+    const auto sink = std::make_shared<Memory>();
+    const auto recording = record::recordingPlatform(device->platform(), sink, {.threadName = [] { return "daemon"; }});
+    auto client = recording->makeClient([&](const platform::Platform& platform) { return plugin.create(platform); });
+    work(*client);
+    client = nullptr;
+    recording->finish();
+    seeds.push_back({"recording", name, fuzz::streamOf(withoutTimes(sink->content))});
+  };
+  record("questions", [](platform::TSClient& client) {
+    client.supportedDataclasses();
+    client.disabledAssetTypes();
+    client.vantorIDsForAssets();
+  });
+  record("sync", [](platform::TSClient& client) {
+    client.prepareForSyncWithHostAnchor("1", nullptr, nullptr);
+    client.installedAssets();
+    client.reconcileSync(0, "2", nullptr, nullptr);
+    client.syncEndedWithSuccess(true);
+  });
+}
+
+/// A list that is told again with changes.
+void addRecordedLists(Seeds& seeds) {
+  const auto sink = std::make_shared<Memory>();
+  record::EventWriter writer(sink);
+  const auto thread = writer.addThread("registry");
+  const auto operation = writer.addOperation({"TSClient", "assetTransferSucceeded", "client asset succeeded error"});
+  std::vector<Value> elements;
+  for (int app = 0; app < 40; ++app) elements.emplace_back("com.example.app-" + std::to_string(app));
+  for (int round = 0; round < 3; ++round) {
+    elements[7] = round;
+    record::ItemWriter items;
+    items.value(arrayOf(elements));
+    items.text(std::string(60, 'x'));
+    items.data(std::string(2100, static_cast<char>('a' + round)) + std::string(2100, 'z'));
+    writer.write(record::EventKind::enter, thread, operation, 1, items.bytes());
+    writer.write(record::EventKind::leave, thread, operation, 0, {});
+    elements.erase(elements.begin() + 20);
+  }
+  writer.finish();
+  seeds.push_back({"recording", "lists", fuzz::streamOf(sink->content)});
+}
+
 void addShapes(Seeds& seeds, std::size_t size) {
   auto add = [&](const char* target, const std::vector<fuzz::Shape>& shapes) {
     for (const auto& [name, bytes] : shapes) seeds.push_back({target, name, bytes});
@@ -190,6 +268,8 @@ int main(int count, char** arguments) {
     addRestoreLists(seeds);
     addPackages(seeds);
     addIcons(seeds);
+    addRecordedCalls(seeds);
+    addRecordedLists(seeds);
   }
   for (const auto& seed : seeds) {
     if (!write(arguments[1], seed)) {

@@ -50,7 +50,7 @@ ALLOWED |= {"tests": AROUND, "fuzz": AROUND + ["fuzz/"], "bench": AROUND + ["cor
 SYSTEM = ["device", "record", "tsd", "tests", "fuzz", "bench"]
 # Library header: the folders that may include it.
 LIBRARIES = {
-    r"zstd\.h": ["record", "tests"],
+    r"zstd\.h": ["record", "tests", "fuzz"],
     r"expat\.h": ["plist", "bench"],
     r"sqlite3\.h": ["device", "tests"],
     r"archive(_entry)?\.h": ["device", "tsd", "tests"],
