@@ -9,15 +9,14 @@
 #include <map>
 #include <memory>
 #include <new>
-#include <optional>
 #include <string>
 #include <vector>
 
 #include "tsd/CommandError.h"
 #include "tsd/OptionTable.h"
+#include "tsd/command/CarryOut.h"
 #include "tsd/command/Commands.h"
 #include "tsd/command/LastWords.h"
-#include "tsd/daemon/InjectionRules.h"
 #include "tsd/help/HelpText.h"
 #include "tsd/terminal/Output.h"
 #include "tsd/terminal/Suggestion.h"
@@ -29,7 +28,7 @@ namespace {
 struct Invocation {
   CommonOptions common;
   std::vector<std::string> rules;
-  std::function<ExitCode(const CommandContext&)> run;
+  CommandRun run;
   /// The values of options that take only a few; the parser does not give them.
   std::map<const CLI::Option*, std::vector<std::string>> words;
 };
@@ -525,30 +524,6 @@ void addCommands(CLI::App& program, Invocation& invocation) {
   addHelp(program, invocation);
 }
 
-/// Runs what was asked for; every failure ends here, as a message and, when asked for, a document.
-ExitCode carryOut(Invocation& invocation, Console& console) {
-  ExitCode code = ExitCode::failed;
-  std::string message;
-  std::optional<KeptRun> kept;
-  try {
-    invocation.common.rules = parseRules(invocation.rules);
-    code = invocation.run({invocation.common, console, kept});
-    if (kept) kept->end(code);
-    return code;
-  } catch (const CommandError& error) {
-    code = error.code();
-    message = error.what();
-  } catch (const std::bad_alloc&) {
-    message = "out of memory";
-  } catch (const std::exception& error) {
-    message = error.what();
-  }
-  if (kept) kept->end(code, message);
-  console.message(message);
-  if (invocation.common.json) writeFailure(invocation.common, code, message);
-  return code;
-}
-
 /// The subcommand's name when the first argument is one.
 std::string commandNamed(CLI::App& program, int count, char** arguments) {
   if (count < 2) return {};
@@ -574,7 +549,7 @@ ExitCode run(int count, char** arguments) {
     }
     invocation.common.arguments.assign(arguments + std::min(count, 2), arguments + count);
     program.parse(count, arguments);
-    return carryOut(invocation, console);
+    return carryOut(invocation.run, invocation.rules, invocation.common, console);
   } catch (const CLI::Success& wish) {
     program.exit(wish);
     return ExitCode::done;
