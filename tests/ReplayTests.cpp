@@ -6,6 +6,7 @@
 #include <future>
 #include <memory>
 #include <optional>
+#include <stdexcept>
 #include <string>
 #include <utility>
 #include <vector>
@@ -193,6 +194,23 @@ TEST(Replay, WhoWaitsInsideThePlugInForEverIsNamed) {
   }
   letGo.set_value();
   ended.wait();
+}
+
+TEST(Replay, APlugInThatThrowsIsADifference) {
+  const std::string recording = recordingOf({"/one", "/two"});
+  const auto throwing = [](const Platform& platform) {
+    platform.process.infoDictionaryOfBundleAtPath("/one");
+    throw std::runtime_error("a plug-in that throws");
+  };
+  for (bool goOn : {false, true}) {
+    const auto result = replayed(recording, throwing, goOn);
+    EXPECT_EQ(result.problem, "");
+    ASSERT_EQ(kindsOf(result), std::vector{Difference::Kind::otherResult}) << goOn;
+    const auto& difference = result.differences.front();
+    EXPECT_NE(difference.came.find("clearSyncData threw: a plug-in that throws"), std::string::npos) << difference.came;
+    EXPECT_NE(difference.expected.find("/two"), std::string::npos) << difference.expected;
+    EXPECT_NE(difference.inside.find("clearSyncData"), std::string::npos) << difference.inside;
+  }
 }
 
 TEST(Replay, WhatNoPlugInIsToldIsRefused) {

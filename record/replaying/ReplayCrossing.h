@@ -138,7 +138,13 @@ class ReplayCrossing {
   bool wait(const Operation& operation, platform::Mutex& mutex, platform::Condition& changed,
             platform::Clock::Instant deadline, const std::function<bool()>& satisfied) const APPSYNC_REQUIRES(mutex) {
     mutex.unlock();
-    const bool woken = answer<bool>(operation, nullptr, Deadline{deadline.time_since_epoch().count()});
+    bool woken = false;
+    try {
+      woken = answer<bool>(operation, nullptr, Deadline{deadline.time_since_epoch().count()});
+    } catch (...) {
+      mutex.lock();
+      throw;
+    }
     mutex.lock();
     const bool isSatisfied = satisfied();
     if (isSatisfied) return true;

@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <chrono>
+#include <exception>
 #include <new>
 #include <stdexcept>
 #include <system_error>
@@ -178,14 +179,24 @@ void Replayer::play(Player& player, const Event& event) {
   player.inside.push_back(operation);
   ItemReader arguments(event.payload, &event.large);
   ItemWriter result;
-  std::string problem;
+  std::string problem, thrown;
   mutex.unlock();
   try {
     call(*this, arguments, result);
   } catch (const RecordingError& error) {
     problem = "event " + std::to_string(event.number) + ": " + error.what();
+  } catch (const std::exception& error) {
+    thrown = error.what();
+  } catch (...) {
+    thrown = "no exception of the standard library";
   }
   mutex.lock();
+  if (!thrown.empty() && !isOver()) {
+    // Whatever the caller made of it is not known.
+    differ(Difference::Kind::otherResult, player, head(),
+           operation.service + "." + operation.name + " threw: " + thrown);
+    if (!isOver()) end();
+  }
   player.inside.pop_back();
   if (!problem.empty() && !isOver()) refuse(problem);
   if (!isOver()) leave(player, event, result);
