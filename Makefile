@@ -37,7 +37,7 @@ check: check-packages ## format, sizes, includes, spelling, documents, interface
 	@cmake --preset clang >build/clang.configured
 	@.ci/check build/clang
 	@cmake --build --preset clang
-	@python3 tests/library_state.py build/clang/*/libapplicationsync-*.a build/clang/bin/libApplicationSync.so
+	@python3 tests/library_state.py build/clang/platform/*.a build/clang/plist/*.a build/clang/bin/libApplicationSync.so
 	@$(call PRESET,release,tsd ApplicationSync platform plist)
 	@python3 tests/hardened_files.py build/release/bin/tsd build/release/bin/libApplicationSync.so \
 	  build/release/*/libapplicationsync-*.a
