@@ -11,6 +11,9 @@ SEEDS ?=
 unexport SEEDS
 PROCESSORS := $(shell nproc 2>/dev/null || echo 2)
 CTEST := ctest --output-on-failure --no-tests=error --timeout 1800 -j $(PROCESSORS)
+# What the build has written goes to the disk first: a test that flushes a file would wait for all of it, longer than a
+# restore waits for a placeholder.
+FLUSH = sync -f build
 WITH_SEEDS = $(if $(SEEDS),APPSYNC_SEEDS=$(SEEDS))
 # $(call PRESET,name,targets): everything without targets.
 PRESET = mkdir -p build && cmake --preset $(1) >build/$(1).configured && \
@@ -30,6 +33,7 @@ demo: build ## a whole life of a device, from the first sync to a restore, in a 
 	@examples/demo build/release/bin/tsd build/demo
 
 test: build-all farm-packages ## all tests (SEEDS=N: that many random scenarios)
+	@$(FLUSH)
 	@cd build/release && $(WITH_SEEDS) $(CTEST)
 
 check: check-packages ## format, sizes, includes, spelling, documents, interface, clang-tidy, thread safety, state, hardening
@@ -44,6 +48,7 @@ check: check-packages ## format, sizes, includes, spelling, documents, interface
 
 asan: packages ## all tests with the address and undefined-behaviour sanitizers
 	@$(call PRESET,asan)
+	@$(FLUSH)
 	@cd build/asan && $(WITH_SEEDS) UBSAN_OPTIONS=print_stacktrace=1 \
 	  LSAN_OPTIONS=suppressions=$(CURDIR)/.ci/leaks:print_suppressions=0 $(CTEST)
 
@@ -68,6 +73,7 @@ arm64: arm64-packages ## the plug-in, the lists and the device for the processor
 coverage: coverage-packages ## how much of each folder the tests run, as a table, and every line as pages
 	@$(call PRESET,coverage)
 	@find build/coverage -name '*.gcda' -delete
+	@$(FLUSH)
 	@cd build/coverage && $(WITH_SEEDS) GCOV_ERROR_FILE=/dev/null $(CTEST)
 	@.ci/coverage build/coverage
 
