@@ -16,8 +16,8 @@
 #include "tsd/OptionTable.h"
 #include "tsd/command/CarryOut.h"
 #include "tsd/command/Commands.h"
-#include "tsd/command/LastWords.h"
 #include "tsd/help/HelpText.h"
+#include "tsd/stopping/LastWords.h"
 #include "tsd/terminal/Output.h"
 #include "tsd/terminal/Suggestion.h"
 

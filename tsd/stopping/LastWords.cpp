@@ -1,4 +1,4 @@
-#include "tsd/command/LastWords.h"
+#include "tsd/stopping/LastWords.h"
 
 #include <malloc.h>
 #include <unistd.h>
