@@ -89,25 +89,13 @@ void callClient(Replayer& replayer, ItemReader& arguments, ItemWriter& result) {
   callMethod<method>(replayer, arguments, result, std::move(target), method);
 }
 
-template <auto method>
-void callDelegate(Replayer& replayer, ItemReader& arguments, ItemWriter& result) {
-  const auto number = receiver(arguments, ObjectKind::observer);
-  std::shared_ptr<RVAppInstallObserverDelegate> target;
-  {
-    Lock lock(replayer.mutex);
-    target = replayer.observed(number).delegate.lock();
-  }
-  callMethod<method>(replayer, arguments, result, std::move(target), method);
-}
-
-template <auto method>
+/// One of the plug-in's observers; `kept` is where the replayer has it.
+template <auto kept, auto method>
 void callObserver(Replayer& replayer, ItemReader& arguments, ItemWriter& result) {
   const auto number = receiver(arguments, ObjectKind::observer);
-  std::shared_ptr<OBApplicationWorkspaceObserverProtocol> target;
-  {
-    Lock lock(replayer.mutex);
-    target = replayer.observed(number).workspace.lock();
-  }
+  Lock lock(replayer.mutex);
+  auto target = (replayer.observed(number).*kept).lock();
+  lock.unlock();
   callMethod<method>(replayer, arguments, result, std::move(target), method);
 }
 
@@ -221,13 +209,19 @@ void addCallbacks(Table& table) {
   namespace delegate = inbound::delegate;
   namespace workspace = inbound::workspace;
   add(table, delegate::promiseDidBeginFulfillmentWithIdentifier,
-      callDelegate<&Delegate::promiseDidBeginFulfillmentWithIdentifier>);
-  add(table, delegate::coordinatorDidInstallPlaceholder, callDelegate<&Delegate::coordinatorDidInstallPlaceholder>);
-  add(table, delegate::coordinatorDidCompleteSuccessfully, callDelegate<&Delegate::coordinatorDidCompleteSuccessfully>);
-  add(table, delegate::coordinatorShouldPrioritize, callDelegate<&Delegate::coordinatorShouldPrioritize>);
-  add(table, delegate::coordinatorCanceledWithReason, callDelegate<&Delegate::coordinatorCanceledWithReason>);
-  add(table, workspace::applicationInstallsArePrioritized, callObserver<&Observer::applicationInstallsArePrioritized>);
-  add(table, workspace::applicationInstallsDidCancel, callObserver<&Observer::applicationInstallsDidCancel>);
+      callObserver<&Replayer::Observed::delegate, &Delegate::promiseDidBeginFulfillmentWithIdentifier>);
+  add(table, delegate::coordinatorDidInstallPlaceholder,
+      callObserver<&Replayer::Observed::delegate, &Delegate::coordinatorDidInstallPlaceholder>);
+  add(table, delegate::coordinatorDidCompleteSuccessfully,
+      callObserver<&Replayer::Observed::delegate, &Delegate::coordinatorDidCompleteSuccessfully>);
+  add(table, delegate::coordinatorShouldPrioritize,
+      callObserver<&Replayer::Observed::delegate, &Delegate::coordinatorShouldPrioritize>);
+  add(table, delegate::coordinatorCanceledWithReason,
+      callObserver<&Replayer::Observed::delegate, &Delegate::coordinatorCanceledWithReason>);
+  add(table, workspace::applicationInstallsArePrioritized,
+      callObserver<&Replayer::Observed::workspace, &Observer::applicationInstallsArePrioritized>);
+  add(table, workspace::applicationInstallsDidCancel,
+      callObserver<&Replayer::Observed::workspace, &Observer::applicationInstallsDidCancel>);
   add(table, inbound::notification, callNotified);
   add(table, inbound::block, callBlock);
   add(table, inbound::completion, callCompletion);
