@@ -89,8 +89,6 @@ def copy_build(source, folder, names):
     digest = hashlib.sha256()
     (folder / "build").mkdir(parents=True, exist_ok=True)
     for name in names:
-        if not (source / name).is_file():
-            raise Refusal(f"{source / name}: not there; '--build' names the folder with {', '.join(names)}")
         shutil.copy2(source / name, folder / "build" / name)
         digest.update(f"{name} {digest_of(folder / 'build' / name)}\n".encode())
     return digest.hexdigest()
@@ -113,6 +111,8 @@ def keep_recording(path, folder):
 
 def recording_pieces(source, folder):
     """A piece for each content, whatever the number of files that have it."""
+    if not source.is_dir():
+        raise Refusal(f"{source}: no such folder")
     pieces = {}
     for path in sorted(source.rglob("*.recording")):
         digest = keep_recording(path.resolve(), folder)
@@ -135,8 +135,13 @@ def lay(asked):
         raise Refusal("nothing to run: give --recordings, --seeds or both")
     seeds = seeds_of(asked.seeds) if asked.seeds else None
     names = ["libApplicationSync.so", *(["tsd"] if asked.recordings else []), *(["plugin_tests"] if seeds else [])]
-    build = copy_build(pathlib.Path(asked.build), folder, names)
+    source = pathlib.Path(asked.build)
+    for name in names:
+        if not (source / name).is_file():
+            raise Refusal(f"{source / name}: not there; '--build' names the folder with {', '.join(names)}")
+    # What may be refused comes before anything is written.
     pieces = recording_pieces(pathlib.Path(asked.recordings), folder) if asked.recordings else []
+    build = copy_build(source, folder, names)
     pieces += seed_pieces(*seeds) if seeds else []
     count = min(-(-len(pieces) // asked.per_job), MOST_JOBS)
     shutil.rmtree(folder / "jobs", ignore_errors=True)
