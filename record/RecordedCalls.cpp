@@ -74,10 +74,15 @@ Value argumentsOf(const OperationName& operation, std::string_view payload) {
   return arguments;
 }
 
-void setAnswer(RecordedCall& call, std::string_view payload) {
+void setAnswer(RecordedCall& call, std::string_view payload, bool threw) {
   ItemReader items(payload);
-  if (items.atEnd()) return;
-  call.result = valueOf(items.skip());
+  const auto first = items.atEnd() ? std::string_view() : items.skip();
+  if (threw) {
+    call.error = platform::makeError("exception", 0, first.empty() ? "" : itemText(first));
+    return;
+  }
+  if (first.empty()) return;
+  call.result = valueOf(first);
   while (!items.atEnd()) {
     if (items.peek() == Tag::error)
       call.error = errorIn(items);
@@ -93,7 +98,7 @@ class Reading {
   void take(const Event& event, const OperationName& operation, const std::string& thread, const std::string& app) {
     auto& open = _open[event.thread];
     if (event.kind == EventKind::enter) _time = event.time;
-    if (event.kind == EventKind::enter || event.kind == EventKind::call) {
+    if (opens(event.kind)) {
       RecordedCall call{.thread = thread, .service = operation.service, .operation = operation.name, .app = app};
       call.of = classOf(operation);
       call.intoPlugin = event.kind == EventKind::enter;
@@ -105,10 +110,7 @@ class Reading {
       open.pop_back();
       call.end = call.intoPlugin;
       if (call.end) call.arguments = Value::makeDictionary();
-      if (event.kind == EventKind::threw)
-        call.error = platform::makeError("exception", 0, event.payload.empty() ? "" : itemText(event.payload));
-      else
-        setAnswer(call, event.payload);
+      setAnswer(call, event.payload, event.kind == EventKind::threw || event.kind == EventKind::thrown);
       tell(call, event);
     }
   }

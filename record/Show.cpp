@@ -12,17 +12,11 @@ namespace record {
 namespace {
 
 std::string lineOf(const Event& event, const OperationName& name) {
-  switch (event.kind) {
-    case EventKind::call:
-      return "> " + callLine(name, event.payload);
-    case EventKind::enter:
-      return "< " + callLine(name, event.payload);
-    case EventKind::answer:
-    case EventKind::leave:
-      return "= " + resultLine(name, event.payload);
-    default:
-      return "! " + name.service + "." + name.name + " throws " + itemText(event.payload);
-  }
+  const auto sign = [&] {
+    if (opens(event.kind)) return event.kind == EventKind::call ? "> " : "< ";
+    return event.kind == EventKind::answer || event.kind == EventKind::leave ? "= " : "! ";
+  };
+  return sign() + eventLine(event.kind, name, event.payload);
 }
 
 }  // namespace
@@ -36,12 +30,11 @@ RecordingFacts show(std::string_view recording, const std::function<void(std::st
   Event event;
   while (reader.next(event)) {
     if (auto app = story.appOf(event); !app.empty()) apps.insert(std::move(app));
-    const bool opens = event.kind == EventKind::call || event.kind == EventKind::enter;
     std::size_t& depth = depths[event.thread];
-    if (!opens && depth > 0) --depth;
+    if (!opens(event.kind) && depth > 0) --depth;
     write(std::to_string(event.number) + " " + reader.threads()[event.thread] + " " + std::string(2 * depth, ' ') +
           lineOf(event, reader.operations()[event.operation]));
-    if (opens) ++depth;
+    if (opens(event.kind)) ++depth;
     ++facts.events;
   }
   facts.threads = reader.threads().size();

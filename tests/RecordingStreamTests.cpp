@@ -287,9 +287,11 @@ TEST(RecordingStream, WhatIsNoRecordingOrALaterOneIsRefusedByName) {
     EXPECT_EQ(read.problem, "the recording has version " + std::to_string(static_cast<unsigned char>(version)) +
                                 ", this program reads versions up to " + std::to_string(record::recordingVersion));
   }
-  auto first = recording;
-  first[record::recordingMagic.size()] = 1;
-  EXPECT_EQ(readAll(first).events.size(), 2u);
+  for (char version = 1; version < static_cast<char>(record::recordingVersion); ++version) {
+    auto earlier = recording;
+    earlier[record::recordingMagic.size()] = version;
+    EXPECT_EQ(readAll(earlier).events.size(), 2u);
+  }
 }
 
 // ---- Streams that nobody wrote ----
@@ -341,6 +343,8 @@ std::vector<Hostile> hostileEvents() {
       {"no thread", enter, "event 1: it is of a thread that is not known"},
       {"no operation", std::string("\6\4main", 6) + enter, "event 1: it is of an operation that is not known"},
       {"another thread", text + "\3" + number(77), "event 1: it is of a thread that is not known"},
+      {"a throw of nothing", text + "\x18" + std::string(1, '\0'),
+       "event 1: the plug-in has one thread inside it at a time"},
       {"no such entry", text + "\x0e", "event 1: there is no event of this sort"},
       {"a call from nowhere", text + call + std::string(1, '\0'),
        "event 1: the plug-in has one thread inside it at a time"},

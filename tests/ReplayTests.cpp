@@ -11,10 +11,16 @@
 #include <utility>
 #include <vector>
 
+#include "platform/Error.h"
+#include "platform/FileSystem.h"
+#include "platform/HomeScreen.h"
+#include "platform/OBApplicationWorkspace.h"
 #include "platform/Platform.h"
 #include "platform/Process.h"
 #include "platform/TSClient.h"
+#include "record/RecordingPlatform.h"
 #include "record/Replay.h"
+#include "record/Show.h"
 #include "record/Sink.h"
 #include "record/calls/Inbound.h"
 #include "record/stream/Event.h"
@@ -207,10 +213,202 @@ TEST(Replay, APlugInThatThrowsIsADifference) {
     EXPECT_EQ(result.problem, "");
     ASSERT_EQ(kindsOf(result), std::vector{Difference::Kind::otherResult}) << goOn;
     const auto& difference = result.differences.front();
-    EXPECT_NE(difference.came.find("clearSyncData threw: a plug-in that throws"), std::string::npos) << difference.came;
+    EXPECT_NE(difference.came.find("clearSyncData throws \"a plug-in that throws\""), std::string::npos)
+        << difference.came;
     EXPECT_NE(difference.expected.find("/two"), std::string::npos) << difference.expected;
     EXPECT_NE(difference.inside.find("clearSyncData"), std::string::npos) << difference.inside;
   }
+}
+
+// ---- What is thrown ----
+
+struct OwnException {};
+constexpr const char* ownPath = "/own";
+
+/// A call to a service, or into the plug-in, on the one thread of a recording.
+class Script {
+ public:
+  explicit Script(const std::shared_ptr<Memory>& sink) : _writer(sink) {
+    _writer.addThread("thread-1");
+    begin(EventKind::enter, record::inbound::create, [](ItemWriter&) {});
+    end(EventKind::leave, [](ItemWriter& items) { items.object({ObjectKind::client, 1, ObjectMention::isNew}); });
+    begin(EventKind::enter, record::inbound::client::clearSyncData, [](ItemWriter& items) {
+      items.object({ObjectKind::client, 1, 0});
+    });
+  }
+  template <class Put>
+  void begin(EventKind kind, const record::Operation& operation, const Put& put) {
+    const auto number = _writer.addOperation({operation.service, operation.name, operation.parameters});
+    _writer.write(kind, 0, number, 0, items(put));
+  }
+  template <class Put>
+  void end(EventKind kind, const Put& put) {
+    _writer.write(kind, 0, 0, 0, items(put));
+  }
+  void finish() { _writer.finish(); }
+
+ private:
+  template <class Put>
+  static std::string items(const Put& put) {
+    ItemWriter items;
+    put(items);
+    return items.take();
+  }
+  record::EventWriter _writer;
+};
+
+/// A block that throws through its service.
+void writeBlocks(Script& script) {
+  const auto thrown = [](ItemWriter& items) {
+    items.boolean(false);
+    items.boolean(true);
+  };
+  script.begin(EventKind::call, {"OBApplicationWorkspace", "enumerateBundlesOfType", "type block"}, [](auto& items) {
+    items.number(1);
+    items.object({ObjectKind::callback, 2, ObjectMention::isNew});
+  });
+  for (int again = 0; again < 2; ++again) {
+    script.begin(EventKind::enter, record::inbound::block, [](auto& items) {
+      items.object({ObjectKind::callback, 2, 0});
+      items.absent();
+    });
+    script.end(EventKind::thrown, thrown);
+  }
+  script.end(EventKind::threw, [](auto& items) { items.boolean(true); });
+}
+
+/// That, services that throw after they have put out an error and a buffer, and the plug-in that throws out of what it
+/// was told.
+std::string recordingOfThrows() {
+  const auto sink = std::make_shared<Memory>();
+  Script script(sink);
+  writeBlocks(script);
+  script.begin(EventKind::call, {"FileSystem", "removeItem", "path -> error"}, [](auto& items) {
+    items.text(ownPath);
+    items.boolean(true);
+  });
+  script.end(EventKind::threw, [](auto& items) {
+    items.text("a service that throws");
+    items.error();
+    items.text("domain");
+    items.signedNumber(7);
+    items.text("put out before");
+    items.absent();
+  });
+  script.begin(EventKind::call, {"HomeScreen", "PNGetFlattenedIconState", "port form -> buffer"}, [](auto& items) {
+    items.number(5);
+    items.signedNumber(1);
+    items.boolean(true);
+  });
+  script.end(EventKind::threw, [](auto& items) {
+    items.absent();
+    items.object({ObjectKind::buffer, 3, ObjectMention::isNew | ObjectMention::hasFacts});
+    items.data("lent");
+  });
+  script.end(EventKind::thrown, [](auto& items) { items.text("a plug-in that throws"); });
+  script.finish();
+  return sink->content;
+}
+
+/// What the plug-in of `recordingOfThrows` does; `heard` is what it saw.
+void throwAndHear(const Platform& platform, std::vector<std::string>& heard) {
+  try {
+    platform.workspace.enumerateBundlesOfType(1, [](const platform::OBBundleProxyRef&, bool& stop) {
+      stop = true;
+      throw OwnException();
+    });
+  } catch (const OwnException&) {
+    heard.emplace_back("its own exception");
+  }
+  ErrorRef error;
+  try {
+    platform.fileSystem.removeItem(ownPath, &error);
+  } catch (const std::runtime_error& exception) {
+    heard.push_back(exception.what() + (error ? ", " + error->describe() : std::string()));
+  }
+  void* buffer = nullptr;
+  std::size_t length = 0;
+  try {
+    platform.homeScreen.PNGetFlattenedIconState(5, 1, &buffer, &length);
+  } catch (const std::bad_alloc&) {
+    heard.emplace_back(static_cast<const char*>(buffer), length);
+  }
+  throw std::runtime_error("a plug-in that throws");
+}
+
+std::vector<std::string> linesOf(const std::string& recording) {
+  std::vector<std::string> lines;
+  const auto facts = record::show(recording, [&](std::string_view line) { lines.emplace_back(line); });
+  EXPECT_EQ(facts.problem, "");
+  EXPECT_TRUE(facts.isWhole);
+  return lines;
+}
+
+TEST(Replay, WhatIsThrownIsThrownAgainWhereItWas) {
+  std::vector<std::string> heard;
+  const auto result = replayed(recordingOfThrows(), [&](const Platform& platform) { throwAndHear(platform, heard); });
+  EXPECT_EQ(result.problem, "");
+  EXPECT_EQ(kindsOf(result), std::vector<Difference::Kind>{});
+  EXPECT_TRUE(result.isWhole);
+  EXPECT_EQ(result.events, 14u);
+  const auto error = platform::makeError("domain", 7, "put out before")->describe();
+  EXPECT_EQ(heard, (std::vector<std::string>{"its own exception", "a service that throws, " + error, "lent"}));
+}
+
+/// Services of a replay throw as they should: so a plug-in that is recorded on them has the same recording.
+TEST(Replay, WhatIsThrownIsRecordedWithItsEnd) {
+  const std::string recording = recordingOfThrows();
+  const auto sink = std::make_shared<Memory>();
+  std::unique_ptr<record::RecordingPlatform> recorder;
+  std::vector<std::string> heard;
+  record::replay(recording, [&](const Platform& platform) {
+    recorder = record::recordingPlatform(platform, sink);
+    return recorder->makeClient([&](const Platform& recorded) {
+      return std::make_shared<Plugin>(recorded, [&](const Platform& seen) { throwAndHear(seen, heard); });
+    });
+  });
+  recorder = nullptr;
+  EXPECT_EQ(heard.size(), 3u);
+  const auto expected = linesOf(recording);
+  auto lines = linesOf(sink->content);
+  // Then the plug-in's object goes.
+  ASSERT_GT(lines.size(), expected.size());
+  lines.resize(expected.size());
+  EXPECT_EQ(lines, expected);
+}
+
+TEST(Replay, WhatIsThrownDifferentlyIsTold) {
+  const std::string recording = recordingOfThrows();
+  const auto cameOf = [&](const Plugin::Work& work) {
+    const auto result = replayed(recording, work);
+    EXPECT_EQ(kindsOf(result), std::vector{Difference::Kind::otherResult});
+    return result.differences.empty() ? "" : result.differences.front().came + " / " + result.differences[0].expected;
+  };
+  std::vector<std::string> heard;
+  const std::string expected = "TSClient.clearSyncData throws \"a plug-in that throws\"";
+  const auto other = [&](const Platform& platform) {
+    try {
+      throwAndHear(platform, heard);
+    } catch (const std::runtime_error&) {
+      throw OwnException();
+    }
+  };
+  EXPECT_EQ(cameOf(other), "TSClient.clearSyncData throws no exception of the standard library / " + expected);
+  const auto none = [&](const Platform& platform) {
+    try {
+      throwAndHear(platform, heard);
+    } catch (const std::runtime_error&) {
+      return;
+    }
+  };
+  EXPECT_EQ(cameOf(none), "TSClient.clearSyncData returns  / " + expected);
+  const auto inBlock = [](const Platform& platform) {
+    platform.workspace.enumerateBundlesOfType(1,
+                                              [](const platform::OBBundleProxyRef&, bool&) { throw OwnException(); });
+  };
+  EXPECT_EQ(cameOf(inBlock),
+            "OBApplicationWorkspace.block throws no exception of the standard library, false / "
+            "OBApplicationWorkspace.block throws no exception of the standard library, true");
 }
 
 TEST(Replay, WhatNoPlugInIsToldIsRefused) {

@@ -42,10 +42,16 @@ Callback<Signature> callback(std::function<Signature> function) {
 struct LentBuffer {
   void** buffer;
   std::size_t* length;
+  const void* before = *buffer;
 };
 struct ReturnedBuffer {
   void* buffer;
   std::size_t length;
+};
+
+/// What a block of the plug-in's tells whoever calls it.
+struct Stop {
+  bool& isWanted;
 };
 
 /// The clock's wait: what the plug-in waits with. Only the deadline is written.

@@ -222,11 +222,8 @@ std::function<void(const platform::OBBundleProxyRef&, bool&)> recordedFunction(
         [&](ItemWriter& items) {
           items.object({ObjectKind::callback, callback.number, 0});
         },
-        [&](const platform::OBBundleProxyRef& seen) {
-          callback.function(seen, stop);
-          return stop;
-        },
-        bundle);
+        [&](const platform::OBBundleProxyRef& seen, const Stop& wanted) { callback.function(seen, wanted.isWanted); },
+        bundle, Stop{stop});
   };
 }
 
@@ -238,7 +235,13 @@ Callback<void(double)> toPluginArgument(Recorder& recorder, const platform::TSPr
             outward.items().object({ObjectKind::callback, number, 0});
             outward.items().real(fraction);
             outward.leave();
-            callback(fraction);
+            try {
+              callback(fraction);
+            } catch (...) {
+              outward.enterThrown();
+              outward.threw();
+              throw;
+            }
             outward.enter();
             outward.answer();
           },

@@ -2,8 +2,9 @@
 
 #include <algorithm>
 #include <exception>
-#include <new>
 #include <utility>
+
+#include "record/stream/Thrown.h"
 
 namespace record {
 
@@ -52,13 +53,19 @@ void Recorder::write(EventKind kind, const Operation* operation) {
 
 Recorder::Outward::Outward(Recorder& recorder, const Operation& operation, const Numbered* receiver)
     : _recorder(recorder), _operation(operation), _stray(!recorder.holdsBaton()) {
-  if (_stray) _recorder.takeBaton();
+  if (_stray) {
+    _recorder.takeBaton();
+  } else {
+    _thread = &_recorder.thisThread();
+    _outer = std::exchange(_thread->innermost, this);
+  }
   items().clear();
   if (receiver) items().object(receiver->mention());
 }
 
 Recorder::Outward::~Outward() {
   if (!_inside) _recorder.takeBaton();
+  if (_thread) _thread->innermost = _outer;
   if (_stray) _recorder.giveBaton();
 }
 
@@ -83,17 +90,15 @@ void Recorder::Outward::answer() {
   if (!_stray) _recorder.write(EventKind::answer, nullptr);
 }
 
+void Recorder::Outward::enterThrown() {
+  enter();
+  if (_ofPlugin && _ofPlugin == std::current_exception())
+    putThrownByPlugin(items());
+  else
+    putThrown(items());
+}
+
 void Recorder::Outward::threw() {
-  if (!_inside) enter();
-  try {
-    throw;
-  } catch (const std::bad_alloc&) {
-    items().absent();
-  } catch (const std::exception& exception) {
-    items().text(exception.what());
-  } catch (...) {
-    items().boolean(false);
-  }
   if (!_stray) _recorder.write(EventKind::threw, nullptr);
 }
 
@@ -106,8 +111,18 @@ Recorder::Inward::~Inward() { _recorder.giveBaton(); }
 
 void Recorder::Inward::begin(const Operation& operation) { _recorder.write(EventKind::enter, &operation); }
 
-void Recorder::Inward::end(bool flushed) {
-  _recorder.write(EventKind::leave, nullptr);
+void Recorder::Inward::end(bool flushed) { ended(EventKind::leave, flushed); }
+
+void Recorder::Inward::beginThrown() {
+  if (auto* around = _recorder.thisThread().innermost) around->setThrownByPlugin();
+  items().clear();
+  putThrown(items());
+}
+
+void Recorder::Inward::endThrown(bool flushed) { ended(EventKind::thrown, flushed); }
+
+void Recorder::Inward::ended(EventKind kind, bool flushed) {
+  _recorder.write(kind, nullptr);
   if (flushed) _recorder._writer.flush();
   _recorder.forgetGone();
 }

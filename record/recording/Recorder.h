@@ -3,6 +3,7 @@
 #include <atomic>
 #include <chrono>
 #include <cstdint>
+#include <exception>
 #include <functional>
 #include <map>
 #include <memory>
@@ -39,6 +40,11 @@ class Recorder : public Names, public std::enable_shared_from_this<Recorder> {
   void setNotifications(platform::NotificationCenter& center) { _notifications = &center; }
   platform::NotificationCenter& notifications() const { return *_notifications; }
 
+  class Outward;
+  struct Thread {
+    std::uint32_t number;
+    Outward* innermost = nullptr;  // the call to a service that the thread is inside of
+  };
   /// The plug-in calls a service: from the call's arguments to its answer. Made and used with the baton in hand, which
   /// it gives back while the service works.
   class Outward {
@@ -55,8 +61,11 @@ class Recorder : public Names, public std::enable_shared_from_this<Recorder> {
     /// Leaves again, for a service that has not finished after all.
     void giveUp();
     void answer();
-    /// The service has thrown what is being handled.
+    /// The service has thrown what is being handled; what it had put out can be put.
+    void enterThrown();
     void threw();
+    /// The plug-in throws inside of it what is being handled.
+    void setThrownByPlugin() { _ofPlugin = std::current_exception(); }
     ItemWriter& items() { return _recorder._items; }
 
    private:
@@ -64,6 +73,9 @@ class Recorder : public Names, public std::enable_shared_from_this<Recorder> {
     const Operation& _operation;
     bool _stray;  // nobody called the plug-in on this thread: nothing is written
     bool _inside = true;
+    Thread* _thread = nullptr;
+    Outward* _outer = nullptr;       // the call of the same thread that this one is inside of
+    std::exception_ptr _ofPlugin{};  // what the plug-in has thrown inside of this one
   };
 
   /// Somebody calls the plug-in. Holds the baton, but for the services that the plug-in calls.
@@ -78,9 +90,14 @@ class Recorder : public Names, public std::enable_shared_from_this<Recorder> {
     void begin(const Operation& operation);
     /// Writes the return; `flushed`: from here on it can be read.
     void end(bool flushed);
+    /// The plug-in has thrown what is being handled; what it had put out can be put before the end.
+    void beginThrown();
+    void endThrown(bool flushed);
     ItemWriter& items() { return _recorder._items; }
 
    private:
+    void ended(EventKind kind, bool flushed);
+
     Recorder& _recorder;
   };
 
@@ -108,9 +125,6 @@ class Recorder : public Names, public std::enable_shared_from_this<Recorder> {
   bool failed();
 
  private:
-  struct Thread {
-    std::uint32_t number;
-  };
   Thread& thisThread();
   std::uint32_t numberOf(const Operation& operation);
   void write(EventKind kind, const Operation* operation);

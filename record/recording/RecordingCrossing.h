@@ -74,13 +74,16 @@ class RecordingCrossing {
     std::tuple<T&, decltype(toWorld(recorder, arguments))...> passed{*_target, toWorld(recorder, arguments)...};
     outward.leave();
     using Result = decltype(std::apply(body, std::move(passed)));
+    const auto putOuts = [&] { (putOutThrown(recorder, outward.items(), arguments), ...); };
     if constexpr (std::is_void_v<Result>) {
-      guarded(outward, [&] { std::apply(body, std::move(passed)); });
+      guarded(
+          outward, [&] { std::apply(body, std::move(passed)); }, putOuts);
       outward.enter();
       (putOut(recorder, outward.items(), arguments), ...);
       outward.answer();
     } else {
-      Result result = guarded(outward, [&] { return std::apply(body, std::move(passed)); });
+      Result result = guarded(
+          outward, [&] { return std::apply(body, std::move(passed)); }, putOuts);
       outward.enter();
       auto seen = toPlugin(recorder, std::move(result));
       put(outward.items(), recorder, seen);
@@ -147,12 +150,15 @@ class RecordingCrossing {
   }
 
  private:
-  /// A service that throws is recorded as one; the plug-in gets what it threw.
-  template <class Work>
-  static decltype(auto) guarded(Recorder::Outward& outward, Work&& work) {
+  static void putNothing() {}
+  /// A service that throws is recorded as one, with what it had put out; the plug-in gets what it threw.
+  template <class Work, class PutOuts = void (*)()>
+  static decltype(auto) guarded(Recorder::Outward& outward, Work&& work, const PutOuts& putOuts = putNothing) {
     try {
       return work();
     } catch (...) {
+      outward.enterThrown();
+      putOuts();
       outward.threw();
       throw;
     }
@@ -176,7 +182,10 @@ bool RecordingCrossing<T>::wait(const Operation& operation, platform::Mutex& mut
     try {
       woken = _target->waitUntil(mutex, changed, deadline, satisfied);
     } catch (...) {
+      mutex.unlock();
+      outward.enterThrown();
       outward.threw();
+      mutex.lock();
       throw;
     }
     mutex.unlock();
@@ -233,6 +242,7 @@ void putArgument(Recorder&, ItemWriter& items, const OutReference<T>&) {
   items.boolean(true);
 }
 inline void putArgument(Recorder&, ItemWriter& items, const LentBuffer&) { items.boolean(true); }
+inline void putArgument(Recorder&, ItemWriter&, const Stop&) {}
 inline void putArgument(Recorder& recorder, ItemWriter& items, const ReturnedBuffer& returned) {
   if (const std::uint64_t number = recorder.takeBuffer(returned.buffer))
     items.object({ObjectKind::buffer, number, 0});
@@ -256,6 +266,15 @@ inline void putOut(Recorder& recorder, ItemWriter& items, const LentBuffer& lent
   if (!*lent.buffer) return items.absent();
   items.object({ObjectKind::buffer, recorder.lendBuffer(*lent.buffer), ObjectMention::isNew | ObjectMention::hasFacts});
   items.data({static_cast<const char*>(*lent.buffer), *lent.length});
+}
+inline void putOut(Recorder&, ItemWriter& items, const Stop& stop) { items.boolean(stop.isWanted); }
+/// ... by who has thrown, and may not have come so far.
+template <class T>
+void putOutThrown(Recorder& recorder, ItemWriter& items, const T& argument) {
+  putOut(recorder, items, argument);
+}
+inline void putOutThrown(Recorder& recorder, ItemWriter& items, const LentBuffer& lent) {
+  *lent.buffer == lent.before ? items.absent() : putOut(recorder, items, lent);
 }
 
 // ---- What the services get ----
@@ -360,16 +379,27 @@ auto callPlugin(Recorder& recorder, const Operation& operation, const PutReceive
   std::apply([&](auto&... each) { (putArgument(recorder, inward.items(), each), ...); }, seen);
   inward.begin(operation);
   const bool flushed = std::string_view(operation.service) == inbound::client::service;
+  const auto putOuts = [&] { (putOut(recorder, inward.items(), arguments), ...); };
+  const auto guarded = [&]() -> decltype(std::apply(body, seen)) {
+    try {
+      return std::apply(body, seen);
+    } catch (...) {
+      inward.beginThrown();
+      putOuts();
+      inward.endThrown(flushed);
+      throw;
+    }
+  };
   if constexpr (std::is_void_v<decltype(std::apply(body, seen))>) {
-    std::apply(body, seen);
+    guarded();
     inward.items().clear();
-    (putOut(recorder, inward.items(), arguments), ...);
+    putOuts();
     inward.end(flushed);
   } else {
-    auto result = std::apply(body, seen);
+    auto result = guarded();
     inward.items().clear();
     put(inward.items(), recorder, result);
-    (putOut(recorder, inward.items(), arguments), ...);
+    putOuts();
     inward.end(flushed);
     return result;
   }

@@ -30,7 +30,7 @@ bool isFixedArgument(std::string_view name) {
 
 /// Whether a text that it answers is bytes: the content of a file or a picture.
 bool answersBytes(const Event& event, const OperationName& operation) {
-  return event.kind == EventKind::answer &&
+  return (event.kind == EventKind::answer || event.kind == EventKind::threw) &&
          isOneOf(operation.name, {"readFile", "dataWithPropertyList", "QGImageDestinationCreateWithData",
                                   "QGImageDestinationAddImage", "QGImageDestinationFinalize"});
 }
@@ -54,11 +54,15 @@ class Collection {
 
   void look(const Event& event, const OperationName& operation) {
     std::string_view names(operation.parameters);
-    const bool opens = event.kind == EventKind::call || event.kind == EventKind::enter;
-    const bool isHeard = event.kind == EventKind::answer || event.kind == EventKind::enter;
+    const bool begins = opens(event.kind);
+    const bool isHeard =
+        event.kind == EventKind::answer || event.kind == EventKind::enter || event.kind == EventKind::threw;
     const bool isBytes = answersBytes(event, operation);
-    for (ItemReader items(event.payload); !items.atEnd();) {
-      const auto name = opens ? nextName(names) : std::string_view(operation.name);
+    ItemReader items(event.payload);
+    // What an exception says is like what an error says.
+    if (event.kind == EventKind::threw && !items.atEnd()) items.skip();
+    while (!items.atEnd()) {
+      const auto name = begins ? nextName(names) : std::string_view(operation.name);
       if (isHeard && !(isBytes && items.peek() == Tag::text))
         hear(items, name, isFixedArgument(name));
       else if (event.kind == EventKind::call && isOneOf(name, {"message", "description", "scenario"}))
@@ -128,7 +132,9 @@ class Rewriting {
   const std::string& payload(const Event& event, const OperationName& operation) {
     _items.clear();
     const bool isBytes = answersBytes(event, operation);
-    for (ItemReader items(event.payload); !items.atEnd();) {
+    ItemReader items(event.payload);
+    if (event.kind == EventKind::threw && !items.atEnd()) whole(items);
+    while (!items.atEnd()) {
       if (isBytes && items.peek() == Tag::text)
         _items.text(_secrets.replacedBytes(items.text()));
       else

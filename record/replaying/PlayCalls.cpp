@@ -55,7 +55,18 @@ void callMethod(Replayer& replayer, ItemReader& arguments, ItemWriter& result, s
     Lock lock(replayer.mutex);
     std::apply([&](auto&... each) { (each.read(replayer, arguments), ...); }, given);
   }
-  auto call = [&] { return std::apply([&](auto&... each) { return (target.get()->*method)(each.pass()...); }, given); };
+  const auto putOuts = [&] {
+    Lock lock(replayer.mutex);
+    if (!replayer.isOver()) std::apply([&](auto&... each) { (each.putOut(replayer, result), ...); }, given);
+  };
+  const auto call = [&] {
+    try {
+      return std::apply([&](auto&... each) { return (target.get()->*method)(each.pass()...); }, given);
+    } catch (...) {
+      putOuts();
+      throw;
+    }
+  };
   if constexpr (std::is_void_v<R>) {
     if (target) call();
     // Whoever was called may go with this, inside the call.
@@ -67,8 +78,7 @@ void callMethod(Replayer& replayer, ItemReader& arguments, ItemWriter& result, s
     Lock lock(replayer.mutex);
     if (!replayer.isOver()) put(result, replayer, answer);
   }
-  Lock lock(replayer.mutex);
-  if (!replayer.isOver()) std::apply([&](auto&... each) { (each.putOut(replayer, result), ...); }, given);
+  putOuts();
 }
 
 std::uint64_t receiver(ItemReader& arguments, ObjectKind kind) {
@@ -143,9 +153,17 @@ void callCompletion(Replayer& replayer, ItemReader& arguments, ItemWriter&) {
     completion = std::exchange(replayer.completions()[number], nullptr);
   }
   if (!completion) return;
-  completion(error);
-  Lock lock(replayer.mutex);
-  replayer.completions()[number] = std::move(completion);
+  const auto keep = [&] {
+    Lock lock(replayer.mutex);
+    replayer.completions()[number] = std::move(completion);
+  };
+  try {
+    completion(error);
+  } catch (...) {
+    keep();
+    throw;
+  }
+  keep();
 }
 
 void releaseCompletion(Replayer& replayer, ItemReader& arguments, ItemWriter&) {
@@ -169,10 +187,18 @@ void callBlock(Replayer& replayer, ItemReader& arguments, ItemWriter& result) {
   }
   if (!block) throw RecordingError("a block is called that is not there");
   bool stop = false;
-  (*block)(bundle, stop);
-  Lock lock(replayer.mutex);
-  replayer.blocks()[number] = block;
-  put(result, replayer, stop);
+  const auto keep = [&] {
+    Lock lock(replayer.mutex);
+    replayer.blocks()[number] = block;
+    put(result, replayer, stop);
+  };
+  try {
+    (*block)(bundle, stop);
+  } catch (...) {
+    keep();
+    throw;
+  }
+  keep();
 }
 
 using Table = std::map<std::pair<std::string_view, std::string_view>, PlayCall>;

@@ -168,25 +168,31 @@ class ReplayCrossing {
     std::optional<std::conditional_t<std::is_void_v<Result>, bool, Result>> result;
     platform::Mutex::Lock lock(_replayer.mutex);
     ItemWriter items;
-    std::optional<Event> answered;
+    std::optional<Replayer::Answer> answered;
+    std::exception_ptr thrown;
     if (receiver) items.object(receiver->mention());
     (putGiven(_replayer, items, arguments), ...);
     answered = _replayer.exchange(operation, items);
     try {
       if (answered) {
-        ItemReader reader(answered->payload, &answered->large);
+        ItemReader reader(answered->event.payload, &answered->event.large);
+        thrown = answered->thrown(reader);
+        if constexpr (!std::is_void_v<Result>) {
+          if (!thrown) result.emplace(get<Result>(_replayer, reader));
+        }
+        // Earlier versions have nothing behind what was thrown.
+        if (!thrown || !reader.atEnd()) (getOut(_replayer, reader, arguments), ...);
         if constexpr (std::is_void_v<Result>) {
-          (getOut(_replayer, reader, arguments), ...);
-          return;
+          if (!thrown) return;
         } else {
-          result.emplace(get<Result>(_replayer, reader));
-          (getOut(_replayer, reader, arguments), ...);
-          return std::move(*result);
+          if (!thrown) return std::move(*result);
         }
       }
     } catch (const RecordingError& error) {
+      thrown = nullptr;
       _replayer.refuse(error.what());
     }
+    if (thrown) std::rethrow_exception(thrown);
     (failOut(arguments), ...);
     if constexpr (!std::is_void_v<Result>) return Result();
   }

@@ -73,9 +73,9 @@ std::optional<std::size_t> Replayer::findAhead(const Player& player, const Opera
     }
     const Event& event = _ahead[place];
     if (event.thread != player.number) continue;
-    if (depth == 0 && event.kind == EventKind::leave) return operation ? std::nullopt : std::optional(place);
+    if (depth == 0 && leaves(event.kind)) return operation ? std::nullopt : std::optional(place);
     if (depth == 0 && operation && isCall(event) && isOf(event, *operation) && isSame(event, arguments)) return place;
-    depth += event.kind == EventKind::call || event.kind == EventKind::enter ? 1 : -1;
+    depth += opens(event.kind) ? 1 : -1;
   }
   return std::nullopt;
 }
@@ -88,12 +88,12 @@ void Replayer::skipTo(const Player& player, std::size_t place, std::string_view 
       ++at;
       continue;
     }
-    const bool opens = isCall(_ahead[at]) || _ahead[at].kind == EventKind::enter;
-    if (depth == 0 && opens) {
+    const bool begins = opens(_ahead[at].kind);
+    if (depth == 0 && begins) {
       differ(Difference::Kind::missing, player, &_ahead[at], std::string(came));
       if (isOver()) return;
     }
-    depth += opens ? 1 : -1;
+    depth += begins ? 1 : -1;
     _ahead.erase(_ahead.begin() + static_cast<std::ptrdiff_t>(at));
     --place;
   }
@@ -105,7 +105,7 @@ std::vector<std::string> Replayer::standing() const {
     std::string line = player->number < _reader.threads().size() ? _reader.threads()[player->number] : "?";
     if (player->inside.empty()) line += ": outside the plug-in";
     const char* separator = ": in ";
-    for (const auto& operation : player->inside) {
+    for (const auto& [operation, thrown] : player->inside) {
       line += separator + operation.service + "." + operation.name;
       separator = ", in ";
     }
@@ -120,13 +120,13 @@ Difference& Replayer::differ(Difference::Kind kind, const Player& player, const 
   difference.came = std::move(came);
   difference.standing = standing();
   difference.thread = player.number < _reader.threads().size() ? _reader.threads()[player.number] : "";
-  if (!player.inside.empty()) difference.inside = player.inside.back().service + "." + player.inside.back().name;
+  if (!player.inside.empty())
+    difference.inside = player.inside.back().name.service + "." + player.inside.back().name.name;
   if (expected) {
     const OperationName name = nameOfEvent(*expected);
     difference.event = expected->number;
     difference.of = expected->kind == EventKind::call ? classOf(name) : OperationClass::service;
-    const bool returns = expected->kind == EventKind::leave || expected->kind == EventKind::answer;
-    difference.expected = returns ? resultLine(name, wholePayload(*expected)) : callLine(name, wholePayload(*expected));
+    difference.expected = eventLine(expected->kind, name, wholePayload(*expected));
   }
   _result.differences.push_back(std::move(difference));
   if (!_options.goOn || _result.differences.size() == mostDifferences) {
@@ -137,15 +137,15 @@ Difference& Replayer::differ(Difference::Kind kind, const Player& player, const 
 }
 
 /// The plug-in is listened to until the first message behind a difference: the one that it would have written.
-std::optional<Event> Replayer::afterEnd(const Operation& operation, const ItemWriter& arguments) {
+std::optional<Replayer::Answer> Replayer::afterEnd(const Operation& operation, const ItemWriter& arguments) {
   const std::string_view name = operation.name;
   if (std::string_view(operation.service) != "LogHandle") return std::nullopt;
   if (name == "isEnabled") {
-    ItemWriter answer;
-    answer.boolean(true);
-    Event event;
-    event.payload = answer.take();
-    return event;
+    ItemWriter items;
+    items.boolean(true);
+    Answer answer;
+    answer.event.payload = items.take();
+    return answer;
   }
   const std::string whole = arguments.whole();
   ItemReader reader(whole);

@@ -288,7 +288,7 @@ platform::TSProgressCallback Read<platform::TSProgressCallback>::from(Replayer& 
     ItemWriter arguments;
     arguments.object({ObjectKind::callback, mention.number, 0});
     arguments.real(fraction);
-    replayer.exchange(inbound::progress, arguments);
+    replayer.tell(inbound::progress, arguments);
   };
 }
 
@@ -305,7 +305,7 @@ void ReplayCrossing<platform::NotificationCenter>::addObserver(
   }
   put(items, _replayer, name);
   put(items, _replayer, suspension);
-  _replayer.exchange(operation, items);
+  _replayer.tell(operation, items);
 }
 
 template <>
@@ -318,7 +318,7 @@ void ReplayCrossing<platform::NotificationCenter>::removeObserver(const Operatio
   else
     items.absent();
   put(items, _replayer, name);
-  _replayer.exchange(operation, items);
+  _replayer.tell(operation, items);
 }
 
 }  // namespace record

@@ -6,8 +6,6 @@
 
 #include <chrono>
 #include <exception>
-#include <new>
-#include <stdexcept>
 #include <system_error>
 #include <utility>
 
@@ -17,6 +15,7 @@
 #include "record/replaying/Story.h"
 #include "record/stream/CallText.h"
 #include "record/stream/Comparison.h"
+#include "record/stream/Thrown.h"
 
 namespace record {
 
@@ -176,36 +175,40 @@ void Replayer::play(Player& player, const Event& event) {
   if (!call)
     return refuse("event " + std::to_string(event.number) + ": " + operation.service + "." + operation.name +
                   " is no call into a plug-in");
-  player.inside.push_back(operation);
+  player.inside.push_back({operation});
   ItemReader arguments(event.payload, &event.large);
   ItemWriter result;
-  std::string problem, thrown;
+  std::string problem;
+  std::exception_ptr thrown;
   mutex.unlock();
   try {
     call(*this, arguments, result);
   } catch (const RecordingError& error) {
     problem = "event " + std::to_string(event.number) + ": " + error.what();
-  } catch (const std::exception& error) {
-    thrown = error.what();
   } catch (...) {
-    thrown = "no exception of the standard library";
+    thrown = std::current_exception();
+    ItemWriter items;
+    putThrown(items);
+    items.items(result.bytes());
+    result = std::move(items);
   }
   mutex.lock();
-  if (!thrown.empty() && !isOver()) {
-    // Whatever the caller made of it is not known.
-    differ(Difference::Kind::otherResult, player, head(),
-           operation.service + "." + operation.name + " threw: " + thrown);
-    if (!isOver()) end();
-  }
-  player.inside.pop_back();
   if (!problem.empty() && !isOver()) refuse(problem);
-  if (!isOver()) leave(player, event, result);
+  if (!isOver()) leave(player, event, thrown != nullptr, result);
+  player.inside.pop_back();
+  if (!player.inside.empty()) player.inside.back().thrown = std::move(thrown);
   passTurn();
 }
 
-void Replayer::leave(Player& player, const Event& entered, const ItemWriter& result) {
+void Replayer::leave(Player& player, const Event& entered, bool threw, const ItemWriter& result) {
   const Event* next = head();
-  if (next && next->kind != EventKind::leave) {
+  if (threw && next && (next->kind != EventKind::thrown || !isSame(*next, result))) {
+    // Whatever the caller made of it is not known.
+    differ(Difference::Kind::otherResult, player, next, throwLine(nameOfEvent(entered), result.whole()));
+    if (!isOver()) end();
+    return;
+  }
+  if (next && !leaves(next->kind)) {
     auto place = findAhead(player, nullptr, result);
     if (!place && !_options.goOn) return void(differ(Difference::Kind::missing, player, next, {}));
     if (!place) return end();
@@ -217,7 +220,7 @@ void Replayer::leave(Player& player, const Event& entered, const ItemWriter& res
     next = &_ahead[*place];
   }
   if (!next) return;
-  if (!isSame(*next, result))
+  if ((next->kind == EventKind::thrown) != threw || !isSame(*next, result))
     differ(Difference::Kind::otherResult, player, next, resultLine(nameOfEvent(entered), result.whole()));
   if (isOver()) return;
   auto at = std::find_if(_ahead.begin(), _ahead.end(), [&](const Event& event) { return &event == next; });
@@ -225,18 +228,30 @@ void Replayer::leave(Player& player, const Event& entered, const ItemWriter& res
   ++_result.events;
 }
 
-std::optional<Event> Replayer::exchange(const Operation& operation, const ItemWriter& arguments) {
+std::optional<Replayer::Answer> Replayer::exchange(const Operation& operation, const ItemWriter& arguments) {
   auto* player = static_cast<Player*>(currentPlayer);
   if (isOver() && player && player == _messenger) return afterEnd(operation, arguments);
   if (isOver() || !player || ignores(operation)) return std::nullopt;
   if (!match(*player, operation, arguments)) return std::nullopt;
-  struct Inside {
-    std::vector<OperationName>& names;
-    ~Inside() { names.pop_back(); }
-  } inside{player->inside};
-  player->inside.push_back({operation.service, operation.name, operation.parameters});
+  player->inside.push_back({{operation.service, operation.name, operation.parameters}});
   passTurn();
-  return awaitAnswer(*player);
+  auto event = awaitAnswer(*player);
+  const Open ended = std::move(player->inside.back());
+  player->inside.pop_back();
+  return event ? std::optional(Answer{std::move(*event), ended.thrown}) : std::nullopt;
+}
+
+void Replayer::tell(const Operation& operation, const ItemWriter& arguments) {
+  const auto answer = exchange(operation, arguments);
+  if (!answer) return;
+  std::exception_ptr thrown;
+  try {
+    ItemReader items(answer->event.payload, &answer->event.large);
+    thrown = answer->thrown(items);
+  } catch (const RecordingError& error) {
+    refuse(error.what());
+  }
+  if (thrown) std::rethrow_exception(thrown);
 }
 
 std::optional<Event> Replayer::awaitAnswer(Player& player) {
@@ -246,15 +261,14 @@ std::optional<Event> Replayer::awaitAnswer(Player& player) {
       play(player, event);
       continue;
     }
-    if (event.kind == EventKind::answer) return event;
-    if (event.kind != EventKind::threw) break;
-    ItemReader said(event.payload, &event.large);
-    const Tag tag = event.payload.empty() ? Tag::absent : said.peek();
-    if (tag == Tag::absent) throw std::bad_alloc();
-    if (tag == Tag::text) throw std::runtime_error(std::string(said.text()));
-    throw 0;
+    if (event.kind != EventKind::answer && event.kind != EventKind::threw) break;
+    return event;
   }
   return std::nullopt;
+}
+
+std::exception_ptr Replayer::Answer::thrown(ItemReader& items) const {
+  return event.kind == EventKind::threw ? takeThrown(items, ofPlugin) : nullptr;
 }
 
 void Replayer::stands(const Operation& operation) {

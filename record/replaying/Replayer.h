@@ -51,9 +51,18 @@ class Replayer : public Names {
   bool isOver() const { return _over.load(std::memory_order_relaxed); }
   bool ignores(const Operation& operation) const { return _options.ignored.contains(operation.of); }
 
-  /// A call of the plug-in with these arguments: the recorded answer; nothing when there is none. Throws what the
-  /// service threw.
-  std::optional<Event> exchange(const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
+  /// What a service answers, or throws.
+  struct Answer {
+    Event event{};
+    std::exception_ptr ofPlugin{};  // what the plug-in has thrown inside of the call
+
+    /// What the service threw, read from the answer's items; null when it did not.
+    std::exception_ptr thrown(ItemReader& items) const;
+  };
+  /// A call of the plug-in with these arguments: the recorded answer; nothing when there is none.
+  std::optional<Answer> exchange(const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
+  /// The same for a call that answers nothing.
+  void tell(const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
   /// The plug-in goes on waiting where it had not to.
   void stands(const Operation& operation) REQUIRES(mutex);
   /// The recording holds what no recording holds.
@@ -90,13 +99,18 @@ class Replayer : public Names {
   platform::LogHandle& spareLog();
 
  private:
+  /// A call that has begun and not ended.
+  struct Open {
+    OperationName name;
+    std::exception_ptr thrown{};  // what the plug-in threw last inside of it
+  };
   /// One recorded thread.
   struct Player {
     std::uint32_t number = 0;
     std::thread thread{};
     std::atomic<long> systemNumber{0};
     platform::Condition turn{};
-    std::vector<OperationName> inside{};  // the calls that are open on it, in either direction, the innermost last
+    std::vector<Open> inside{};  // in either direction, the innermost last
   };
   struct Services;
 
@@ -107,7 +121,7 @@ class Replayer : public Names {
 
   void playAll(Player& player);
   void play(Player& player, const Event& event) REQUIRES(mutex);
-  void leave(Player& player, const Event& entered, const ItemWriter& result) REQUIRES(mutex);
+  void leave(Player& player, const Event& entered, bool threw, const ItemWriter& result) REQUIRES(mutex);
   void passTurn() REQUIRES(mutex);
   bool awaitTurn(Player& player) REQUIRES(mutex);
   std::optional<Event> awaitAnswer(Player& player) REQUIRES(mutex);
@@ -119,7 +133,7 @@ class Replayer : public Names {
   void skipTo(const Player& player, std::size_t place, std::string_view came) REQUIRES(mutex);
   Difference& differ(Difference::Kind kind, const Player& player, const Event* expected, std::string came)
       REQUIRES(mutex);
-  std::optional<Event> afterEnd(const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
+  std::optional<Answer> afterEnd(const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
   std::vector<std::string> standing() const REQUIRES(mutex);
   OperationName nameOfEvent(const Event& event) const REQUIRES(mutex);
 
@@ -152,7 +166,8 @@ class Replayer : public Names {
   std::unique_ptr<Services> _services;
 };
 
-/// A call into the plug-in, as the recording has it: takes the arguments from `arguments`, calls, puts the result.
+/// A call into the plug-in, as the recording has it: takes the arguments from `arguments`, calls, puts the result. When
+/// the plug-in throws, that is what is put, before what was put out, and thrown on.
 using PlayCall = void (*)(Replayer& replayer, ItemReader& arguments, ItemWriter& result);
 /// Null when no such call is known.
 PlayCall playerOf(const OperationName& operation);

@@ -76,14 +76,13 @@ std::string Story::appOf(const Event& event) {
   Found found;
   try {
     std::string_view names(operation.parameters);
-    const bool opens = event.kind == EventKind::call || event.kind == EventKind::enter;
     for (ItemReader items(event.payload); !items.atEnd();)
-      look(items, opens ? nextName(names) : std::string_view(), found);
+      look(items, opens(event.kind) ? nextName(names) : std::string_view(), found);
   } catch (const RecordingError&) {
     found.objects.clear();
   }
   auto& open = _open[event.thread];
-  if (event.kind == EventKind::call || event.kind == EventKind::enter) {
+  if (opens(event.kind)) {
     // What is called for an app's sake, when it does not say so itself.
     const bool isAbout = found.app.empty() && !open.empty() && operation.service != "LogHandle";
     open.push_back(isAbout ? open.back() : found.app);
@@ -121,8 +120,7 @@ void explain(std::string_view recording, std::vector<Difference>& differences) {
       next->before.assign(calls.begin(), calls.end());
     }
     const auto& name = reader.operations()[event.operation];
-    const bool opens = event.kind == EventKind::call || event.kind == EventKind::enter;
-    if (!opens || name.name == "isEnabled" || name.name == "TSGetLogCategory") continue;
+    if (!opens(event.kind) || name.name == "isEnabled" || name.name == "TSGetLogCategory") continue;
     for (const auto& of : {app, "thread " + thread}) {
       if (of.empty()) continue;
       auto& calls = before[of];

@@ -165,6 +165,30 @@ std::string resultLine(const OperationName& operation, std::string_view result) 
   return operation.service + "." + operation.name + " returns " + (result.empty() ? "" : itemsText({}, result));
 }
 
+std::string throwLine(const OperationName& operation, std::string_view thrown) {
+  std::string text;
+  try {
+    ItemReader items(thrown);
+    if (items.atEnd() || items.peek() == Tag::absent)
+      text = "that there is no memory";
+    else if (items.peek() == Tag::no)
+      text = "no exception of the standard library";
+    else if (items.peek() == Tag::yes)
+      text = "what was thrown inside of it";
+    if (!text.empty() && !items.atEnd()) thrown.remove_prefix(items.skip().size());
+  } catch (const RecordingError&) {
+    text.clear();
+  }
+  if (!text.empty() && !thrown.empty()) text += ", ";
+  return operation.service + "." + operation.name + " throws " + text + itemsText({}, thrown);
+}
+
+std::string eventLine(EventKind kind, const OperationName& operation, std::string_view items) {
+  if (opens(kind)) return callLine(operation, items);
+  const bool isThrown = kind == EventKind::threw || kind == EventKind::thrown;
+  return isThrown ? throwLine(operation, items) : resultLine(operation, items);
+}
+
 OperationClass classOf(const OperationName& operation) {
   // What describes itself does so in a message.
   if (operation.service == "LogHandle" || operation.name == "TSGetLogCategory" || operation.name == "describe")

@@ -12,8 +12,12 @@ namespace record {
 
 /// One line for people of a call's arguments: the service, the operation, and each argument with its name.
 std::string callLine(const OperationName& operation, std::string_view arguments);
-/// ... and of what it returned.
+/// ... of what it returned ...
 std::string resultLine(const OperationName& operation, std::string_view result);
+/// ... and of what it threw.
+std::string throwLine(const OperationName& operation, std::string_view thrown);
+/// That one of these that the event is.
+std::string eventLine(EventKind kind, const OperationName& operation, std::string_view items);
 /// One item as text. Long ones are cut; bytes that are no text are counted.
 std::string itemText(std::string_view item);
 

@@ -91,7 +91,7 @@ bool EventReader::readEvent(Event& event) {
     } else if (entry == Entry::end) {
       _whole = true;
       return false;
-    } else if (entry > Entry::end) {
+    } else if (entry > Entry::end && entry != Entry::thrown) {
       refuse("there is no event of this sort");
     } else {
       event.kind = static_cast<EventKind>(entry);
@@ -106,7 +106,7 @@ void EventReader::enterInto(Event& event) {
   if (event.thread >= _threads.size()) refuse("it is of a thread that is not known");
   event.operation = 0;
   event.time = 0;
-  if (event.kind == EventKind::call || event.kind == EventKind::enter) {
+  if (opens(event.kind)) {
     event.operation = static_cast<std::uint32_t>(count(UINT32_MAX, "operation"));
     if (event.operation >= _operations.size()) refuse("it is of an operation that is not known");
   }
@@ -123,15 +123,14 @@ void EventReader::enterInto(Event& event) {
 /// Follows which thread is inside the plug-in and where each one stands.
 void EventReader::place(Event& event) {
   auto& frames = _frames[event.thread];
-  const bool fromInside = event.kind == EventKind::call || event.kind == EventKind::leave;
+  const bool fromInside = event.kind == EventKind::call || leaves(event.kind);
   if (fromInside ? _inside != event.thread : _inside.has_value())
     refuse("the plug-in has one thread inside it at a time");
-  const bool opens = event.kind == EventKind::call || event.kind == EventKind::enter;
-  if (opens) {
+  if (opens(event.kind)) {
     if (frames.size() > deepestItem) refuse("calls are nested too deeply");
     frames.push_back({event.kind, event.operation});
   } else {
-    const auto opened = event.kind == EventKind::leave ? EventKind::enter : EventKind::call;
+    const auto opened = leaves(event.kind) ? EventKind::enter : EventKind::call;
     if (frames.empty() || frames.back().kind != opened) refuse("something ends that has not begun");
     event.operation = frames.back().operation;
     frames.pop_back();

@@ -66,7 +66,7 @@ void EventWriter::write(EventKind kind, std::uint32_t thread, std::uint32_t oper
   _lastThread = thread;
   _pending.push_back(static_cast<char>(static_cast<std::uint8_t>(kind) | (same ? stream::sameThread : 0)));
   if (!same) appendVarint(_pending, thread);
-  if (kind == EventKind::call || kind == EventKind::enter) appendVarint(_pending, operation);
+  if (opens(kind)) appendVarint(_pending, operation);
   if (kind == EventKind::enter) appendVarint(_pending, time);
   std::size_t count = 0;
   for (ItemReader counted(payload); !counted.atEnd(); ++count) counted.skip();

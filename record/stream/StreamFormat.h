@@ -15,6 +15,7 @@ enum class Entry : std::uint8_t {
   end,
   thread,     // name: the next thread's
   operation,  // service, name, parameters: the next operation's
+  thrown,
 };
 constexpr std::uint8_t entryMask = 0x0f;
 constexpr std::uint8_t sameThread = 0x10;
