@@ -47,10 +47,11 @@ static bool isUnfinished(const std::string& folder) {
 
 /// The device's own folder for its files. It is no link, even if somebody exchanges it for one just now.
 static std::unique_ptr<FileTree> openTree(const std::string& folder, ErrorRef* error,
-                                          std::shared_ptr<StepWatch> watch = nullptr) {
+                                          std::shared_ptr<StepWatch> watch = nullptr,
+                                          DiskFileTree::Use use = DiskFileTree::Use::shared) {
   FileDescriptor root(::open((folder + treeName).c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   if (!answerFileOperation(root.isOpen() ? 0 : errno, folder + treeName, error)) return nullptr;
-  return std::make_unique<DiskFileTree>(std::move(root), std::move(watch));
+  return std::make_unique<DiskFileTree>(std::move(root), std::move(watch), use);
 }
 
 bool createDevice(const std::string& folder, ErrorRef* error) {
@@ -107,7 +108,7 @@ std::unique_ptr<LocalDevice> openDevice(const std::string& folder, std::unique_p
                                         DeviceOptions options, ErrorRef* error) {
   if (!checkIsDevice(folder, error)) return nullptr;
   auto steps = DeviceSteps::of(options.rules, options.journals);
-  auto files = openTree(folder, error, steps);
+  auto files = openTree(folder, error, steps, DiskFileTree::Use::alone);
   auto store = files ? openDatabaseStore(folder + databaseName, error, steps) : nullptr;
   if (!store) return nullptr;
   return LocalDevice::open(std::move(files), std::move(store), std::move(events), std::move(options), error);

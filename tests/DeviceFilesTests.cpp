@@ -1,3 +1,4 @@
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 #include <sys/resource.h>
@@ -15,6 +16,7 @@
 #include <thread>
 #include <utility>
 
+#include "device/files/DiskFileTree.h"
 #include "device/files/FileTree.h"
 #include "device/files/OverlayFileTree.h"
 #include "device/files/StepWatch.h"
@@ -64,6 +66,12 @@ class LoweredLimit {
 enum class Medium { disk, memory, overlay };
 std::string nameOf(const testing::TestParamInfo<Medium>& info) {
   return info.param == Medium::disk ? "disk" : info.param == Medium::memory ? "memory" : "overlay";
+}
+
+/// A tree that keeps folders open.
+std::unique_ptr<FileTree> makeTreeAlone(const Folder& folder) {
+  FileDescriptor root(::open(folder.path().c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  return std::make_unique<DiskFileTree>(std::move(root), nullptr, DiskFileTree::Use::alone);
 }
 
 std::unique_ptr<FileTree> makeTree(Medium medium, const Folder& folder) {
@@ -237,9 +245,9 @@ TEST(FileTreesTogether, doTheSame) {
   for (unsigned seed = 0; seed < 8; ++seed) {
     SCOPED_TRACE("seed " + std::to_string(seed));
     std::mt19937 random(seed);
-    Folder folder, below;
+    Folder folder, below, alone;
     std::unique_ptr<FileTree> trees[] = {openDiskFileTree(folder.path()), makeMemoryFileTree(),
-                                         openDiskFileTree(below.path())};
+                                         openDiskFileTree(below.path()), makeTreeAlone(alone)};
     std::string left;
     auto path = [&] {
       std::string text;
@@ -248,12 +256,12 @@ TEST(FileTreesTogether, doTheSame) {
     };
     for (int step = 0; step < 200; ++step) {
       unsigned operation = random() % 8;
-      std::string one = path(), other = path(), answers[3];
+      std::string one = path(), other = path(), answers[4];
       if (step == 100) {
         left = picture(*trees[2]);
         trees[2] = std::make_unique<OverlayFileTree>(std::move(trees[2]));
       }
-      for (int i = 0; i < 3; ++i) {
+      for (int i = 0; i < 4; ++i) {
         FileTree& files = *trees[i];
         ErrorRef error;
         switch (operation) {
@@ -284,11 +292,11 @@ TEST(FileTreesTogether, doTheSame) {
         }
         answers[i] = error ? error->describe() : "";
       }
-      for (int i : {1, 2})
+      for (int i : {1, 2, 3})
         ASSERT_EQ(answers[0], answers[i])
             << "step " << step << " operation " << operation << " " << one << " " << other;
     }
-    for (int i : {1, 2}) EXPECT_EQ(picture(*trees[0]), picture(*trees[i]));
+    for (int i : {1, 2, 3}) EXPECT_EQ(picture(*trees[0]), picture(*trees[i]));
     EXPECT_EQ(picture(*openDiskFileTree(below.path())), left);
   }
 }

@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <limits>
 #include <map>
 #include <new>
 
@@ -83,12 +84,12 @@ void applyAttributes(const DiskPlace& place, const Value& attributes) {
   [[maybe_unused]] int ignored = ::fchownat(place.directory(), place.name(), owner, group, AT_SYMLINK_NOFOLLOW);
 }
 
-/// Up to `count` bytes into `chunk`; fewer at the end only.
-int readChunk(int file, std::size_t count, Bytes& chunk) {
+/// Up to `count` bytes into `chunk`, from `offset` on; fewer at the end only.
+int readChunk(int file, std::uint64_t offset, std::size_t count, Bytes& chunk) {
   std::size_t filled = 0;
   chunk.resize(count);
   while (filled < count) {
-    ssize_t got = ::read(file, chunk.data() + filled, count - filled);
+    ssize_t got = ::pread(file, chunk.data() + filled, count - filled, static_cast<off_t>(offset + filled));
     if (got < 0 && errno == EINTR) continue;
     if (got < 0) return errno;
     if (got == 0) break;
@@ -98,15 +99,24 @@ int readChunk(int file, std::size_t count, Bytes& chunk) {
   return 0;
 }
 
-int readWhole(int file, Bytes& contents) {
-  struct stat status;
-  if (::fstat(file, &status) != 0) return errno;
-  if (static_cast<std::uint64_t>(status.st_size) > largestWholeRead) return EFBIG;
-  // One byte more than expected, so that a file of the size it claims is read in one go.
-  if (int failure = readChunk(file, static_cast<std::size_t>(status.st_size) + 1, contents)) return failure;
+/// `status` is that of the file.
+int readWhole(int file, const struct stat& status, Bytes& contents) {
+  const auto size = static_cast<std::size_t>(status.st_size);
+  if (size > largestWholeRead) return EFBIG;
+  contents.resize(size + 1);
+  std::size_t filled = 0;
+  while (true) {
+    // One byte more than expected: a file that ends where it should is read in one go.
+    ssize_t got = ::pread(file, contents.data() + filled, size + 1 - filled, static_cast<off_t>(filled));
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0) return errno;
+    filled += static_cast<std::size_t>(got);
+    if (got == 0 || filled >= size) break;
+  }
+  contents.resize(filled);
   Bytes more;
-  while (contents.size() > static_cast<std::size_t>(status.st_size)) {
-    if (int failure = readChunk(file, chunkSize, more)) return failure;
+  while (contents.size() > size) {
+    if (int failure = readChunk(file, contents.size(), chunkSize, more)) return failure;
     if (more.empty()) break;
     contents += more;
     if (contents.size() > largestWholeRead) return EFBIG;
@@ -142,17 +152,20 @@ class DiskFileReader final : public FileReader {
 
   std::optional<Bytes> read(std::size_t count, ErrorRef* error) override {
     Bytes chunk;
-    if (!answerFileOperation(readChunk(_file.get(), count, chunk), _path, error)) return std::nullopt;
+    if (!answerFileOperation(readChunk(_file.get(), _next, count, chunk), _path, error)) return std::nullopt;
+    _next += chunk.size();
     return chunk;
   }
   bool seek(std::uint64_t offset, ErrorRef* error) override {
-    bool there = ::lseek(_file.get(), static_cast<off_t>(offset), SEEK_SET) >= 0;
-    return answerFileOperation(there ? 0 : errno, _path, error);
+    const bool isOffset = offset <= static_cast<std::uint64_t>(std::numeric_limits<off_t>::max());
+    if (isOffset) _next = offset;
+    return answerFileOperation(isOffset ? 0 : EINVAL, _path, error);
   }
 
  private:
   FileDescriptor _file;
   const std::string _path;
+  std::uint64_t _next = 0;
 };
 
 int moveBetween(const DiskPlace& from, const DiskPlace& to) {
@@ -163,14 +176,19 @@ int moveBetween(const DiskPlace& from, const DiskPlace& to) {
   return to.syncDirectoryAbove();
 }
 
-int copyContents(int from, const FileInWriting& to) {
-  struct stat status;
-  if (::fstat(from, &status) != 0) return errno;
+/// `status` is that of the file that is copied.
+int copyContents(int from, const struct stat& status, const FileInWriting& to) {
   if ((status.st_mode & S_IXUSR) && ::fchmod(to.descriptor, 0755) != 0) return errno;
   Bytes chunk;
+  if (static_cast<std::uint64_t>(status.st_size) < chunkSize) {
+    int failure = readWhole(from, status, chunk);
+    return failure ? failure : writeWhole(to, chunk);
+  }
+  std::uint64_t copied = 0;
   do {
-    if (int failure = readChunk(from, chunkSize, chunk)) return failure;
+    if (int failure = readChunk(from, copied, chunkSize, chunk)) return failure;
     if (int failure = writeWhole(to, chunk)) return failure;
+    copied += chunk.size();
   } while (!chunk.empty());
   return 0;
 }
@@ -200,8 +218,11 @@ bool areOnOneFileSystem(int one, int other) {
 
 }  // namespace
 
-DiskFileTree::DiskFileTree(FileDescriptor root, std::shared_ptr<StepWatch> watch)
-    : _root(std::move(root)), _flushable(openFlushable(_root.get())), _watch(std::move(watch)) {}
+DiskFileTree::DiskFileTree(FileDescriptor root, std::shared_ptr<StepWatch> watch, Use use)
+    : _root(std::move(root)),
+      _flushable(openFlushable(_root.get())),
+      _watch(std::move(watch)),
+      _kept(use == Use::alone ? std::make_unique<KeptFolders>() : nullptr) {}
 
 bool DiskFileTree::answerChange(int failure, std::string_view path, ErrorRef* error) {
   if (failure != 0 && failure != ENOENT) _isTidy = false;
@@ -212,6 +233,7 @@ bool DiskFileTree::removeItem(std::string_view path, ErrorRef* error) {
   DiskPlace place;
   int failure = find(path, place);
   if (failure == 0) failure = place.remove();
+  forget(path);
   return answerChange(failure, path, error);
 }
 
@@ -240,16 +262,19 @@ bool DiskFileTree::moveItem(std::string_view from, std::string_view to, ErrorRef
   if (failure) return answerFileOperation(failure, from, error);
   failure = find(to, destination);
   if (failure == 0) failure = destination.isRoot() ? EEXIST : moveBetween(source, destination);
+  forget(from);
   return answerFileOperation(failure, to, error);
 }
 
 bool DiskFileTree::copyItem(std::string_view from, std::string_view to, ErrorRef* error) {
   FileDescriptor source;
-  if (int failure = openFile(from, source)) return answerFileOperation(failure, from, error);
+  struct stat status;
+  if (int failure = openFile(from, source, status)) return answerFileOperation(failure, from, error);
   DiskPlace destination;
   int failure = find(to, destination);
   if (failure == 0)
-    failure = destination.replaceFile([&](const FileInWriting& file) { return copyContents(source.get(), file); });
+    failure =
+        destination.replaceFile([&](const FileInWriting& file) { return copyContents(source.get(), status, file); });
   return answerChange(failure, to, error);
 }
 
@@ -277,18 +302,19 @@ bool DiskFileTree::putFile(std::string_view path, BytesView contents, const Valu
   return answerChange(failure, path, error);
 }
 
-int DiskFileTree::openFile(std::string_view path, FileDescriptor& file) const {
+int DiskFileTree::openFile(std::string_view path, FileDescriptor& file, struct stat& status) const {
   DiskPlace place;
   if (int failure = find(path, place)) return failure;
-  return place.openFile(file);
+  return place.openFile(file, status);
 }
 
 std::optional<Bytes> DiskFileTree::readFile(std::string_view path, ErrorRef* error) {
   FileDescriptor file;
+  struct stat status;
   Bytes contents;
-  int failure = openFile(path, file);
+  int failure = openFile(path, file, status);
   try {
-    if (failure == 0) failure = readWhole(file.get(), contents);
+    if (failure == 0) failure = readWhole(file.get(), status, contents);
   } catch (const std::bad_alloc&) {
     failure = ENOMEM;
   }
@@ -353,7 +379,8 @@ std::unique_ptr<FileWriter> DiskFileTree::createNew(std::string_view path, bool 
 
 std::unique_ptr<FileReader> DiskFileTree::openForReading(std::string_view path, ErrorRef* error) {
   FileDescriptor file;
-  if (!answerFileOperation(openFile(path, file), path, error)) return nullptr;
+  struct stat status;
+  if (!answerFileOperation(openFile(path, file, status), path, error)) return nullptr;
   return std::make_unique<DiskFileReader>(std::move(file), path);
 }
 
@@ -367,7 +394,8 @@ int DiskFileTree::flushDirectory(std::string_view path) const {
 
 int DiskFileTree::flushFile(std::string_view path) const {
   FileDescriptor file;
-  if (int failure = openFile(path, file)) return failure;
+  struct stat status;
+  if (int failure = openFile(path, file, status)) return failure;
   return syncFile({file.get(), path, _watch.get()});
 }
 
@@ -387,35 +415,30 @@ int DiskFileTree::flushTree(std::string_view path) const {
                   [&](Step&) { return ::syncfs(_flushable.get()) == 0 ? 0 : errno; });
 }
 
-/// On the average.
-bool DiskFileTree::areLarge(const std::vector<Item>& items) {
-  std::uint64_t size = 0;
-  for (const auto& item : items) {
-    auto attributes = item.isDirectory ? std::nullopt : attributesOfItem(item.path, nullptr);
-    if (attributes) size += attributes->size;
-  }
-  return size / items.size() >= largeItem;
-}
-
 bool DiskFileTree::syncItem(std::string_view path, ErrorRef* error) {
   auto attributes = attributesOfItem(path, error);
   if (!attributes) return false;
-  std::vector<Item> items{{std::string(path), attributes->isDirectory}};
+  std::vector<Entry> items{{std::string(path), attributes->isDirectory, 0}};
+  std::uint64_t size = 0;
   const bool canBeOne = attributes->isDirectory && canFlushTree(path);
   for (std::size_t i = 0; i < items.size(); ++i) {
     if (!items[i].isDirectory) continue;
-    std::string directory = path == "/" && i == 0 ? "" : items[i].path;
-    auto entries = list(items[i].path, error);
+    std::string directory = path == "/" && i == 0 ? "" : items[i].name;
+    auto entries = list(items[i].name, error);
     if (!entries) return false;
-    for (const auto& entry : *entries) items.push_back({directory + '/' + entry.name, entry.isDirectory});
+    for (const auto& entry : *entries) {
+      items.push_back({directory + '/' + entry.name, entry.isDirectory, entry.size});
+      size += entry.size;
+    }
     if (canBeOne && items.size() > fewLargeItems) return answerFileOperation(flushTree(path), path, error);
   }
-  if (canBeOne && items.size() > fewItems && !areLarge(items)) return answerFileOperation(flushTree(path), path, error);
+  const bool areLarge = size / items.size() >= largeItem;
+  if (canBeOne && items.size() > fewItems && !areLarge) return answerFileOperation(flushTree(path), path, error);
   auto slash = path.rfind('/');
-  items.push_back({std::string(slash == 0 ? "/" : path.substr(0, slash)), true});
+  items.push_back({std::string(slash == 0 ? "/" : path.substr(0, slash)), true, 0});
   int failure = 0;
   for (const auto& item : items) {
-    failure = item.isDirectory ? flushDirectory(item.path) : flushFile(item.path);
+    failure = item.isDirectory ? flushDirectory(item.name) : flushFile(item.name);
     if (failure != 0) break;
   }
   return answerFileOperation(failure, path, error);

@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 #include <sys/syscall.h>
 
+#include <array>
 #include <atomic>
 #include <cerrno>
 #include <cstdio>
@@ -70,7 +71,7 @@ int removeAt(int directory, const char* name, int flags, const std::string& path
 }
 
 /// Moves what is two levels below `top` up into it, so that no depth of directories needs more than two of them open.
-int flattenInto(int top, const char* name, const std::string& topPath, StepWatch* watch) {
+int flattenInto(int top, const char* name, const std::string& topPath, StepWatch* watch, bool& moved) {
   FileDescriptor directory;
   if (int failure = openDirectoryAt(top, name, O_RDONLY, directory)) return failure;
   std::vector<std::string> names;
@@ -81,6 +82,7 @@ int flattenInto(int top, const char* name, const std::string& topPath, StepWatch
     if (failure == EISDIR) failure = removeAt(directory.get(), each.c_str(), AT_REMOVEDIR, path, watch);
     if (failure == ENOTEMPTY || failure == EEXIST) {
       std::string fresh = freshTemporaryName();
+      moved = true;
       failure = takeStep(watch, {Step::Kind::move, path, joined(topPath, fresh)}, [&](Step&) {
         return ::renameat(directory.get(), each.c_str(), top, fresh.c_str()) == 0 ? 0 : errno;
       });
@@ -90,42 +92,40 @@ int flattenInto(int top, const char* name, const std::string& topPath, StepWatch
   return 0;
 }
 
+/// Of a directory that is open for reading, from where it was read to.
 int emptyDirectory(int top, const std::string& topPath, StepWatch* watch) {
-  std::vector<std::string> names;
-  do {
-    names.clear();
+  for (bool moved = true; moved;) {
+    moved = false;
+    std::vector<std::string> names;
     if (int failure = namesInDirectory(top, names)) return failure;
     for (const auto& each : names) {
       std::string path = joined(topPath, each);
       int failure = removeAt(top, each.c_str(), 0, path, watch);
       if (failure == EISDIR) {
-        failure = flattenInto(top, each.c_str(), topPath, watch);
+        failure = flattenInto(top, each.c_str(), topPath, watch, moved);
         if (failure == 0) failure = removeAt(top, each.c_str(), AT_REMOVEDIR, path, watch);
       }
       if (failure) return failure;
     }
-  } while (!names.empty());
+    if (moved && ::lseek(top, 0, SEEK_SET) != 0) return errno;
+  }
   return 0;
 }
 
 }  // namespace
 
 int namesInDirectory(int directory, std::vector<std::string>& names) {
-  // The stream takes a descriptor over and has a position of its own.
-  int own = ::openat(directory, ".", O_RDONLY | directoryFlags);
-  if (own < 0) return errno;
-  std::unique_ptr<DIR, int (*)(DIR*)> stream(::fdopendir(own), ::closedir);
-  if (!stream) {
-    int failure = errno;
-    ::close(own);
-    return failure;
-  }
+  alignas(dirent64) std::array<char, 16384> space;
   while (true) {
-    errno = 0;
-    const dirent* entry = ::readdir(stream.get());
-    if (!entry) return errno;
-    std::string_view name = entry->d_name;
-    if (name != "." && name != "..") names.emplace_back(name);
+    const ssize_t filled = ::getdents64(directory, space.data(), space.size());
+    // ENOENT: the directory itself has been removed.
+    if (filled <= 0) return filled < 0 && errno != ENOENT ? errno : 0;
+    for (ssize_t at = 0; at < filled;) {
+      const auto* entry = reinterpret_cast<const dirent64*>(space.data() + at);
+      at += entry->d_reclen;
+      std::string_view name = entry->d_name;
+      if (name != "." && name != "..") names.emplace_back(name);
+    }
   }
 }
 
@@ -161,30 +161,43 @@ int syncDirectory(int directory, std::string_view path, StepWatch* watch) {
 }
 
 int DiskPlace::find(const FileDescriptor& root, std::string_view path, bool makeDirectories, StepWatch* watch,
-                    DiskPlace& place) {
+                    KeptFolders* kept, DiskPlace& place) {
   std::vector<std::string_view> names;
   if (int failure = splitDevicePath(path, names)) return failure;
   place._path = path;
   place._watch = watch;
   place._isRoot = names.empty();
   place._name = names.empty() ? "." : names.back();
-  place._directory = openBelow(root, names.size() < 2 ? "." : std::string(place.directoryPath().substr(1)));
-  if (place._directory.isOpen()) return 0;
-  if (int failure = openDirectoryAt(root.get(), ".", O_PATH, place._directory)) return failure;
+  const std::string_view folder = place.directoryPath();
+  if (kept && (place._directory = kept->find(folder))) return 0;
+  const std::uint64_t changes = kept ? kept->changes() : 0;
+  FileDescriptor opened = openBelow(root, folder == "/" ? "." : std::string(folder.substr(1)));
+  if (!opened.isOpen()) {
+    if (kept && errno == EMFILE) kept->clear();
+    if (int failure = place.walk(root, names, makeDirectories, opened)) return failure;
+  }
+  place._directory = std::make_shared<const FileDescriptor>(std::move(opened));
+  if (kept) kept->keep(folder, place._directory, changes);
+  return 0;
+}
+
+int DiskPlace::walk(const FileDescriptor& root, const std::vector<std::string_view>& names, bool makeDirectories,
+                    FileDescriptor& directory) const {
+  if (int failure = openDirectoryAt(root.get(), ".", O_PATH, directory)) return failure;
   for (std::size_t i = 0; i + 1 < names.size(); ++i) {
     std::string name(names[i]);
     FileDescriptor next;
-    int failure = openDirectoryAt(place.directory(), name.c_str(), O_PATH, next);
+    int failure = openDirectoryAt(directory.get(), name.c_str(), O_PATH, next);
     if (failure == ENOENT && makeDirectories) {
-      auto upTo = path.substr(0, static_cast<std::size_t>(names[i].data() + names[i].size() - path.data()));
-      failure = takeStep(watch, {Step::Kind::createDirectory, upTo}, [&](Step&) {
-        return ::mkdirat(place.directory(), name.c_str(), 0777) == 0 || errno == EEXIST ? 0 : errno;
+      auto upTo = _path.substr(0, static_cast<std::size_t>(names[i].data() + names[i].size() - _path.data()));
+      failure = takeStep(_watch, {Step::Kind::createDirectory, upTo}, [&](Step&) {
+        return ::mkdirat(directory.get(), name.c_str(), 0777) == 0 || errno == EEXIST ? 0 : errno;
       });
       if (failure) return failure;
-      failure = openDirectoryAt(place.directory(), name.c_str(), O_PATH, next);
+      failure = openDirectoryAt(directory.get(), name.c_str(), O_PATH, next);
     }
     if (failure) return failure;
-    place._directory = std::move(next);
+    directory = std::move(next);
   }
   return 0;
 }
@@ -204,15 +217,14 @@ int DiskPlace::mayHoldFile() const {
   return failure;
 }
 
-int DiskPlace::openFile(FileDescriptor& file) const {
-  struct stat found;
-  if (int failure = status(found)) return failure;
-  if (S_ISDIR(found.st_mode)) return EISDIR;
+int DiskPlace::openFile(FileDescriptor& file, struct stat& status) const {
+  if (int failure = this->status(status)) return failure;
+  if (S_ISDIR(status.st_mode)) return EISDIR;
   // Somebody may have put something else there meanwhile: opening it must neither block nor take it for a file.
   file = FileDescriptor(::openat(directory(), name(), O_RDONLY | O_NONBLOCK | O_NOFOLLOW | O_CLOEXEC));
   if (!file.isOpen()) return errno;
-  if (::fstat(file.get(), &found) != 0) return errno;
-  return S_ISREG(found.st_mode) ? 0 : EOPNOTSUPP;
+  if (::fstat(file.get(), &status) != 0) return errno;
+  return S_ISREG(status.st_mode) ? 0 : EOPNOTSUPP;
 }
 
 int DiskPlace::openDirectory(FileDescriptor& directory) const {
@@ -305,6 +317,7 @@ int DiskPlace::remove() const {
     if (int failure = emptyDirectory(opened.get(), std::string(_path), _watch)) return failure;
     int failure = removeItself(AT_REMOVEDIR);
     if (failure != ENOTEMPTY && failure != EEXIST) return failure;
+    if (::lseek(opened.get(), 0, SEEK_SET) != 0) return errno;
   }
   return ENOTEMPTY;
 }

@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "device/files/FileDescriptor.h"
+#include "device/files/KeptFolders.h"
 #include "device/files/StepWatch.h"
 
 struct stat;
@@ -25,19 +26,21 @@ struct FileInWriting {
 class DiskPlace {
  public:
   /// The place of a path of the device below the root. All but the last name must be directories; with
-  /// `makeDirectories` missing ones are made. The path is borrowed.
+  /// `makeDirectories` missing ones are made. The path is borrowed. `kept`, which may be null, has folders below the
+  /// root that need not be looked for.
   static int find(const FileDescriptor& root, std::string_view path, bool makeDirectories, StepWatch* watch,
-                  DiskPlace& place);
+                  KeptFolders* kept, DiskPlace& place);
 
   bool isRoot() const { return _isRoot; }
-  int directory() const { return _directory.get(); }
+  int directory() const { return _directory->get(); }
   const char* name() const { return _name.c_str(); }
 
   /// What is there: a regular file or a directory.
   int status(struct stat& status) const;
   /// 0 when a regular file may be put there: there is nothing now, or another regular file.
   int mayHoldFile() const;
-  int openFile(FileDescriptor& file) const;
+  /// `status` is that of the file.
+  int openFile(FileDescriptor& file, struct stat& status) const;
   int openDirectory(FileDescriptor& directory) const;
   /// Makes the entry's presence or absence durable.
   int syncDirectory() const;
@@ -63,15 +66,18 @@ class DiskPlace {
  private:
   /// The path of the directory that the place is in.
   std::string_view directoryPath() const;
+  /// Name by name.
+  int walk(const FileDescriptor& root, const std::vector<std::string_view>& names, bool makeDirectories,
+           FileDescriptor& directory) const;
 
-  FileDescriptor _directory;
+  KeptFolders::Handle _directory;
   std::string _name;
   std::string_view _path;
   StepWatch* _watch = nullptr;
   bool _isRoot = false;
 };
 
-/// The names in an open directory, in no order.
+/// The names in a directory that is open for reading, from where it was read to; in no order.
 int namesInDirectory(int directory, std::vector<std::string>& names);
 /// Writes all of the bytes.
 int writeWhole(const FileInWriting& file, std::string_view bytes);
