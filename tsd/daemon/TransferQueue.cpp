@@ -1,6 +1,7 @@
 #include "tsd/daemon/TransferQueue.h"
 
 #include <algorithm>
+#include <new>
 #include <utility>
 
 #include "platform/DevicePaths.h"
@@ -12,8 +13,11 @@ namespace tsd {
 using platform::ErrorRef;
 using Lock = platform::Mutex::Lock;
 
-TransferQueue::TransferQueue(Setup setup, Progress& progress, const StopSignal& stop)
-    : _setup(std::move(setup)), _progress(progress), _stop(stop) {
+TransferQueue::TransferQueue(Setup setup, Progress& progress, StopSignal& stop)
+    : _setup(std::move(setup)), _progress(progress), _stop(stop), _stopped(stop, [this] {
+        Lock lock(_mutex);
+        _changed.notifyAll();
+      }) {
   try {
     _threads.reserve(_setup.inFlight);
     for (std::size_t number = 1; number <= _setup.inFlight; ++number) {
@@ -76,20 +80,29 @@ void TransferQueue::start(const std::vector<platform::TSAssetRef>& assets) {
   for (const auto& wish : std::exchange(_wishes, {})) answer(wish, moveToFront(wish.identifier), device);
   _expects = false;
   _working = _taking = std::min(_setup.inFlight, assets.size());
+  _runsAhead = false;
   ++_round;
   _changed.notifyAll();
 }
 
-bool TransferQueue::waitUntil(platform::Clock::Instant deadline) {
+TransferQueue::Progression TransferQueue::waitUntil(platform::Clock::Instant deadline) {
   Lock lock(_mutex);
-  if (!_device) return true;
-  return _device->events().clock().waitUntil(_mutex, _changed, deadline,
-                                             [this]() REQUIRES(_mutex) { return _working == 0; });
+  if (!_device) return Progression::ended;
+  _device->events().clock().waitUntil(_mutex, _changed, deadline, [this]() REQUIRES(_mutex) { return _working == 0; });
+  if (_working == 0) return Progression::ended;
+  return _blocked == _working && !hasRoom() ? Progression::waits : Progression::goesOn;
+}
+
+void TransferQueue::stopWaitingForOutcomes() {
+  Lock lock(_mutex);
+  _runsAhead = true;
+  _changed.notifyAll();
 }
 
 void TransferQueue::finish() {
   Lock lock(_mutex);
   _waiting.clear();
+  _changed.notifyAll();
   _expects = false;
   for (const auto& wish : std::exchange(_wishes, {})) answer(wish, false, *_device);
   _changed.wait(_mutex, [this]() REQUIRES(_mutex) { return _working == 0; });
@@ -162,6 +175,8 @@ void TransferQueue::work(std::size_t number) {
       Result result = transfer->carry(way);
       Lock resultLock(_mutex);
       _results[transfer->identifier()] = std::move(result);
+      resultLock.unlock();
+      settleLater(way.device.events());
     }
     device::EventQueue::release();
     lock.lock();
@@ -172,10 +187,37 @@ void TransferQueue::work(std::size_t number) {
 
 TransferQueue::TransferRef TransferQueue::takeNext() {
   Lock lock(_mutex);
+  ++_blocked;
+  _changed.wait(_mutex, [this]() REQUIRES(_mutex) { return hasRoom() || _waiting.empty() || _stop.requested(); });
+  --_blocked;
   if (_waiting.empty() || _stop.requested()) return nullptr;
   TransferRef transfer = std::move(_waiting.front());
   _waiting.pop_front();
+  ++_unsettled;
   return transfer;
+}
+
+/// A package that has arrived is installed by an event that is posted by now, and the plug-in is told of the outcome by
+/// one which that posts: both have run, or never will, when an event that was posted behind each has.
+void TransferQueue::settleLater(device::EventQueue& events) {
+  device::EventQueue::release();
+  try {
+    events.post(device::Lane::coordination, [this, &events] {
+      try {
+        events.post(device::Lane::coordination, [this] { settle(); });
+      } catch (const std::bad_alloc&) {
+        settle();
+      }
+    });
+  } catch (const std::bad_alloc&) {
+    settle();
+  }
+}
+
+void TransferQueue::settle() {
+  Lock lock(_mutex);
+  --_unsettled;
+  _changed.notifyAll();
 }
 
 }  // namespace tsd

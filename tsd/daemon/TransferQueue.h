@@ -35,11 +35,20 @@ class TransferQueue : public platform::TSDeviceService {
     std::string packagesFolder;  // on the host
     AssetReports reports;
     std::size_t inFlight = 1;
+    /// So many packages at most wait on the device for the plug-in to hear of their outcomes, besides those that are
+    /// on their way; the next ones wait on the host meanwhile. Enough for the device never to wait for a package, and
+    /// few enough for what is left to be marked when the sync is stopped.
+    std::size_t ahead = 32;
+  };
+  enum class Progression : std::uint8_t {
+    ended,  // the last transfer has
+    goesOn,
+    waits,  // every thread, for outcomes of what has arrived
   };
 
   /// Starts its threads, so that none can be missing once something has begun. Throws a `CommandError` when the system
   /// has no thread left.
-  TransferQueue(Setup setup, Progress& progress, const StopSignal& stop);
+  TransferQueue(Setup setup, Progress& progress, StopSignal& stop);
   ~TransferQueue() override;
   TransferQueue(const TransferQueue&) = delete;
   TransferQueue& operator=(const TransferQueue&) = delete;
@@ -63,8 +72,10 @@ class TransferQueue : public platform::TSDeviceService {
   /// Transfers the assets in this order, except that those asked for first meanwhile come first. Throws a
   /// `CommandError` when the directory for packages cannot be made; nothing has been transferred then.
   void start(const std::vector<platform::TSAssetRef>& assets);
-  /// True when the last transfer has ended, false when the deadline came first.
-  bool waitUntil(platform::Clock::Instant deadline);
+  /// Waits until the last transfer has ended, at most to the deadline. How far they are then.
+  Progression waitUntil(platform::Clock::Instant deadline);
+  /// From now on, and until the next `start`, no transfer waits for outcomes.
+  void stopWaitingForOutcomes();
   /// Takes no more and waits for the running transfers. Whoever asked for one that never came is told.
   void finish();
 
@@ -87,14 +98,19 @@ class TransferQueue : public platform::TSDeviceService {
 
   void work(std::size_t number);
   void endThreads();
+  /// Null when there is none left. Waits for room on the device.
   TransferRef takeNext();
+  bool hasRoom() const REQUIRES(_mutex) { return _runsAhead || _unsettled < _setup.inFlight + _setup.ahead; }
+  /// Gives back a transfer's room once the device has gone through what its end has led to.
+  void settleLater(device::EventQueue& events);
+  void settle();
   /// False when there is no such transfer, or it is over; a running one counts as first.
   bool moveToFront(const std::string& identifier) REQUIRES(_mutex);
   void answer(const Wish& wish, bool outstanding, device::LocalDevice& device) const;
 
   const Setup _setup;
   Progress& _progress;
-  const StopSignal& _stop;
+  StopSignal& _stop;
 
   mutable platform::Mutex _mutex;
   platform::Condition _changed;
@@ -106,11 +122,15 @@ class TransferQueue : public platform::TSDeviceService {
   std::deque<TransferRef> _waiting GUARDED_BY(_mutex);
   std::map<std::string, TransferRef, std::less<>> _transfers GUARDED_BY(_mutex);
   std::map<std::string, Result, std::less<>> _results GUARDED_BY(_mutex);
-  std::size_t _working GUARDED_BY(_mutex) = 0;  // threads that have not run out of transfers
-  std::size_t _taking GUARDED_BY(_mutex) = 0;   // threads that take part
-  std::uint64_t _round GUARDED_BY(_mutex) = 0;  // grows with every start
-  bool _over GUARDED_BY(_mutex) = false;        // the threads end
+  std::size_t _working GUARDED_BY(_mutex) = 0;    // threads that have not run out of transfers
+  std::size_t _taking GUARDED_BY(_mutex) = 0;     // threads that take part
+  std::uint64_t _round GUARDED_BY(_mutex) = 0;    // grows with every start
+  std::size_t _unsettled GUARDED_BY(_mutex) = 0;  // transfers that have room on the device
+  std::size_t _blocked GUARDED_BY(_mutex) = 0;    // threads that wait for room
+  bool _runsAhead GUARDED_BY(_mutex) = false;     // whether there is room or not
+  bool _over GUARDED_BY(_mutex) = false;          // the threads end
   std::vector<std::thread> _threads;
+  StopSignal::Subscription _stopped;
 };
 
 }  // namespace tsd

@@ -25,6 +25,25 @@ constexpr auto displayInterval = std::chrono::milliseconds(100);
 constexpr auto outcomeBase = std::chrono::seconds(60);
 constexpr std::uint64_t outcomeBytesPerSecond = std::uint64_t{4} << 20;
 
+/// How long a wait for outcomes may last: it is over when so much time has passed without a sign of life.
+class Patience {
+ public:
+  Patience(platform::Clock& clock, std::chrono::seconds time, std::uint64_t signs)
+      : _clock(clock), _time(time), _signs(signs), _deadline(clock.now() + time) {}
+
+  platform::Clock::Instant deadline() const { return _deadline; }
+  bool isOver() const { return _clock.now() >= _deadline; }
+  void see(std::uint64_t signs) {
+    if (std::exchange(_signs, signs) != signs) _deadline = _clock.now() + _time;
+  }
+
+ private:
+  platform::Clock& _clock;
+  const std::chrono::seconds _time;
+  std::uint64_t _signs;
+  platform::Clock::Instant _deadline;
+};
+
 double secondsSince(std::chrono::steady_clock::time_point start, std::chrono::steady_clock::time_point end) {
   return std::chrono::duration<double>(end - start).count();
 }
@@ -128,7 +147,20 @@ void SyncRun::transferPackages() {
                            (_assets.size() == 1 ? " package" : " packages"));
   auto& clock = _parts.session.device().events().clock();
   _parts.queue.start(_assets);
-  while (!_parts.queue.waitUntil(clock.now() + displayInterval)) showOutcomes(false);
+  std::optional<Patience> patience;  // while nothing is sent
+  while (true) {
+    const auto now = _parts.queue.waitUntil(clock.now() + displayInterval);
+    if (now == TransferQueue::Progression::ended) break;
+    showOutcomes(false);
+    if (now != TransferQueue::Progression::waits) {
+      patience.reset();
+      continue;
+    }
+    if (!patience) patience.emplace(clock, timeForOutcomes(), signsOfLife());
+    patience->see(signsOfLife());
+    // What never comes is found out at the end, whatever else is sent until then.
+    if (patience->isOver()) _parts.queue.stopWaitingForOutcomes();
+  }
   _parts.queue.finish();
 }
 
@@ -140,22 +172,23 @@ bool SyncRun::transferPhaseSucceeded() const {
   });
 }
 
-void SyncRun::awaitOutcomes() {
+std::chrono::seconds SyncRun::timeForOutcomes() const {
   std::uint64_t bytes = 0;
   for (const auto& asset : _assets) bytes += _parts.queue.result(asset->identifier()).bytes;
+  return outcomeBase + std::chrono::seconds(bytes / outcomeBytesPerSecond);
+}
+
+void SyncRun::awaitOutcomes() {
   auto& events = _parts.session.device().events();
-  const auto patience = outcomeBase + std::chrono::seconds(bytes / outcomeBytesPerSecond);
-  auto deadline = events.clock().now() + patience;
-  std::uint64_t signs = signsOfLife();
+  Patience patience(events.clock(), timeForOutcomes(), signsOfLife());
   if (!_assets.empty()) _parts.progress.headline("Waiting for the outcomes");
   // On the heap, because a device that never goes quiet must not keep this thread waiting: see below.
   auto quiet = std::make_unique<QuietWatch>(events, _parts.stop);
   bool isQuiet = false;
-  while (!isQuiet && !_parts.stop.requested() && events.clock().now() < deadline) {
-    isQuiet = quiet->waitUntil(std::min(deadline, events.clock().now() + displayInterval));
+  while (!isQuiet && !_parts.stop.requested() && !patience.isOver()) {
+    isQuiet = quiet->waitUntil(std::min(patience.deadline(), events.clock().now() + displayInterval));
     showOutcomes(isQuiet);
-    const std::uint64_t now = signsOfLife();
-    if (std::exchange(signs, now) != now) deadline = events.clock().now() + patience;
+    patience.see(signsOfLife());
   }
   if (isQuiet || _parts.stop.requested()) return;
   _deadlinePassed = true;

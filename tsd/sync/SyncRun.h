@@ -50,6 +50,8 @@ class SyncRun {
   void recordPackagePaths();
   void transferPackages();
   bool transferPhaseSucceeded() const;
+  /// In which a sign of life is to come, by what has been sent.
+  std::chrono::seconds timeForOutcomes() const;
   void awaitOutcomes();
   void sendInstallReports();
   void removeLeftPackages();
