@@ -12,7 +12,9 @@
 namespace platform {
 
 /// A serial queue that is only ever used synchronously: one block at a time runs on it, on the caller's own
-/// thread, and the caller waits for its turn on the device's clock, as for everything else. A block is a scope:
+/// thread, and the caller waits for its turn on the device's clock, as for everything else. Turns come in the order in
+/// which callers came; what a clock delivers on a thread that waits here goes before that thread's own turn. A block
+/// is a scope:
 ///
 ///     SerialQueue::Block block(_accessQueue, _platform.clock);
 ///
@@ -39,13 +41,22 @@ class CAPABILITY("queue") SerialQueue {
   };
 
  private:
+  /// One caller in the line.
+  struct Place {
+    std::thread::id thread;
+    Condition turn;
+    Place* next = nullptr;
+  };
+  class Waiting;
+
   void enter(Clock& clock) ACQUIRE();
   void leave() RELEASE();
+  void callNext() REQUIRES(_mutex);
 
   const std::string _label;
   Mutex _mutex;
-  Condition _left;
   bool _busy GUARDED_BY(_mutex) = false;
+  Place* _first GUARDED_BY(_mutex) = nullptr;  // of the line; each place lives on its caller's stack
   std::atomic<std::thread::id> _running;
 };
 

@@ -4,10 +4,12 @@
 #include <atomic>
 #include <random>
 #include <thread>
+#include <utility>
 
 #include "platform/Describe.h"
 #include "platform/InstallCoordination.h"
 #include "platform/NotificationCenter.h"
+#include "platform/SerialQueue.h"
 #include "tests/RestoreScenario.h"
 #include "tests/ScriptedServices.h"
 
@@ -216,6 +218,80 @@ class CountingClock final : public platform::Clock {
  private:
   platform::Clock& _clock;
 };
+
+/// A clock that lets go of whoever waits at once, and delivers something on the waiting thread.
+class DeliveringClock final : public platform::Clock {
+ public:
+  DeliveringClock(platform::Clock& clock, std::function<void()> event) : _clock(clock), _event(std::move(event)) {}
+
+  Instant now() override { return _clock.now(); }
+  bool waitUntil(platform::Mutex& mutex, platform::Condition&, Instant, const std::function<bool()>&) override
+      REQUIRES(mutex) {
+    mutex.unlock();
+    if (auto event = std::exchange(_event, nullptr)) event();
+    std::this_thread::yield();
+    mutex.lock();
+    return true;
+  }
+
+ private:
+  platform::Clock& _clock;
+  std::function<void()> _event;
+};
+
+TEST(Threads, AQueueServesItsCallersInTheOrderInWhichTheyCame) {
+  using Block = platform::SerialQueue::Block;
+  PluginRig rig(threads);
+  for (int round = 0; round < 50; ++round) {
+    CountingClock clock(rig.platform().clock);
+    platform::SerialQueue queue("line");
+    std::vector<std::string> order;
+    std::thread other;
+    {
+      Block block(queue, clock);
+      other = std::thread([&] {
+        Block waited(queue, clock);
+        order.push_back("waited");
+      });
+      while (clock.waits == 0) std::this_thread::yield();
+      tests::BrokenClock broken;
+      std::thread([&] { EXPECT_ANY_THROW(Block(queue, broken)); }).join();  // leaves the line
+    }
+    {
+      Block block(queue, clock);
+      order.push_back("came later");
+    }
+    other.join();
+    EXPECT_EQ(order, (std::vector<std::string>{"waited", "came later"}));
+  }
+}
+
+TEST(Threads, WhatIsDeliveredToAThreadInAQueueGoesBeforeThatThread) {
+  using Block = platform::SerialQueue::Block;
+  PluginRig rig(threads);
+  auto& clock = rig.platform().clock;
+  platform::SerialQueue queue("line");
+  std::vector<std::string> order;
+  std::atomic<bool> entered{false};
+  std::atomic<bool> leaves{false};
+  std::thread other([&] {
+    Block block(queue, clock);
+    entered = true;
+    while (!leaves) std::this_thread::yield();
+  });
+  while (!entered) std::this_thread::yield();
+  DeliveringClock delivering(clock, [&] {
+    leaves = true;
+    Block block(queue, clock);
+    order.push_back("delivered");
+  });
+  {
+    Block block(queue, delivering);
+    order.push_back("own");
+  }
+  other.join();
+  EXPECT_EQ(order, (std::vector<std::string>{"delivered", "own"}));
+}
 
 /// While `first` is about to do `operation` with that file, `second` begins on another thread, and has to wait.
 struct Meeting {
