@@ -11,8 +11,7 @@ SEEDS ?=
 unexport SEEDS
 PROCESSORS := $(shell nproc 2>/dev/null || echo 2)
 CTEST := ctest --output-on-failure --no-tests=error --timeout 1800 -j $(PROCESSORS)
-# What the build has written goes to the disk first: a test that flushes a file would wait for all of it, longer than a
-# restore waits for a placeholder.
+# What the build has written goes to the disk first: a test that flushes a file would wait for all of it.
 FLUSH = sync -f build
 WITH_SEEDS = $(if $(SEEDS),APPSYNC_SEEDS=$(SEEDS))
 # $(call PRESET,name,targets): everything without targets.
