@@ -153,8 +153,8 @@ class Trace:
             self.counts["syncs", self._kind(path or "")] += 1
         elif call.startswith("rename") and "\"ApplicationsSync.plist\"" in arguments:
             self.counts["list rewrites"] += 1
-        elif call == "pwrite64" and path.endswith("-wal") and ", 24, " in arguments:
-            # A frame of the log of the store: its head tells the last one of a commit.
+        elif call == "pwritev" and path.endswith("-wal"):
+            # A frame of the log of the store: its head, which comes first, tells the last one of a commit.
             head = ast.literal_eval("b" + re.search(r'"(?:[^"\\]|\\.)*"', arguments)[0])
             self.counts["store commits"] += head[4:8] != b"\0\0\0\0"
 

@@ -13,6 +13,7 @@
 #include "device/files/DevicePath.h"
 #include "device/files/StepWatch.h"
 #include "device/store/DatabaseImage.h"
+#include "device/store/PairedWrites.h"
 #include "device/store/Store.h"
 #include "platform/Mutex.h"
 #include "platform/ThreadSafety.h"
@@ -93,6 +94,7 @@ class DatabaseStore final : public Store {
   bool open(ErrorRef* error) {
     platform::Mutex::Lock lock(_mutex);
     sqlite3* opened = nullptr;
+    pairWritesOfLog();
     // The folder may be reached through links; the file itself is none, nor becomes one meanwhile.
     int status = sqlite3_open_v2(
         withoutLinks(_path).c_str(), &opened,
