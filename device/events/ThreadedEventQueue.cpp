@@ -77,6 +77,8 @@ class ThreadedEventQueue final : public EventQueue {
     LaneState& state = _lanes[static_cast<std::size_t>(lane)];
     state.pending.push_back(std::move(event));
     ++_unfinished;
+    // Whoever is woken finds the mutex free.
+    lock.unlock();
     state.wake.notifyOne();
     return true;
   }

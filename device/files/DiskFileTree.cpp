@@ -211,11 +211,6 @@ FileDescriptor openFlushable(int directory) {
   return std::find(known.begin(), known.end(), type) != known.end() ? std::move(opened) : FileDescriptor();
 }
 
-bool areOnOneFileSystem(int one, int other) {
-  struct stat first, second;
-  return ::fstat(one, &first) == 0 && ::fstat(other, &second) == 0 && first.st_dev == second.st_dev;
-}
-
 }  // namespace
 
 DiskFileTree::DiskFileTree(FileDescriptor root, std::shared_ptr<StepWatch> watch, Use use)
@@ -403,24 +398,21 @@ bool DiskFileTree::syncDirectory(std::string_view path, ErrorRef* error) {
   return answerFileOperation(flushDirectory(path), path, error);
 }
 
-bool DiskFileTree::canFlushTree(std::string_view path) const {
-  DiskPlace place;
-  FileDescriptor directory;
-  return _flushable.isOpen() && find(path, place) == 0 && place.openDirectory(directory) == 0 &&
-         areOnOneFileSystem(directory.get(), _flushable.get());
-}
-
 int DiskFileTree::flushTree(std::string_view path) const {
   return takeStep(_watch.get(), {Step::Kind::syncTree, path},
                   [&](Step&) { return ::syncfs(_flushable.get()) == 0 ? 0 : errno; });
 }
 
 bool DiskFileTree::syncItem(std::string_view path, ErrorRef* error) {
-  auto attributes = attributesOfItem(path, error);
-  if (!attributes) return false;
-  std::vector<Entry> items{{std::string(path), attributes->isDirectory, 0}};
+  DiskPlace place;
+  struct stat status, root;
+  int failure = find(path, place);
+  if (failure == 0) failure = place.status(status);
+  if (failure != 0) return answerFileOperation(failure, path, error);
+  std::vector<Entry> items{{std::string(path), S_ISDIR(status.st_mode), 0}};
   std::uint64_t size = 0;
-  const bool canBeOne = attributes->isDirectory && canFlushTree(path);
+  const bool canBeOne = items.front().isDirectory && _flushable.isOpen() && ::fstat(_flushable.get(), &root) == 0 &&
+                        root.st_dev == status.st_dev;
   for (std::size_t i = 0; i < items.size(); ++i) {
     if (!items[i].isDirectory) continue;
     std::string directory = path == "/" && i == 0 ? "" : items[i].name;
@@ -436,7 +428,6 @@ bool DiskFileTree::syncItem(std::string_view path, ErrorRef* error) {
   if (canBeOne && items.size() > fewItems && !areLarge) return answerFileOperation(flushTree(path), path, error);
   auto slash = path.rfind('/');
   items.push_back({std::string(slash == 0 ? "/" : path.substr(0, slash)), true, 0});
-  int failure = 0;
   for (const auto& item : items) {
     failure = item.isDirectory ? flushDirectory(item.name) : flushFile(item.name);
     if (failure != 0) break;

@@ -62,7 +62,6 @@ class DiskFileTree final : public FileTree {
   int openFile(std::string_view path, FileDescriptor& file, struct stat& status) const;
   int flushDirectory(std::string_view path) const;
   int flushFile(std::string_view path) const;
-  bool canFlushTree(std::string_view path) const;
   int flushTree(std::string_view path) const;
 
   const FileDescriptor _root;

@@ -49,9 +49,9 @@ FileDescriptor openBelow(const FileDescriptor& root, const std::string& path) {
 /// A name not used yet in any directory, as far as this process knows.
 std::string freshTemporaryName() {
   static std::atomic<std::uint64_t> last{0};
+  static const auto process = static_cast<unsigned long>(::getpid());
   char name[64];
-  std::snprintf(name, sizeof name, "%lx-%llx", static_cast<unsigned long>(::getpid()),
-                static_cast<unsigned long long>(++last));
+  std::snprintf(name, sizeof name, "%lx-%llx", process, static_cast<unsigned long long>(++last));
   return std::string(temporaryFilePrefix) + name;
 }
 

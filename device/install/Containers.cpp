@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <array>
+#include <cerrno>
 #include <cstdint>
 
 #include "platform/DevicePaths.h"
@@ -65,9 +66,12 @@ std::optional<std::string> Containers::makeFresh(platform::ErrorRef* error) {
     const auto name = drawName();
     if (!name) break;
     std::string container = std::string(containersDirectory) + '/' + *name;
-    if (_files.fileExists(container)) continue;
-    if (!_files.createDirectory(container, true, {}, error)) return std::nullopt;
-    return container;
+    platform::ErrorRef reason;
+    bool made = _files.createDirectory(container, false, {}, &reason);
+    if (!made && reason->code() == ENOENT) made = _files.createDirectory(container, true, {}, &reason);
+    if (!made && reason->code() == EEXIST) continue;
+    platform::setError(error, reason);
+    return made ? std::optional(container) : std::nullopt;
   }
   platform::setError(error, platform::makeError("FileSystem", 17, "no fresh container name"));
   return std::nullopt;

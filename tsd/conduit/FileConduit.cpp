@@ -78,7 +78,7 @@ bool FileConduit::pushStaging(const std::string& hostFolder) {
   }
   if (!hasList) return false;
   try {
-    pushTree({::dirfd(directory.get()), hostFolder, std::string(platform::stagingDirectory), 0});
+    pushTree({directory.get(), hostFolder, std::string(platform::stagingDirectory), 0});
   } catch (...) {
     _files.removeItem(platform::stagingDirectory);
     throw;
@@ -105,11 +105,7 @@ void FileConduit::pushDirectory(const Level& level) {
     refuse(level.hostPath, textOf(error));
     return;
   }
-  // A second descriptor, as the stream closes its own.
-  int descriptor = ::openat(level.directory, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-  Directory directory(descriptor < 0 ? nullptr : ::fdopendir(descriptor));
-  if (!directory) throw CommandError(level.hostPath + ": " + std::strerror(errno));
-  for (const auto& name : namesIn(directory.get(), level.hostPath, _limits.entries)) {
+  for (const auto& name : namesIn(level.directory, level.hostPath, _limits.entries)) {
     if (level.depth == 0 && (name == packagesName || name == restoreName)) continue;
     pushItem(level, name);
   }
@@ -126,21 +122,23 @@ void FileConduit::pushItem(const Level& level, const std::string& name) {
   if (++_entries > _limits.entries) throw tooMany(hostPath, _limits.entries);
   std::string devicePath = level.devicePath + "/" + name;
   struct stat facts {};
-  if (::fstatat(level.directory, name.c_str(), &facts, AT_SYMLINK_NOFOLLOW) != 0) {
+  const int above = ::dirfd(level.directory);
+  if (::fstatat(above, name.c_str(), &facts, AT_SYMLINK_NOFOLLOW) != 0) {
     return refuse(hostPath, std::strerror(errno));
   }
   if (S_ISDIR(facts.st_mode)) {
     if (level.depth + 1 > maximumDepth) {
       return refuse(hostPath, "nested more than " + std::to_string(maximumDepth) + " deep");
     }
-    int directory = ::openat(level.directory, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-    if (directory < 0) return refuse(hostPath, std::strerror(errno));
-    Directory owner(::fdopendir(directory));
-    return pushDirectory({directory, hostPath, devicePath, level.depth + 1});
+    int opened = ::openat(above, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+    if (opened < 0) return refuse(hostPath, std::strerror(errno));
+    Directory directory(::fdopendir(opened));
+    if (!directory) throw CommandError(hostPath + ": " + std::strerror(errno));
+    return pushDirectory({directory.get(), hostPath, devicePath, level.depth + 1});
   }
   if (!S_ISREG(facts.st_mode)) return refuse(hostPath, std::string(sortOfFile(facts.st_mode)) + ", not a regular file");
   platform::ErrorRef error;
-  auto file = HostFile::openAt(level.directory, name, &error);
+  auto file = HostFile::openAt(above, name, &error);
   if (!file) return refuse(hostPath, textOf(error));
   // If power is lost, the next sync brings the rest again; but a torn list would be taken for the host's.
   bool isTodoList = level.depth == 0 && name == platform::todoListName;
@@ -158,6 +156,7 @@ platform::ErrorRef FileConduit::copy(HostFile& file, const std::string& hostPath
   auto writer = _files.createNew(devicePath, false, &error);
   if (!writer && isAboutName(error)) return error;
   if (!writer) throw CommandError(hostPath + ": " + textOf(error));
+  std::uint64_t copied = 0;
   while (true) {
     checkStopped();
     auto bytes = file.read(chunkSize, &error);
@@ -166,6 +165,8 @@ platform::ErrorRef FileConduit::copy(HostFile& file, const std::string& hostPath
     _pushedBytes += bytes->size();
     if (_pushedBytes > maximumBytes) throw tooMuch(hostPath);
     if (!writer->write(*bytes, &error)) throw CommandError(hostPath + ": " + textOf(error));
+    copied += bytes->size();
+    if (copied == file.size() && bytes->size() < chunkSize) break;  // more was asked for
   }
   if (!writer->close(durable, &error)) throw CommandError(hostPath + ": " + textOf(error));
   return nullptr;

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <dirent.h>
+
 #include <cstdint>
 #include <functional>
 #include <string>
@@ -45,7 +47,7 @@ class FileConduit {
 
  private:
   struct Level {
-    int directory;
+    DIR* directory;  // nothing of it has been read
     std::string hostPath;
     std::string devicePath;
     std::size_t depth;

@@ -55,8 +55,13 @@ static void shareOneHeap() {
 #ifdef M_ARENA_MAX
   ::mallopt(M_ARENA_MAX, 1);
   ::mallopt(M_MMAP_THRESHOLD, 1 << 20);
+  ::mallopt(M_TRIM_THRESHOLD, 4 << 20);  // an icon takes several hundred kilobytes, and the next one as much
 #endif
 }
+
+/// Otherwise the C library looks whether the file has been exchanged whenever it is asked for a local time, which the
+/// archive library does for each entry of a package.
+static void readTimeZoneOnce() { ::setenv("TZ", ":/etc/localtime", 0); }
 
 void prepareProcess() {
   // A reader that goes away must not end a sync in the middle, nor a file that may not grow: that is a full disk.
@@ -64,6 +69,7 @@ void prepareProcess() {
   std::signal(SIGXFSZ, SIG_IGN);
   endWithMessageWithoutMemory();
   shareOneHeap();
+  readTimeZoneOnce();
 }
 
 }  // namespace tsd
