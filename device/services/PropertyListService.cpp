@@ -20,7 +20,7 @@ Value PropertyListService::propertyListWithData(Bytes bytes, ErrorRef* error) {
   ErrorRef reason;
   Value value = _boundary.call({{"PropertyListSerialization", "propertyListWithData"}}, &reason,
                                {{"bytes", CallArgument::BytesCount{size}}},
-                               [&] { return plist::read(std::move(bytes), &reason); });
+                               [&] { return _lists.read(std::move(bytes), &reason); });
   LastRead& file = LastRead::ofThisThread();
   if (file.isWhole(size) && _unreadable && !Boundary::isDeclined(reason)) {
     const std::string problem = !value.isAbsent() ? problemOfList(file.path(), value)
@@ -40,7 +40,7 @@ std::optional<Bytes> PropertyListService::dataWithPropertyList(const Value& valu
   Crossing crossing{{"PropertyListSerialization", "dataWithPropertyList"}};
   crossing.answersBytes = true;
   return _boundary.call(crossing, error, {{"value", value}, {"format", isXML ? "xml" : "binary"}},
-                        [&] { return isXML ? plist::writeXML(value, error) : plist::writeBinary(value, error); });
+                        [&] { return isXML ? plist::writeXML(value, error) : _lists.writeBinary(value, error); });
 }
 
 }  // namespace device

@@ -6,6 +6,7 @@
 
 #include "device/boundary/Boundary.h"
 #include "platform/PropertyListSerialization.h"
+#include "plist/ListMemory.h"
 
 namespace device {
 
@@ -25,6 +26,7 @@ class PropertyListService final : public platform::PropertyListSerialization {
 
  private:
   Boundary& _boundary;
+  plist::ListMemory _lists;  // the todo list, above all: read and written whole with every mark
   const Unreadable _unreadable;
 };
 
