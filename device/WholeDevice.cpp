@@ -92,7 +92,7 @@ class WholeDevice final : public LocalDevice {
   ~WholeDevice() override {
     _events->stop();
     WholeDevice::flush(nullptr);
-    if (_recovers && !_engine.putsOff()) noteClosed();
+    if (_recovers && _engine.isSettled()) noteClosed();
   }
 
   bool load(ErrorRef* error) {

@@ -64,6 +64,11 @@ class EventQueue {
     if (_thread.holds && _thread.callDepth == 0) releaseHeld();
   }
 
+  /// Does work that nobody is told of on a thread beside the lanes', as soon as one is free. False, with the work
+  /// untouched, when there is none: whoever needs it does it then. What has not begun when the queue stops never runs,
+  /// and `drain` does not wait for it.
+  virtual bool workAside(Event& /*work*/) { return false; }
+
   /// Returns when every event posted so far, and whatever they posted, has run (and nothing is held back by this
   /// thread). Never called from an event.
   virtual void drain() = 0;
@@ -94,7 +99,8 @@ class EventQueue {
   std::shared_ptr<Door> _door;  // what held events reach this queue through, as they may outlive it
 };
 
-/// One thread per lane and the real clock. Throws `std::system_error` when the system has no thread left.
+/// One thread per lane, two beside them once there is work for them, and the real clock. Throws `std::system_error`
+/// when the system has no thread left.
 std::unique_ptr<EventQueue> makeThreadedEventQueue();
 
 /// Driven by hand, with a virtual clock: nothing runs until it is told to or somebody waits on the clock.

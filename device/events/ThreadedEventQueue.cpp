@@ -1,5 +1,6 @@
 #include <array>
 #include <deque>
+#include <system_error>
 #include <thread>
 #include <utility>
 
@@ -51,6 +52,7 @@ class ThreadedEventQueue final : public EventQueue {
 
   void stop() override {
     std::array<std::deque<Event>, laneCount> dropped;  // destroyed when no lock is held: events own what they will call
+    std::deque<Event> undone;
     {
       Lock lock(_mutex);
       _stopped = true;
@@ -59,6 +61,8 @@ class ThreadedEventQueue final : public EventQueue {
         _unfinished -= dropped[i].size();
         _lanes[i].wake.notifyOne();
       }
+      undone.swap(_aside);
+      _asideWake.notifyAll();
       if (_unfinished == 0) _idle.notifyAll();
     }
     if (runsLaneOf == this) return;
@@ -66,6 +70,30 @@ class ThreadedEventQueue final : public EventQueue {
     for (auto& thread : _threads) {
       if (thread.joinable()) thread.join();
     }
+    for (auto& helper : _helpers) {
+      if (helper.joinable()) helper.join();
+    }
+  }
+
+  bool workAside(Event& work) override {
+    Lock lock(_mutex);
+    if (_stopped) return false;
+    if (!_hasHelpers) {
+      // With fewer, or none, everything is done all the same.
+      _hasHelpers = true;
+      Lock joinLock(_joinMutex);
+      try {
+        for (auto& helper : _helpers) {
+          helper = std::thread([this] { helpAside(); });
+          _canWorkAside = true;
+        }
+      } catch (const std::system_error&) {
+      }
+    }
+    if (!_canWorkAside) return false;
+    _aside.push_back(std::move(work));
+    _asideWake.notifyOne();
+    return true;
   }
 
   platform::Clock& clock() override { return _clock; }
@@ -108,6 +136,21 @@ class ThreadedEventQueue final : public EventQueue {
     }
   }
 
+  void helpAside() {
+    ThreadName name("unpacking");
+    Lock lock(_mutex);
+    while (true) {
+      _asideWake.wait(_mutex, [this]() REQUIRES(_mutex) { return _stopped || !_aside.empty(); });
+      if (_stopped) return;
+      Event work = std::move(_aside.front());
+      _aside.pop_front();
+      lock.unlock();
+      work();
+      work = nullptr;
+      lock.lock();
+    }
+  }
+
   static inline constinit thread_local const ThreadedEventQueue* runsLaneOf = nullptr;
 
   SystemClock _clock;
@@ -117,8 +160,13 @@ class ThreadedEventQueue final : public EventQueue {
   std::array<LaneState, laneCount> _lanes GUARDED_BY(_mutex);
   std::size_t _unfinished GUARDED_BY(_mutex) = 0;  // pending or running, over all lanes
   bool _stopped GUARDED_BY(_mutex) = false;
+  std::deque<Event> _aside GUARDED_BY(_mutex);
+  platform::Condition _asideWake;
+  bool _hasHelpers GUARDED_BY(_mutex) = false;    // or has tried to
+  bool _canWorkAside GUARDED_BY(_mutex) = false;  // there is one at least
   // Made last, as they touch all of these; the constructor starts them and `stop` joins them.
   std::array<std::thread, laneCount> _threads GUARDED_BY(_joinMutex);
+  std::array<std::thread, 2> _helpers GUARDED_BY(_joinMutex);
 };
 
 }  // namespace

@@ -2,11 +2,13 @@
 
 #include <algorithm>
 #include <cmath>
+#include <new>
 #include <utility>
 
 #include "device/DeviceErrors.h"
 #include "device/install/AppIdentifier.h"
 #include "device/install/CoordinationError.h"
+#include "device/install/InstallAhead.h"
 #include "device/install/InstallOutcomes.h"
 #include "device/install/InstallRecovery.h"
 #include "device/install/PackageInstall.h"
@@ -210,10 +212,24 @@ void InstallEngine::beginInstall(const CoordinatorRef& coordinator) {
   // If the store refuses, the install's own commit tells.
   _records.write(std::move(changes));
   coordinator->state.fractionUnsaved = false;
-  _parts.events.post(Lane::coordination, [this, coordinator] {
-    if (!_putsOff) installAppAsset(_parts, coordinator);
-  });
+  auto install = std::make_shared<InstallAhead>(_parts, coordinator, _unpackedAhead);
+  _parts.events.post(Lane::coordination, [this, install] { _putsOff ? install->discard() : install->install(); });
   _reports.installsChanged(coordinator->app);
+  unpackAhead(coordinator->state.record, install);
+}
+
+void InstallEngine::unpackAhead(const CoordinatorRecord& record, const std::shared_ptr<InstallAhead>& install) {
+  if (!record.appAsset || !record.appAsset->path) return;
+  try {
+    auto request = requestIn(record);
+    if (request.storeMetadata().isAbsent()) return;  // the app's own at that time, which are not known yet
+    EventQueue::Event unpack = [this, install, request = std::move(request)]() mutable {
+      if (!_putsOff) install->unpack(std::move(request));
+    };
+    _parts.events.workAside(unpack);
+  } catch (const std::bad_alloc&) {
+    // Its turn comes all the same.
+  }
 }
 
 bool InstallEngine::cancel(PromiseRecord& promise, const ErrorRef& reason, platform::RVClientIdentifier client,

@@ -19,6 +19,8 @@
 
 namespace device {
 
+class InstallAhead;
+
 /// Decides what becomes of apps and coordinators: every change of them, whichever service asks for it, below the
 /// boundary. A change is one commit of the store; files come before it and go after it, so that a process that dies in
 /// between leaves nothing but files that no record names. Callable from any thread.
@@ -84,12 +86,15 @@ class InstallEngine {
   bool installFromPackage(std::string_view packagePath, platform::ErrorRef* error) EXCLUDES(recordsGuard);
   /// See `LocalDevice`.
   void putOffInstalls() { _putsOff = true; }
-  bool putsOff() const { return _putsOff; }
+  /// Whether everything that was begun has ended, so that no container is there which no record names.
+  bool isSettled() const { return !_putsOff && _unpackedAhead == 0; }
 
  private:
   bool edit(Coordinator& coordinator, const std::function<bool(CoordinatorRecord&)>& edit, platform::ErrorRef* error)
       REQUIRES(recordsGuard);
   void beginInstall(const CoordinatorRef& coordinator) REQUIRES(recordsGuard);
+  void unpackAhead(const CoordinatorRecord& record, const std::shared_ptr<InstallAhead>& install)
+      REQUIRES(recordsGuard);
 
   AppRecords& _records;
   Containers _containers;
@@ -97,6 +102,7 @@ class InstallEngine {
   InstallReports _reports;
   const PlaceholderFailed _placeholderFailed;
   const InstallParts _parts;
+  std::atomic<std::size_t> _unpackedAhead{0};
   std::atomic<bool> _putsOff{false};  // packages are left for the next opening
 };
 

@@ -37,7 +37,7 @@ AppRecord recordOf(const UnpackedPackage& package, const std::string& container)
 
 }  // namespace
 
-std::optional<AppRecord> PackageInstall::unpack(ErrorRef* error) {
+std::optional<AppRecord> PackageInstall::unpackFresh(ErrorRef* error) {
   auto container = _parts.containers.makeFresh(error);
   if (!container) return std::nullopt;
   AbandonedContainer abandoned(_parts.containers, *container);
@@ -57,8 +57,7 @@ std::optional<AppRecord> PackageInstall::unpackInto(const std::string& container
     return refuse("the app \"" + package->identifier + "\", not \"" + _request.app + '"');
   if (!isAppIdentifier(package->identifier)) return refuse("an app whose identifier cannot be used");
   auto app = recordOf(*package, container);
-  const auto& metadata =
-      _request.options && !_request.options->metadata.isAbsent() ? _request.options->metadata : _request.metadata;
+  const auto& metadata = _request.storeMetadata();
   std::string previous;
   {
     Lock lock(_parts.records);
@@ -73,19 +72,31 @@ std::optional<AppRecord> PackageInstall::unpackInto(const std::string& container
   return app;
 }
 
-bool PackageInstall::run(ErrorRef* error) {
-  setError(error, nullptr);
+ErrorRef PackageInstall::outOfMemory() const {
+  // A package that needs more memory than there is, which the next one may not.
+  return platform::makeError("Package", ENOMEM, "package \"" + _request.packagePath + "\": out of memory");
+}
+
+UnpackedApp PackageInstall::unpack() {
   _parts.records.takeBackClosed();  // files come now that no record names
-  ErrorRef reason;
-  auto id = _request.app;
+  UnpackedApp unpacked;
+  try {
+    unpacked.app = unpackFresh(&unpacked.reason);
+  } catch (const std::bad_alloc&) {
+    unpacked.reason = outOfMemory();
+  }
+  return unpacked;
+}
+
+bool PackageInstall::finish(UnpackedApp unpacked, ErrorRef* error) {
+  setError(error, nullptr);
+  ErrorRef reason = unpacked.reason;
+  auto id = unpacked.app ? unpacked.app->id : _request.app;
   bool installed = false;
   try {
-    auto app = unpack(&reason);
-    if (app) id = app->id;
-    installed = app && record(std::move(*app), &reason);
+    installed = unpacked.app && record(std::move(*unpacked.app), &reason);
   } catch (const std::bad_alloc&) {
-    // A package that needs more memory than there is, which the next one may not.
-    reason = platform::makeError("Package", ENOMEM, "package \"" + _request.packagePath + "\": out of memory");
+    reason = outOfMemory();
   }
   if (!installed) {
     if (!_request.app.empty()) fail(id, reason);
@@ -120,25 +131,33 @@ void PackageInstall::fail(const std::string& app, const ErrorRef& reason) {
   if (!ending(app)) failInstall(_parts, _coordinator, app, reason, abandoned);
 }
 
-void installAppAsset(const InstallParts& parts, const CoordinatorRef& coordinator) {
-  InstallRequest request;
-  request.app = coordinator->app;
-  {
-    AbandonedContainer abandoned(parts.containers);
-    Lock lock(parts.records);
-    const auto& record = coordinator->state.record;
-    if (coordinator->state.ended || !record.appAsset) return;
-    const auto& path = record.appAsset->path;
-    if (!path)
-      return failInstall(
-          parts, coordinator, coordinator->app,
-          coordinationError(CoordinationError::notDelivered, "the package of " + coordinator->app + " has no path"),
-          abandoned);
-    request.packagePath = *path;
-    request.options = record.options;
-    if (record.placeholder) request.metadata = record.placeholder->metadata;
+std::optional<InstallRequest> requestOf(const InstallParts& parts, const CoordinatorRef& coordinator) {
+  AbandonedContainer abandoned(parts.containers);
+  Lock lock(parts.records);
+  const auto& record = coordinator->state.record;
+  if (coordinator->state.ended || !record.appAsset) return std::nullopt;
+  if (!record.appAsset->path) {
+    failInstall(
+        parts, coordinator, coordinator->app,
+        coordinationError(CoordinationError::notDelivered, "the package of " + coordinator->app + " has no path"),
+        abandoned);
+    return std::nullopt;
   }
-  PackageInstall(parts, coordinator, std::move(request)).run(nullptr);
+  return requestIn(record);
+}
+
+InstallRequest requestIn(const CoordinatorRecord& record) {
+  InstallRequest request;
+  request.app = record.app;
+  request.packagePath = *record.appAsset->path;
+  request.options = record.options;
+  if (record.placeholder) request.metadata = record.placeholder->metadata;
+  return request;
+}
+
+void installAppAsset(const InstallParts& parts, const CoordinatorRef& coordinator) {
+  if (auto request = requestOf(parts, coordinator))
+    PackageInstall(parts, coordinator, std::move(*request)).run(nullptr);
 }
 
 void removePackage(const InstallParts& parts, const std::string& path) {

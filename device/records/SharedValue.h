@@ -21,6 +21,8 @@ class SharedValue {
     return _value ? *_value : absent;
   }
   bool isAbsent() const { return !_value; }
+  /// Whether it is the very same value, not one that is equal.
+  bool isSame(const SharedValue& other) const { return _value == other._value; }
   const platform::Dictionary* dictionary() const { return value().dictionary(); }
 
  private:
