@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "device/boundary/JournalValue.h"
+
 namespace device {
 
 namespace {
@@ -53,7 +55,9 @@ void RegistryReports::report(Observer& observer) {
   bringUpToDate();
   auto shown = [&](const Proxies& proxies) {
     if (!_boundary.hasJournal()) return platform::Value();
-    return _boundary.showsWhole() ? journalValue(_boundary, proxies) : journalValue(_boundary, identifiers(proxies));
+    // Of many apps only their number is shown, which is no reason to list them.
+    const bool isListed = !_boundary.showsWhole() && proxies.size() <= longestShownList;
+    return isListed ? journalValue(_boundary, identifiers(proxies)) : journalValue(_boundary, proxies);
   };
   _boundary.enter({{"AppsClient", "applicationInstallsArePrioritized"}},
                   {{"prioritized", shown(_prioritized)},
