@@ -224,7 +224,7 @@ TEST(RecordingStream, WhatIsPartOfAnotherItemIsReadWithIt) {
   entries.dictionary()->set("large", noise(3000, 1));
   ItemWriter items;
   items.value(entries);
-  const auto read = readAll(recordingOf({items.bytes(), items.bytes()}), EventReader::Large::apart);
+  const auto read = readAll(recordingOf({items.take(), items.take()}), EventReader::Large::apart);
   for (const auto& event : {read.events.at(0), read.events.at(2)}) {
     record::ItemReader reader(event.payload, &event.large);
     EXPECT_EQ(reader.value(), entries);

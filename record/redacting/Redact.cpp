@@ -129,7 +129,7 @@ class Rewriting {
  public:
   explicit Rewriting(Secrets& secrets) : _secrets(secrets) {}
 
-  const std::string& payload(const Event& event, const OperationName& operation) {
+  std::string_view payload(const Event& event, const OperationName& operation) {
     _items.clear();
     const bool isBytes = answersBytes(event, operation);
     ItemReader items(event.payload);

@@ -86,13 +86,10 @@ void put(ItemWriter& items, Names& names, const std::optional<T>& value) {
 }
 template <class T>
 void put(ItemWriter& items, Names& names, const std::vector<T>& values) {
-  ItemWriter apart;
-  ItemWriter& into = values.size() < 16 ? items : apart;
-  into.list(values.size());
-  for (const auto& value : values) put(into, names, value);
-  if (&into == &items) return;
-  apart.packFrom(0);
-  items.items(apart.bytes());
+  const std::size_t begin = items.bytes().size();
+  items.list(values.size());
+  for (const auto& value : values) put(items, names, value);
+  if (values.size() >= 16) items.packFrom(begin);
 }
 
 /// The plug-in's object when it has just been made; 0: it could not be.

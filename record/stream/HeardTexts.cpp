@@ -112,7 +112,7 @@ void ListEditing::edit(const LargeText::Edit& edit) {
   _made->_edits.push_back(edit);
 }
 
-void ListEditing::element(std::size_t begin, std::size_t end, const std::string& between) {
+void ListEditing::element(std::size_t begin, std::size_t end, std::string_view between) {
   std::string made;
   if (comesForAnother()) {
     const auto old = _before->element(_old++);

@@ -89,7 +89,7 @@ class ListEditing {
 
   void edit(const LargeText::Edit& edit);
   /// One of the elements that come: what it has of the old one's bytes in front and behind, if it comes for one.
-  void element(std::size_t begin, std::size_t end, const std::string& between);
+  void element(std::size_t begin, std::size_t end, std::string_view between);
   bool comesForAnother() const { return _old < _oldEnd; }
   std::shared_ptr<LargeText> finish();
 

@@ -1,5 +1,6 @@
 #include "record/stream/Item.h"
 
+#include <algorithm>
 #include <bit>
 #include <cstring>
 #include <new>
@@ -99,11 +100,30 @@ void appendVarint(std::string& bytes, std::uint64_t value) {
   bytes.push_back(static_cast<char>(value));
 }
 
-void ItemWriter::varint(std::uint64_t value) { appendVarint(_bytes, value); }
+void ItemBuffer::grow(std::size_t count) {
+  const std::size_t used = size();
+  const std::size_t wanted = std::max<std::size_t>(used + count, 2 * static_cast<std::size_t>(_limit - _room.get()));
+  const std::size_t capacity = std::max<std::size_t>(wanted, 256);
+  std::unique_ptr<char[]> room(new char[capacity]);
+  if (used > 0) std::memcpy(room.get(), _room.get(), used);
+  _room = std::move(room);
+  _end = _room.get() + used;
+  _limit = _room.get() + capacity;
+}
+
+void ItemBuffer::insert(std::size_t begin, std::string_view bytes) {
+  reserve(bytes.size());
+  char* at = _room.get() + begin;
+  std::memmove(at + bytes.size(), at, size() - begin);
+  std::memcpy(at, bytes.data(), bytes.size());
+  _end += bytes.size();
+}
 
 void ItemWriter::fixed(double value) {
   const auto bits = std::bit_cast<std::uint64_t>(value);
-  for (int shift = 0; shift < 64; shift += 8) _bytes.push_back(static_cast<char>(bits >> shift));
+  char bytes[8];
+  for (std::size_t at = 0; at < 8; ++at) bytes[at] = static_cast<char>(bits >> (8 * at));
+  _buffer.append({bytes, sizeof bytes});
 }
 
 void ItemWriter::real(double value) {
@@ -118,45 +138,45 @@ void ItemWriter::date(double seconds) {
 
 void ItemWriter::object(const ObjectMention& mention) {
   tag(Tag::object);
-  _bytes.push_back(static_cast<char>(mention.kind));
+  _buffer.byte(static_cast<std::uint8_t>(mention.kind));
   varint(mention.number);
-  _bytes.push_back(static_cast<char>(mention.flags));
+  _buffer.byte(mention.flags);
 }
 
 void ItemWriter::packFrom(std::size_t begin) {
-  const std::size_t size = _bytes.size() - begin;
-  if (size < packedFrom || static_cast<Tag>(_bytes[begin]) == Tag::packed) return;
+  const std::size_t size = _buffer.size() - begin;
+  if (size < packedFrom || static_cast<Tag>(bytes()[begin]) == Tag::packed) return;
   std::string head(1, static_cast<char>(Tag::packed));
   appendVarint(head, size);
-  _bytes.insert(begin, head);
+  _buffer.insert(begin, head);
 }
 
 void ItemWriter::Lent::putInto(ItemWriter& items) const { list ? items.value(*list) : items.sized(tag, bytes); }
 
 void ItemWriter::lendText(Tag tag, std::string_view bytes) {
   if (bytes.size() < LargeTexts::from) return sized(tag, bytes);
-  _lent.push_back({_bytes.size(), tag, bytes});
+  _lent.push_back({_buffer.size(), tag, bytes});
 }
 
 void ItemWriter::lendValue(const Value& value) {
   if (!value.array() || value.array()->empty()) return this->value(value);
-  _lent.push_back({_bytes.size(), Tag::list, {}, &value});
+  _lent.push_back({_buffer.size(), Tag::list, {}, &value});
 }
 
 std::string ItemWriter::whole() const {
   ItemWriter items;
   std::size_t at = 0;
   for (const auto& lent : _lent) {
-    items.items(std::string_view(_bytes).substr(at, lent.place - at));
+    items.items(bytes().substr(at, lent.place - at));
     lent.putInto(items);
     at = lent.place;
   }
-  items.items(std::string_view(_bytes).substr(at));
+  items.items(bytes().substr(at));
   return items.take();
 }
 
 void ItemWriter::value(const Value& value) {
-  const std::size_t begin = _bytes.size();
+  const std::size_t begin = _buffer.size();
   bareValue(value);
   if (value.array() || value.dictionary()) packFrom(begin);
 }

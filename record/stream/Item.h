@@ -2,8 +2,12 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
+#include <memory>
 #include <string>
 #include <string_view>
+#include <utility>
+#include <vector>
 
 #include "platform/Value.h"
 #include "record/stream/HeardTexts.h"
@@ -70,12 +74,72 @@ constexpr std::size_t deepestItem = 1100;
 /// From so many bytes on an item of many parts is packed.
 constexpr std::size_t packedFrom = 4096;
 
+/// Bytes that are appended to. A list of thousands of apps is written for each mark in it, text by text: so there is
+/// room first, and then what is written into it.
+class ItemBuffer {
+ public:
+  ItemBuffer() = default;
+  ItemBuffer(ItemBuffer&& other) noexcept { *this = std::move(other); }
+  ItemBuffer& operator=(ItemBuffer&& other) noexcept {
+    std::swap(_room, other._room);
+    std::swap(_end, other._end);
+    std::swap(_limit, other._limit);
+    return *this;
+  }
+
+  std::string_view bytes() const { return {_room.get(), size()}; }
+  std::size_t size() const { return static_cast<std::size_t>(_end - _room.get()); }
+  void clear() { _end = _room.get(); }
+
+  void byte(std::uint8_t value) {
+    reserve(1);
+    *_end++ = static_cast<char>(value);
+  }
+  void varint(std::uint64_t value) {
+    reserve(longestVarint);
+    putVarint(value);
+  }
+  void append(std::string_view bytes) {
+    reserve(bytes.size());
+    put(bytes);
+  }
+  /// A tag, a length, and so many bytes.
+  void sized(std::uint8_t tag, std::string_view bytes) {
+    reserve(1 + longestVarint + bytes.size());
+    *_end++ = static_cast<char>(tag);
+    putVarint(bytes.size());
+    put(bytes);
+  }
+  /// Bytes in front of those from `begin` on.
+  void insert(std::size_t begin, std::string_view bytes);
+
+ private:
+  static constexpr std::size_t longestVarint = 10;
+
+  void reserve(std::size_t count) {
+    if (static_cast<std::size_t>(_limit - _end) < count) grow(count);
+  }
+  void grow(std::size_t count);
+  void putVarint(std::uint64_t value) {
+    for (; value >= 0x80; value >>= 7) *_end++ = static_cast<char>(value | 0x80);
+    *_end++ = static_cast<char>(value);
+  }
+  void put(std::string_view bytes) {
+    if (!bytes.empty()) std::memcpy(_end, bytes.data(), bytes.size());
+    _end += bytes.size();
+  }
+
+  std::unique_ptr<char[]> _room;
+  char* _end = nullptr;
+  char* _limit = nullptr;
+};
+
 /// Appends items to a buffer.
 class ItemWriter {
  public:
-  const std::string& bytes() const { return _bytes; }
-  std::string take() { return std::move(_bytes); }
-  void clear() { _bytes.clear(); }
+  std::string_view bytes() const { return _buffer.bytes(); }
+  std::string take() const { return std::string(bytes()); }
+  void clear() { _buffer.clear(); }
 
   /// One item that is only looked at, to be compared with another one: it is not in `bytes`, which have `place` where
   /// it should be, and has to outlive this.
@@ -124,20 +188,16 @@ class ItemWriter {
   /// Packs what was written from `begin` on, one item, if it has become large.
   void packFrom(std::size_t begin);
   /// Bytes that are items already.
-  void items(std::string_view bytes) { _bytes.append(bytes); }
+  void items(std::string_view bytes) { _buffer.append(bytes); }
 
  private:
-  void tag(Tag tag) { _bytes.push_back(static_cast<char>(tag)); }
-  void varint(std::uint64_t value);
-  void sized(Tag as, std::string_view bytes) {
-    tag(as);
-    varint(bytes.size());
-    _bytes.append(bytes);
-  }
+  void tag(Tag tag) { _buffer.byte(static_cast<std::uint8_t>(tag)); }
+  void varint(std::uint64_t value) { _buffer.varint(value); }
+  void sized(Tag as, std::string_view bytes) { _buffer.sized(static_cast<std::uint8_t>(as), bytes); }
   void fixed(double value);
   void bareValue(const platform::Value& value);
 
-  std::string _bytes;
+  ItemBuffer _buffer;
   std::vector<Lent> _lent;
 };
 

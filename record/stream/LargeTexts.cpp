@@ -189,22 +189,32 @@ std::optional<LargeTexts::Likeness> LargeTexts::like(std::string_view text) cons
 }
 
 std::optional<LargeTexts::ListLikeness> LargeTexts::likeList(std::string_view list) const {
+  const auto head = headOf(list);
+  if (!head) return std::nullopt;
+  const std::string_view body = list.substr(head->first);
+  std::vector<Likeness> candidates;
   for (std::size_t slot = 0; slot < _slots.size(); ++slot) {
-    if (_slots[slot].places.empty()) continue;
-    auto likeness = likeList(_slots[slot], list);
-    if (!likeness) continue;
-    likeness->slot = slot;
-    return likeness;
+    const Slot& base = _slots[slot];
+    if (base.places.empty()) continue;
+    const std::string_view oldBody = std::string_view(base.text).substr(base.places.front());
+    const std::size_t begin = sameBegin(body, oldBody);
+    candidates.push_back({slot, begin, sameEnd(body, oldBody, std::min(body.size(), oldBody.size()) - begin)});
+  }
+  // One that is not like it is gone through element by element, to no avail.
+  std::stable_sort(candidates.begin(), candidates.end(), [](const Likeness& one, const Likeness& other) {
+    return one.begin + one.end > other.begin + other.end;
+  });
+  for (const auto& candidate : candidates) {
+    if (auto likeness = likeList(candidate, list, *head)) return likeness;
   }
   return std::nullopt;
 }
 
-std::optional<LargeTexts::ListLikeness> LargeTexts::likeList(const Slot& base, std::string_view list) const {
-  const auto head = headOf(list);
-  if (!head) return std::nullopt;
-  const std::string_view was(base.text), body = list.substr(head->first), oldBody = was.substr(base.places.front());
-  const std::size_t begin = sameBegin(body, oldBody);
-  const std::size_t end = sameEnd(body, oldBody, std::min(body.size(), oldBody.size()) - begin);
+std::optional<LargeTexts::ListLikeness> LargeTexts::likeList(const Likeness& candidate, std::string_view list,
+                                                             const ListHead& head) const {
+  const Slot& base = _slots[candidate.slot];
+  const std::string_view was(base.text);
+  const std::size_t begin = candidate.begin, end = candidate.end;
   // The old elements that lie wholly in what is the same are elements of the new list, too.
   const auto behind = std::upper_bound(base.places.begin(), base.places.end(), base.places.front() + begin);
   const auto last = std::lower_bound(behind - 1, base.places.end(), was.size() - end);
@@ -212,11 +222,12 @@ std::optional<LargeTexts::ListLikeness> LargeTexts::likeList(const Slot& base, s
   middle.oldFrom = middle.newFrom = static_cast<std::size_t>(behind - base.places.begin()) - 1;
   middle.oldTo = static_cast<std::size_t>(last - base.places.begin());
   const std::size_t sameLast = base.places.size() - 1 - middle.oldTo;
-  if (middle.newFrom + sameLast > head->second) return std::nullopt;
-  middle.newTo = head->second - sameLast;
+  if (middle.newFrom + sameLast > head.second) return std::nullopt;
+  middle.newTo = head.second - sameLast;
 
   ListLikeness likeness;
-  likeness.places = placesBeside(base.places, list, head->first, middle);
+  likeness.slot = candidate.slot;
+  likeness.places = placesBeside(base.places, list, head.first, middle);
   if (likeness.places.empty()) return std::nullopt;
   auto edits =
       editsOf(Elements(was, base.places), Elements(list, likeness.places), middle, middle.oldFrom, list.size() / 2);

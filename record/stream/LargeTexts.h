@@ -6,6 +6,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 namespace record {
@@ -63,7 +64,8 @@ class LargeTexts {
     std::string text;
     std::vector<std::uint32_t> places;  // where each element of a list begins, and the end; empty: it is none
   };
-  std::optional<ListLikeness> likeList(const Slot& base, std::string_view list) const;
+  using ListHead = std::pair<std::size_t, std::size_t>;  // its bytes, and how many elements follow
+  std::optional<ListLikeness> likeList(const Likeness& candidate, std::string_view list, const ListHead& head) const;
 
   std::deque<Slot> _slots;
 };
