@@ -105,8 +105,8 @@ std::vector<std::string> Replayer::standing() const {
     std::string line = player->number < _reader.threads().size() ? _reader.threads()[player->number] : "?";
     if (player->inside.empty()) line += ": outside the plug-in";
     const char* separator = ": in ";
-    for (const auto& [operation, thrown] : player->inside) {
-      line += separator + operation.service + "." + operation.name;
+    for (const auto& open : player->inside) {
+      line.append(separator).append(open.service).append(".").append(open.name);
       separator = ", in ";
     }
     lines.push_back(std::move(line));
@@ -121,9 +121,9 @@ Difference& Replayer::differ(Difference::Kind kind, const Player& player, const 
   difference.standing = standing();
   difference.thread = player.number < _reader.threads().size() ? _reader.threads()[player.number] : "";
   if (!player.inside.empty())
-    difference.inside = player.inside.back().name.service + "." + player.inside.back().name.name;
+    difference.inside.append(player.inside.back().service).append(".").append(player.inside.back().name);
   if (expected) {
-    const OperationName name = nameOfEvent(*expected);
+    const OperationName& name = nameOfEvent(*expected);
     difference.event = expected->number;
     difference.of = expected->kind == EventKind::call ? classOf(name) : OperationClass::service;
     difference.expected = eventLine(expected->kind, name, wholePayload(*expected));

@@ -92,7 +92,7 @@ Event Replayer::pop() {
   return event;
 }
 
-OperationName Replayer::nameOfEvent(const Event& event) const { return _reader.operations()[event.operation]; }
+const OperationName& Replayer::nameOfEvent(const Event& event) const { return _reader.operations()[event.operation]; }
 
 /// The plug-in's new objects get the numbers that they had, which the next event tells.
 std::uint64_t Replayer::newNumber(ObjectKind kind) {
@@ -170,12 +170,12 @@ void Replayer::playAll(Player& player) {
 
 /// One call into the plug-in, to its return.
 void Replayer::play(Player& player, const Event& event) {
-  const OperationName operation = nameOfEvent(event);
+  const OperationName& operation = nameOfEvent(event);
   const PlayCall call = event.kind == EventKind::enter ? playerOf(operation) : nullptr;
   if (!call)
     return refuse("event " + std::to_string(event.number) + ": " + operation.service + "." + operation.name +
                   " is no call into a plug-in");
-  player.inside.push_back({operation});
+  player.inside.push_back({operation.service, operation.name});
   ItemReader arguments(event.payload, &event.large);
   ItemWriter result;
   std::string problem;
@@ -233,7 +233,7 @@ std::optional<Replayer::Answer> Replayer::exchange(const Operation& operation, c
   if (isOver() && player && player == _messenger) return afterEnd(operation, arguments);
   if (isOver() || !player || ignores(operation)) return std::nullopt;
   if (!match(*player, operation, arguments)) return std::nullopt;
-  player->inside.push_back({{operation.service, operation.name, operation.parameters}});
+  player->inside.push_back({operation.service, operation.name});
   passTurn();
   auto event = awaitAnswer(*player);
   const Open ended = std::move(player->inside.back());

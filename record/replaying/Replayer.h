@@ -8,6 +8,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <thread>
 #include <typeindex>
 #include <unordered_map>
@@ -101,7 +102,8 @@ class Replayer : public Names {
  private:
   /// A call that has begun and not ended.
   struct Open {
-    OperationName name;
+    std::string_view service;
+    std::string_view name;
     std::exception_ptr thrown{};  // what the plug-in threw last inside of it
   };
   /// One recorded thread.
@@ -135,7 +137,7 @@ class Replayer : public Names {
       REQUIRES(mutex);
   std::optional<Answer> afterEnd(const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
   std::vector<std::string> standing() const REQUIRES(mutex);
-  OperationName nameOfEvent(const Event& event) const REQUIRES(mutex);
+  const OperationName& nameOfEvent(const Event& event) const REQUIRES(mutex);
 
   bool looksStuck() REQUIRES(mutex);
   bool awaitEnd();

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <deque>
 #include <memory>
 #include <optional>
 #include <string>
@@ -38,7 +39,8 @@ class EventReader {
   bool isWhole() const { return _whole; }
 
   const std::vector<std::string>& threads() const { return _threads; }
-  const std::vector<OperationName>& operations() const { return _operations; }
+  /// They stay where they are.
+  const std::deque<OperationName>& operations() const { return _operations; }
 
  private:
   struct Decompression;
@@ -74,7 +76,7 @@ class EventReader {
   KnownTexts _known;
   HeardTexts _heard;
   std::vector<std::string> _threads;
-  std::vector<OperationName> _operations;
+  std::deque<OperationName> _operations;
   std::vector<std::vector<Frame>> _frames;
   std::optional<std::uint32_t> _inside;  // the thread that is inside the plug-in
   std::uint32_t _lastThread = 0;
