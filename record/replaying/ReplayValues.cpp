@@ -187,35 +187,49 @@ platform::TSAssetRef Read<platform::TSAssetRef>::from(Replayer& replayer, ItemRe
   return asset;
 }
 
-platform::OBBundleProxyRef Read<platform::OBBundleProxyRef>::from(Replayer& replayer, ItemReader& items) {
+namespace {
+
+/// Null when none comes.
+const Replayer::Known* proxyIn(Replayer& replayer, ItemReader& items) {
   if (items.takeAbsent()) return nullptr;
   const auto mention = items.object();
-  const Value facts = factsOf(items, mention);
   auto& known = replayer.known(mention.number);
-  if (!known.object) {
-    if (!facts.dictionary()) throw RecordingError("a proxy is not known");
-    if (facts.dictionary()->contains("isInstalled")) {
-      auto app = std::make_shared<platform::OBApplicationProxy>();
-      setFacts(*app, facts);
-      known = {typeid(platform::OBApplicationProxy), app};
-    } else {
-      auto bundle = std::make_shared<platform::OBBundleProxy>();
-      setFacts(*bundle, facts);
-      known = {typeid(platform::OBBundleProxy), bundle};
-    }
-    replayer.set(ObjectKind::proxy, known.object.get(), known.object, mention.number);
+  if (!(mention.flags & ObjectMention::hasFacts)) {
+    if (!known.object) throw RecordingError("a proxy is not known");
+    return &known;
   }
-  if (known.type == typeid(platform::OBApplicationProxy))
-    return std::static_pointer_cast<const platform::OBApplicationProxy>(std::shared_ptr<const void>(known.object));
-  if (known.type != typeid(platform::OBBundleProxy)) throw RecordingError("an object changes what it is");
-  return std::static_pointer_cast<const platform::OBBundleProxy>(std::shared_ptr<const void>(known.object));
+  const Value facts = factsOf(items, mention);
+  if (known.object) return &known;
+  if (facts.dictionary()->contains("isInstalled")) {
+    auto app = std::make_shared<platform::OBApplicationProxy>();
+    setFacts(*app, facts);
+    known = {typeid(platform::OBApplicationProxy), app};
+  } else {
+    auto bundle = std::make_shared<platform::OBBundleProxy>();
+    setFacts(*bundle, facts);
+    known = {typeid(platform::OBBundleProxy), bundle};
+  }
+  replayer.set(ObjectKind::proxy, known.object.get(), known.object, mention.number);
+  return &known;
+}
+
+}  // namespace
+
+platform::OBBundleProxyRef Read<platform::OBBundleProxyRef>::from(Replayer& replayer, ItemReader& items) {
+  const auto* known = proxyIn(replayer, items);
+  if (!known) return nullptr;
+  if (known->type == typeid(platform::OBApplicationProxy))
+    return std::static_pointer_cast<const platform::OBApplicationProxy>(known->object);
+  if (known->type != typeid(platform::OBBundleProxy)) throw RecordingError("an object changes what it is");
+  return std::static_pointer_cast<const platform::OBBundleProxy>(known->object);
 }
 
 platform::OBApplicationProxyRef Read<platform::OBApplicationProxyRef>::from(Replayer& replayer, ItemReader& items) {
-  auto bundle = get<platform::OBBundleProxyRef>(replayer, items);
-  auto app = std::dynamic_pointer_cast<const platform::OBApplicationProxy>(bundle);
-  if (bundle && !app) throw RecordingError("a proxy is not an app's");
-  return app;
+  const auto* known = proxyIn(replayer, items);
+  if (!known) return nullptr;
+  if (known->type == typeid(platform::OBBundleProxy)) throw RecordingError("a proxy is not an app's");
+  if (known->type != typeid(platform::OBApplicationProxy)) throw RecordingError("an object changes what it is");
+  return std::static_pointer_cast<const platform::OBApplicationProxy>(known->object);
 }
 
 namespace {

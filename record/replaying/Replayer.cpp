@@ -112,7 +112,7 @@ std::uint64_t Replayer::newNumber(ObjectKind kind) {
 }
 
 void Replayer::named(std::uint64_t number, const platform::TSAssetRef& asset) {
-  _known[number] = {typeid(platform::TSAsset), asset};
+  known(number) = {typeid(platform::TSAsset), asset};
 }
 
 void Replayer::end() {

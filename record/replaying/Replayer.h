@@ -74,7 +74,12 @@ class Replayer : public Names {
     std::type_index type = typeid(void);
     std::shared_ptr<void> object{};
   };
-  Known& known(std::uint64_t number) NO_THREAD_SAFETY_ANALYSIS { return _known[number]; }
+  Known& known(std::uint64_t number) NO_THREAD_SAFETY_ANALYSIS {
+    if (number >= mostBeside) return _knownFar[number];
+    // Lists name thousands of them again and again.
+    if (number >= _known.size()) _known.resize(number + 1);
+    return _known[number];
+  }
   /// What the plug-in lets services hold. Of an observer its address is where the protocol's part begins.
   struct Observed {
     std::weak_ptr<platform::RVAppInstallObserverDelegate> delegate{};
@@ -159,7 +164,9 @@ class Replayer : public Names {
   std::uint64_t _expectedOf GUARDED_BY(mutex) = 0;
   std::unordered_set<std::uint64_t> _given GUARDED_BY(mutex);
   std::uint64_t _ownNumber GUARDED_BY(mutex) = std::uint64_t{1} << 40;
-  std::unordered_map<std::uint64_t, Known> _known GUARDED_BY(mutex);
+  static constexpr std::size_t mostBeside = std::size_t{1} << 19;
+  std::deque<Known> _known GUARDED_BY(mutex);  // by number
+  std::unordered_map<std::uint64_t, Known> _knownFar GUARDED_BY(mutex);
   std::unordered_map<std::uint64_t, Observed> _observed GUARDED_BY(mutex);
   std::unordered_map<std::uint64_t, Completion> _completions GUARDED_BY(mutex);
   std::unordered_map<std::uint64_t, const Block*> _blocks GUARDED_BY(mutex);
