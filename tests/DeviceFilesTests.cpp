@@ -473,6 +473,61 @@ TEST(DatabaseStore, commitsAllOrNothing) {
   EXPECT_EQ(store->load()[0].value, deep);
 }
 
+TEST(DatabaseStore, keepsWhatItHadWhenThereIsNoRoom) {
+  Folder folder;
+  const std::string path = folder / "device.db";
+  auto store = openDatabaseStore(path);
+  ASSERT_TRUE(store && store->commit({{"app", "a", ""}}));
+  std::signal(SIGXFSZ, SIG_IGN);
+  std::string held;
+  int refused = 0, taken = 0;
+  // The log may grow by so much: from not at all to more than the commit takes, which is more than fits one call.
+  for (std::uintmax_t more = 0; more < 120'000; more += 1500) {
+    const std::string text(80'000, static_cast<char>('a' + more / 1500 % 26));
+    const auto size = std::filesystem::file_size(path + "-wal");
+    bool isKept = false;
+    {
+      LoweredLimit limit(RLIMIT_FSIZE, size + more);
+      isKept = store->commit({{"app", "a", text}});
+    }
+    ++(isKept ? taken : refused);
+    if (isKept) held = text;
+    ASSERT_EQ(store->load().at(0).value.string().value_or("nothing"), held) << more;
+    if (more % 4 == 0) store = nullptr, store = openDatabaseStore(path);
+    ASSERT_TRUE(store) << more;
+    ASSERT_EQ(store->load().at(0).value.string().value_or("nothing"), held) << "opened again, " << more;
+  }
+  std::signal(SIGXFSZ, SIG_DFL);
+  EXPECT_GT(refused, 20);
+  EXPECT_GT(taken, 5);
+}
+
+TEST(DatabaseStore, keepsWhatIsTooMuchForItsCache) {
+  Folder folder;
+  const std::string path = folder / "device.db";
+  auto store = openDatabaseStore(path);
+  auto text = [](char each) { return Value(std::string(3'000'000, each)); };
+  for (char turn = 'a'; turn < 'e'; ++turn) {
+    // Pages go into the log before the commit, and once more after they have changed again.
+    ASSERT_TRUE(store->commit({{"app", "a", text('x')},
+                               {"app", "b", text('y')},
+                               {"app", "a", text(turn)},
+                               {"app", "b", {}},
+                               {"app", "b", text('z')}}));
+    ASSERT_TRUE(store->write({{"app", "c", int(turn)}}));
+    // As a process finds it whose predecessor was killed just now.
+    for (const char* ending : {"", "-wal"})
+      std::filesystem::copy_file(path + ending, folder / "killed" + ending,
+                                 std::filesystem::copy_options::overwrite_existing);
+    ErrorRef error;
+    auto killed = openDatabaseStore(folder / "killed", &error);
+    ASSERT_TRUE(killed) << error->describe();
+    std::map<std::string, Value> values;
+    for (const auto& record : killed->load()) values[record.key] = record.value;
+    EXPECT_TRUE(values["a"] == text(turn) && values["b"] == text('z') && values["c"] == Value(int(turn))) << turn;
+  }
+}
+
 TEST(DatabaseStore, isCopiedWholeWhileItIsWritten) {
   Folder folder;
   auto store = openDatabaseStore(folder / "device.db");

@@ -13,7 +13,7 @@
 #include "device/files/DevicePath.h"
 #include "device/files/StepWatch.h"
 #include "device/store/DatabaseImage.h"
-#include "device/store/PairedWrites.h"
+#include "device/store/GatheredFrames.h"
 #include "device/store/Store.h"
 #include "platform/Mutex.h"
 #include "platform/ThreadSafety.h"
@@ -94,7 +94,6 @@ class DatabaseStore final : public Store {
   bool open(ErrorRef* error) {
     platform::Mutex::Lock lock(_mutex);
     sqlite3* opened = nullptr;
-    pairWritesOfLog();
     // The folder may be reached through links; the file itself is none, nor becomes one meanwhile.
     int status = sqlite3_open_v2(
         withoutLinks(_path).c_str(), &opened,
@@ -180,6 +179,7 @@ class DatabaseStore final : public Store {
     if (flushes != _flushes && !execute(flushes ? "PRAGMA synchronous=FULL" : "PRAGMA synchronous=NORMAL", error))
       return false;
     _flushes = flushes;
+    const GatheredFrames gathered;
     Transaction transaction(_database.get());
     if (!transaction.isOpen()) return fail(error);
     for (std::size_t i = 0; i < changes.size(); ++i) {
