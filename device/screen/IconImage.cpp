@@ -1,44 +1,14 @@
 #include "device/screen/IconImage.h"
 
-#include <cstddef>
-#include <cstdint>
-#include <cstring>
-
-#include "device/screen/PlainPNG.h"
+#include "device/screen/PNGImage.h"
 
 namespace device {
 
 namespace {
 
-constexpr std::uint32_t maximumPixels = 4096;
 constexpr double cornerShare = 0.225;  // of the side
 
 using Context = std::unique_ptr<cairo_t, void (*)(cairo_t*)>;
-
-std::uint32_t bigEndian(const char* bytes) {
-  std::uint32_t number = 0;
-  for (int i = 0; i < 4; ++i) number = number << 8 | static_cast<unsigned char>(bytes[i]);
-  return number;
-}
-
-/// Whether this is the header of a PNG of a size that may be decoded: the pixels cost memory before it shows whether
-/// they are there at all.
-bool isDrawable(platform::BytesView png) {
-  constexpr char signature[] = "\x89PNG\r\n\x1a\n";
-  if (png.size() < 33 || png.substr(0, 8) != platform::BytesView(signature, 8) || png.substr(12, 4) != "IHDR")
-    return false;
-  auto width = bigEndian(png.data() + 16);
-  auto height = bigEndian(png.data() + 20);
-  return width > 0 && height > 0 && width <= maximumPixels && height <= maximumPixels;
-}
-
-cairo_status_t readBytes(void* source, unsigned char* data, unsigned int length) {
-  auto& rest = *static_cast<platform::BytesView*>(source);
-  if (rest.size() < length) return CAIRO_STATUS_READ_ERROR;
-  std::memcpy(data, rest.data(), length);
-  rest.remove_prefix(length);
-  return CAIRO_STATUS_SUCCESS;
-}
 
 void traceRoundedSquare(cairo_t* context, double side) {
   constexpr double quarter = 1.5707963267948966;
@@ -54,10 +24,8 @@ void traceRoundedSquare(cairo_t* context, double side) {
 }  // namespace
 
 std::shared_ptr<const IconImage> IconImage::fromPNG(platform::BytesView png, int size) {
-  if (!isDrawable(png)) return nullptr;
-  Surface source = readPlainPNG(png);
-  if (!source) source.reset(cairo_image_surface_create_from_png_stream(&readBytes, &png));
-  if (cairo_surface_status(source.get()) != CAIRO_STATUS_SUCCESS) return nullptr;
+  const Surface source = readPNG(png);
+  if (!source) return nullptr;
   Surface target(cairo_image_surface_create(CAIRO_FORMAT_ARGB32, size, size), &cairo_surface_destroy);
   {
     Context context(cairo_create(target.get()), &cairo_destroy);
@@ -78,9 +46,6 @@ std::shared_ptr<const IconImage> IconImage::fromPNG(platform::BytesView png, int
   return std::make_shared<IconImage>(target.release());
 }
 
-bool IconImage::encodePNG(platform::Bytes& out) const {
-  cairo_surface_flush(_surface.get());
-  return cairo_image_surface_get_data(_surface.get()) && writePlainPNG(_surface.get(), out);
-}
+bool IconImage::encodePNG(platform::Bytes& out) const { return writePNG(_surface.get(), out); }
 
 }  // namespace device
