@@ -1,9 +1,11 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <atomic>
 #include <future>
 #include <thread>
 
+#include "device/events/EventQueue.h"
 #include "device/install/Containers.h"
 #include "platform/Describe.h"
 #include "platform/DevicePaths.h"
@@ -20,24 +22,11 @@ class InstallsAhead : public testing::Test {
  protected:
   void SetUp() override {
     _rig.postStartup();
-    Value list = Value::makeArray();
-    for (const char* id : {"app.a", "app.b", "app.c"}) {
-      const ScenarioApp app{.id = id};
-      list.array()->append(entryOf(app, "install"));
-      const std::string folder = std::string(stagingDirectory) + '/' + id;
-      _rig.write(folder + "/Info.plist", binaryList(dictionaryOf({{"KBBundleIdentifier", id}})));
-      _rig.write(folder + "/HarluneMetadata.plist", binaryList(dictionaryOf({{"itemId", 5}})));
-    }
-    _rig.write(std::string(stagingDirectory) + "/ApplicationsSync.plist", binaryList(list));
-    ASSERT_TRUE(_rig.reconcileSync());
-    const auto assets = _rig.daemon().outstandingAssetTransfers();
+    const auto assets = ask({"app.a", "app.b", "app.c"});
     ASSERT_EQ(assets.size(), 3u);
     ASSERT_EQ(containers(), 3u) << "of the placeholders";
     block();
-    for (const auto& asset : assets) {
-      asset->setPath(_rig.receivePackage(asset->identifier(), packageOf(asset->identifier(), "2.0")));
-      _rig.transferEnded(asset, true);
-    }
+    for (const auto& asset : assets) send(asset, "2.0");
     while (containers() != 6) std::this_thread::yield();
   }
   void TearDown() override {
@@ -45,6 +34,25 @@ class InstallsAhead : public testing::Test {
     const auto there =
         std::count_if(status.apps.begin(), status.apps.end(), [](const auto& app) { return app.isOnDevice(); });
     EXPECT_EQ(containers(), static_cast<std::size_t>(there)) << "one for each app, and none that is nobody's";
+  }
+
+  /// Begins a sync of these apps.
+  std::vector<TSAssetRef> ask(const std::vector<std::string>& ids) {
+    Value list = Value::makeArray();
+    for (const auto& id : ids) {
+      const ScenarioApp app{.id = id};
+      list.array()->append(entryOf(app, "install"));
+      const std::string folder = std::string(stagingDirectory) + '/' + id;
+      _rig.write(folder + "/Info.plist", binaryList(dictionaryOf({{"KBBundleIdentifier", id}})));
+      _rig.write(folder + "/HarluneMetadata.plist", binaryList(dictionaryOf({{"itemId", 5}})));
+    }
+    _rig.write(std::string(stagingDirectory) + "/ApplicationsSync.plist", binaryList(list));
+    EXPECT_TRUE(_rig.reconcileSync());
+    return _rig.daemon().outstandingAssetTransfers();
+  }
+  void send(const TSAssetRef& asset, const std::string& version) {
+    asset->setPath(_rig.receivePackage(asset->identifier(), packageOf(asset->identifier(), version)));
+    _rig.transferEnded(asset, true);
   }
 
   /// Keeps the device from installing anything until it may go on.
@@ -114,6 +122,33 @@ TEST_F(InstallsAhead, useTheMetadataThatCountInTheirTurn) {
   }
   std::sort(found.begin(), found.end());
   EXPECT_EQ(found, (std::vector<std::string>{"5", "5", "6"}));
+}
+
+TEST_F(InstallsAhead, waitForAPackageThatIsBeingUnpacked) {
+  goOn();
+  const auto assets = ask({"app.a"});
+  ASSERT_EQ(assets.size(), 1u);
+  _mayGoOn = std::promise<void>();
+  block();
+  std::atomic<bool> unpacks{false}, meet{false};
+  std::atomic<int> times{0};
+  _rig.parts().watch = [&](std::string_view, std::string_view path) {
+    if (!path.starts_with(device::containersDirectory)) return;
+    if (std::string_view(device::currentThreadName()) != "unpacking") {
+      if (unpacks) meet = true;
+    } else if (times++ == 0) {
+      unpacks = true;
+      _mayGoOn.set_value();
+      for (int i = 0; i < 2000; ++i) std::this_thread::yield();
+      unpacks = false;
+    }
+  };
+  send(assets[0], "3.0");
+  while (times == 0) std::this_thread::yield();
+  _rig.deliver();
+  _rig.parts().watch = nullptr;
+  EXPECT_FALSE(meet) << "the install went on beside it";
+  EXPECT_EQ(_rig.device().app("app.a")->version, "3.0");
 }
 
 }  // namespace
