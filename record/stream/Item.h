@@ -125,8 +125,23 @@ class ItemBuffer {
     *_end++ = static_cast<char>(value);
   }
   void put(std::string_view bytes) {
-    if (!bytes.empty()) std::memcpy(_end, bytes.data(), bytes.size());
-    _end += bytes.size();
+    const std::size_t count = bytes.size();
+    // Most are short: two halves that overlap, without a call.
+    if (count > 16) {
+      std::memcpy(_end, bytes.data(), count);
+    } else if (count >= 8) {
+      putHalves<8>(bytes.data(), count);
+    } else if (count >= 4) {
+      putHalves<4>(bytes.data(), count);
+    } else {
+      for (std::size_t at = 0; at < count; ++at) _end[at] = bytes[at];
+    }
+    _end += count;
+  }
+  template <std::size_t half>
+  void putHalves(const char* bytes, std::size_t count) {
+    std::memcpy(_end, bytes, half);
+    std::memcpy(_end + count - half, bytes + count - half, half);
   }
 
   std::unique_ptr<char[]> _room;

@@ -111,6 +111,9 @@ std::optional<std::pair<std::size_t, std::size_t>> headOf(std::string_view list)
   }
 }
 
+/// Others than this one need not be compared: those that are further back are mostly what it was before.
+bool isNearlyAll(std::size_t same, std::size_t size) { return same >= size - size / 64; }
+
 /// The places of a list that is the same as another one but for its middle; empty when it is no list after all.
 std::vector<std::uint32_t> placesBeside(const std::vector<std::uint32_t>& old, std::string_view list, std::size_t head,
                                         const Middle& middle) {
@@ -182,7 +185,7 @@ std::optional<LargeTexts::Likeness> LargeTexts::like(std::string_view text) cons
     const std::size_t begin = sameBegin(text, other);
     const std::size_t end = sameEnd(text, other, std::min(text.size(), other.size()) - begin);
     if (begin + end < text.size() / 2) continue;
-    if (begin + end == text.size() && text.size() == other.size()) return Likeness{slot, begin, end};
+    if (isNearlyAll(begin + end, text.size())) return Likeness{slot, begin, end};
     if (!best || begin + end > best->begin + best->end) best = Likeness{slot, begin, end};
   }
   return best;
@@ -199,6 +202,7 @@ std::optional<LargeTexts::ListLikeness> LargeTexts::likeList(std::string_view li
     const std::string_view oldBody = std::string_view(base.text).substr(base.places.front());
     const std::size_t begin = sameBegin(body, oldBody);
     candidates.push_back({slot, begin, sameEnd(body, oldBody, std::min(body.size(), oldBody.size()) - begin)});
+    if (isNearlyAll(begin + candidates.back().end, body.size())) break;
   }
   // One that is not like it is gone through element by element, to no avail.
   std::stable_sort(candidates.begin(), candidates.end(), [](const Likeness& one, const Likeness& other) {
