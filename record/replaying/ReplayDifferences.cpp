@@ -51,7 +51,9 @@ bool Replayer::match(Player& player, const Operation& operation, const ItemWrite
     ++_result.events;
     return true;
   }
-  if (isCall(*next) && isOf(*next, operation)) {
+  dropIgnored(player);
+  next = head();
+  if (next && isCall(*next) && isOf(*next, operation)) {
     differ(Difference::Kind::otherArguments, player, next, came);
     if (isOver()) return false;
     pop();
@@ -61,17 +63,49 @@ bool Replayer::match(Player& player, const Operation& operation, const ItemWrite
   return false;
 }
 
+/// True when the recording has that call before anything of the thread that is compared. What it says does not matter,
+/// but it keeps its place: somebody else may have had the turn while it was made.
+bool Replayer::matchIgnored(Player& player, const Operation& operation) {
+  const auto place = findIgnored(player, &operation);
+  if (!place) return false;
+  skipTo(player, *place, {});
+  _ahead.erase(_ahead.begin() + static_cast<std::ptrdiff_t>(*findIgnored(player, &operation)));
+  ++_result.events;
+  return true;
+}
+
+/// What the plug-in left out before a call that is compared.
+void Replayer::dropIgnored(const Player& player) {
+  while (findIgnored(player, nullptr)) {
+    const auto isOfPlayer = [&](const Event& event) { return event.thread == player.number; };
+    // The call and its answer.
+    for (int i = 0; i < 2; ++i) {
+      const auto event = std::find_if(_ahead.begin(), _ahead.end(), isOfPlayer);
+      if (event != _ahead.end()) _ahead.erase(event);
+    }
+  }
+}
+
+/// The place of the thread's next call that is not compared: of that operation, or without one of any.
+std::optional<std::size_t> Replayer::findIgnored(const Player& player, const Operation* operation) {
+  for (std::size_t place = 0; place < farthestAhead; ++place) {
+    const Event* event = ahead(place);
+    if (!event) return std::nullopt;
+    if (event->thread != player.number) continue;
+    if (!isIgnored(*event)) return std::nullopt;
+    if (isCall(*event) && (!operation || isOf(*event, *operation))) return place;
+  }
+  return std::nullopt;
+}
+
 /// The place of that call of the thread in the rest of what it is inside of; without an operation, of its return.
 std::optional<std::size_t> Replayer::findAhead(const Player& player, const Operation* operation,
                                                const ItemWriter& arguments) {
   int depth = 0;
   for (std::size_t place = 0; place < farthestAhead; ++place) {
-    while (_ahead.size() <= place) {
-      Event event;
-      if (!_reader.next(event)) return std::nullopt;
-      if (!isIgnored(event)) _ahead.push_back(std::move(event));
-    }
-    const Event& event = _ahead[place];
+    const Event* next = ahead(place);
+    if (!next) return std::nullopt;
+    const Event& event = *next;
     if (event.thread != player.number) continue;
     if (depth == 0 && leaves(event.kind)) return operation ? std::nullopt : std::optional(place);
     if (depth == 0 && operation && isCall(event) && isOf(event, *operation) && isSame(event, arguments)) return place;
@@ -89,7 +123,7 @@ void Replayer::skipTo(const Player& player, std::size_t place, std::string_view 
       continue;
     }
     const bool begins = opens(_ahead[at].kind);
-    if (depth == 0 && begins) {
+    if (depth == 0 && begins && !isIgnored(_ahead[at])) {
       differ(Difference::Kind::missing, player, &_ahead[at], std::string(came));
       if (isOver()) return;
     }

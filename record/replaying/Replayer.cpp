@@ -76,13 +76,13 @@ bool Replayer::isIgnored(const Event& event) const {
   return _options.ignored.contains(classOf(_reader.operations()[event.operation]));
 }
 
-const Event* Replayer::head() {
-  while (_ahead.empty()) {
+const Event* Replayer::ahead(std::size_t place) {
+  while (_ahead.size() <= place) {
     Event event;
     if (!_reader.next(event)) return nullptr;
-    if (!isIgnored(event)) _ahead.push_back(std::move(event));
+    _ahead.push_back(std::move(event));
   }
-  return &_ahead.front();
+  return &_ahead[place];
 }
 
 Event Replayer::pop() {
@@ -231,8 +231,9 @@ void Replayer::leave(Player& player, const Event& entered, bool threw, const Ite
 std::optional<Replayer::Answer> Replayer::exchange(const Operation& operation, const ItemWriter& arguments) {
   auto* player = static_cast<Player*>(currentPlayer);
   if (isOver() && player && player == _messenger) return afterEnd(operation, arguments);
-  if (isOver() || !player || ignores(operation)) return std::nullopt;
-  if (!match(*player, operation, arguments)) return std::nullopt;
+  if (isOver() || !player) return std::nullopt;
+  const bool isRecorded = ignores(operation) ? matchIgnored(*player, operation) : match(*player, operation, arguments);
+  if (!isRecorded) return std::nullopt;
   player->inside.push_back({operation.service, operation.name});
   passTurn();
   auto event = awaitAnswer(*player);

@@ -121,7 +121,9 @@ class Replayer : public Names {
   };
   struct Services;
 
-  const Event* head() REQUIRES(mutex);
+  /// The event so many places behind the one that is next; null behind the last.
+  const Event* ahead(std::size_t place) REQUIRES(mutex);
+  const Event* head() REQUIRES(mutex) { return ahead(0); }
   Event pop() REQUIRES(mutex);
   bool isIgnored(const Event& event) const REQUIRES(mutex);
   bool isOf(const Event& event, const Operation& operation) const REQUIRES(mutex);
@@ -135,6 +137,9 @@ class Replayer : public Names {
   void end() REQUIRES(mutex);
 
   bool match(Player& player, const Operation& operation, const ItemWriter& arguments) REQUIRES(mutex);
+  bool matchIgnored(Player& player, const Operation& operation) REQUIRES(mutex);
+  void dropIgnored(const Player& player) REQUIRES(mutex);
+  std::optional<std::size_t> findIgnored(const Player& player, const Operation* operation) REQUIRES(mutex);
   std::optional<std::size_t> findAhead(const Player& player, const Operation* operation, const ItemWriter& arguments)
       REQUIRES(mutex);
   void skipTo(const Player& player, std::size_t place, std::string_view came) REQUIRES(mutex);
