@@ -116,6 +116,8 @@ void SyncRun::requestPackages() {
   }
   _parts.queue.expect();
   _assets = _parts.daemon.outstandingAssetTransfers();
+  // What was asked of the transfers meanwhile counts from the first package on.
+  _parts.session.device().events().drain();
   for (const auto& asset : _assets) {
     _report.requested.push_back(asset->identifier());
     _parts.progress.add(asset->identifier(), asset->prettyName().value_or(""));
