@@ -10,6 +10,7 @@ what comes out says nothing about time.
 """
 
 import argparse
+import ast
 import collections
 import json
 import os
@@ -152,10 +153,10 @@ class Trace:
             self.counts["syncs", self._kind(path or "")] += 1
         elif call.startswith("rename") and "\"ApplicationsSync.plist\"" in arguments:
             self.counts["list rewrites"] += 1
-        elif call == "pwrite64" and path.endswith("-wal"):
-            # A commit's frames go into the log of the store together.
-            size = int(re.findall(r", (\d+), \d+(?:\)| <)", arguments)[-1])
-            self.counts["store commits"] += size % 4120 == 0
+        elif call == "pwrite64" and path.endswith("-wal") and ", 24, " in arguments:
+            # A frame of the log of the store: its head tells the last one of a commit.
+            head = ast.literal_eval("b" + re.search(r'"(?:[^"\\]|\\.)*"', arguments)[0])
+            self.counts["store commits"] += head[4:8] != b"\0\0\0\0"
 
     @staticmethod
     def _kind(path):

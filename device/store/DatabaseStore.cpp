@@ -13,7 +13,6 @@
 #include "device/files/DevicePath.h"
 #include "device/files/StepWatch.h"
 #include "device/store/DatabaseImage.h"
-#include "device/store/GatheredFrames.h"
 #include "device/store/Store.h"
 #include "platform/Mutex.h"
 #include "platform/ThreadSafety.h"
@@ -179,7 +178,6 @@ class DatabaseStore final : public Store {
     if (flushes != _flushes && !execute(flushes ? "PRAGMA synchronous=FULL" : "PRAGMA synchronous=NORMAL", error))
       return false;
     _flushes = flushes;
-    const GatheredFrames gathered;
     Transaction transaction(_database.get());
     if (!transaction.isOpen()) return fail(error);
     for (std::size_t i = 0; i < changes.size(); ++i) {
